@@ -1,0 +1,133 @@
+#include "Voice_Engine/epd/transform.h"
+
+#include <utility>
+
+#include "Voice_Engine/basic_op/operators.h"
+
+namespace orvalis {
+namespace {
+
+/// Reorders complex values by their bit-reversed index.
+void bit_reverse(Word16 *x, Word32 size) {
+  for (Word32 i = 0, j = 0; i < size - 2; i += 2) {
+    if (j > i) {
+      std::swap(x[i], x[j]);
+      std::swap(x[i + 1], x[j + 1]);
+    }
+    Word32 k = size / 2;
+    while (j >= k) {
+      j -= k;
+      k /= 2;
+    }
+    j += k;
+  }
+}
+
+/// Radix-2 butterfly with the twiddle factor c + j s; the inverse uses its conjugate. Forward
+/// halves its outputs. Index arithmetic needs no operators: the last sum overwrites the flag.
+template <Direction kDirection, class FlagSet>
+inline void butterfly(FlagSet &flags, Word16 *upper, Word16 *lower, Word16 c, Word16 s) {
+  constexpr bool kForward = kDirection == Direction::kForward;
+  Word32 re = L_mult(flags, lower[0], c);
+  Word32 im = L_mult(flags, lower[1], c);
+  re = kForward ? L_msu(flags, re, lower[1], s) : L_mac(flags, re, lower[1], s);
+  im = kForward ? L_mac(flags, im, lower[0], s) : L_msu(flags, im, lower[0], s);
+  const Word16 turned_re = round_BOP(flags, re);
+  const Word16 turned_im = round_BOP(flags, im);
+
+  constexpr int kHalving = kForward ? 1 : 0;
+  lower[0] = shift_right(sub(flags, upper[0], turned_re), kHalving);
+  lower[1] = shift_right(sub(flags, upper[1], turned_im), kHalving);
+  upper[0] = shift_right(add(flags, upper[0], turned_re), kHalving);
+  upper[1] = shift_right(add(flags, upper[1], turned_im), kHalving);
+}
+
+template <Direction kDirection, class FlagSet>
+void complex_stages(FlagSet &flags, Word16 *x, const TransformPlan &plan) {
+  bit_reverse(x, plan.size);
+  for (Word32 stage = 0; stage < plan.stages; ++stage) {
+    const Word32 half_span = 2 << stage;
+    for (Word32 j = 0; j < half_span; j += 2) {
+      const Word16 *twiddle = &plan.twiddles[j * plan.steps[stage]];
+      for (Word32 k = j; k < plan.size; k += 2 * half_span) {
+        butterfly<kDirection>(flags, &x[k], &x[k + half_span], twiddle[0], twiddle[1]);
+      }
+    }
+  }
+}
+
+template <class FlagSet>
+inline Word16 rounded_half(FlagSet &flags, Word32 a, Word32 b) {
+  return round_BOP(flags, L_add(flags, a, b) >> 1);
+}
+
+/// Turns bins k and N/2 - k of the packed complex spectrum into those of the real one, or back.
+template <Direction kDirection, class FlagSet>
+inline void split_pair(FlagSet &flags, Word16 *low, Word16 *high, const Word16 *low_twiddle,
+                       const Word16 *high_twiddle) {
+  constexpr bool kForward = kDirection == Direction::kForward;
+  const Word16 even_re = add(flags, low[0], high[0]);
+  const Word16 even_im = sub(flags, low[1], high[1]);
+  const Word16 odd_sum = add(flags, low[1], high[1]);
+  const Word16 odd_difference = sub(flags, high[0], low[0]);
+  const Word16 odd_re = kForward ? odd_sum : negate(odd_sum);
+  const Word16 odd_im = kForward ? odd_difference : negate(odd_difference);
+
+  // The odd part, turned by +-k / N of a circle: `across` terms change sign with the direction.
+  const auto turned = [&](Word16 along, Word16 across, const Word16 *twiddle, bool plus) {
+    const Word32 first = L_mult(flags, along, twiddle[0]);
+    const Word32 second = L_mult(flags, across, twiddle[1]);
+    return plus == kForward ? L_add(flags, first, second) : L_sub(flags, first, second);
+  };
+  const Word32 re = L_deposit_h(even_re);
+  const Word32 im = L_deposit_h(even_im);
+  low[0] = rounded_half(flags, re, turned(odd_re, odd_im, low_twiddle, false));
+  low[1] = rounded_half(flags, im, turned(odd_im, odd_re, low_twiddle, true));
+  high[0] = rounded_half(flags, re, turned(odd_re, odd_im, high_twiddle, true));
+  // Not `turned` negated in both directions: the forward sum saturates after the change of sign.
+  const Word32 along = L_mult(flags, odd_im, high_twiddle[0]);
+  const Word32 across = L_mult(flags, odd_re, high_twiddle[1]);
+  const Word32 mirrored = kForward ? L_sub(flags, across, along) : L_negate(L_add(flags, along, across));
+  high[1] = rounded_half(flags, L_negate(im), mirrored);
+}
+
+template <Direction kDirection, class FlagSet>
+void split(FlagSet &flags, Word16 *x, const TransformPlan &plan) {
+  constexpr int kHalving = kDirection == Direction::kForward ? 0 : 1;
+  const Word16 first = x[0];
+  const Word16 second = x[1];
+  x[0] = shift_right(add(flags, first, second), kHalving);
+  x[1] = shift_right(sub(flags, first, second), kHalving);
+  for (Word32 i = 2, j = plan.size - 2; i <= j; i += 2, j -= 2) {
+    split_pair<kDirection>(flags, &x[i], &x[j], &plan.twiddles[i], &plan.twiddles[j]);
+  }
+}
+
+}  // namespace
+
+template <class FlagSet>
+void complex_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
+  if (direction == Direction::kForward) {
+    complex_stages<Direction::kForward>(flags, x, plan);
+  } else {
+    complex_stages<Direction::kInverse>(flags, x, plan);
+  }
+}
+
+template <class FlagSet>
+void real_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
+  if (direction == Direction::kForward) {
+    complex_stages<Direction::kForward>(flags, x, plan);
+    split<Direction::kForward>(flags, x, plan);
+  } else {
+    split<Direction::kInverse>(flags, x, plan);
+    complex_stages<Direction::kInverse>(flags, x, plan);
+  }
+}
+
+template void complex_fft(PlainFlags &, Word16 *, Direction, const TransformPlan &);
+template void complex_fft(NsFlags &, Word16 *, Direction, const TransformPlan &);
+template void real_fft(PlainFlags &, Word16 *, Direction, const TransformPlan &);
+template void real_fft(NsFlags &, Word16 *, Direction, const TransformPlan &);
+
+}  // namespace orvalis
