@@ -106,7 +106,8 @@ EpdInstance *InitializeEPD(int32_t mode, int32_t pcmDumpEnabled);
  *   -1   epd is NULL, or pcm is NULL though numSample > 0
  *
  * Pass whole frames, best one at a time: of several frames the answers are folded into one. A
- * buffer that ends in a partial frame has its whole frames judged, but returns 0 and is not counted.
+ * buffer that ends in a partial frame has its whole frames judged, but returns 0 and is not
+ * counted.
  *
  * A frame with more than 60 zero samples in a row is null audio: it is not judged and counts as no
  * answer. The first 39 judged frames are never speech. Suppression at 16 kHz begins once the audio
@@ -131,7 +132,8 @@ int32_t ProcessEPDFrameByCnttype(EpdInstance *epd, const int16_t *pcm, int32_t n
                                  int32_t contentType);
 
 /* Identical to ProcessEPDFrameByCnttype; `mode` is the content type. */
-int32_t ProcessEPDFrameByMode(EpdInstance *epd, const int16_t *pcm, int32_t numSample, int32_t mode);
+int32_t ProcessEPDFrameByMode(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
+                              int32_t mode);
 
 /*
  * Forgets the utterance in progress and turns hangover log lines on again. What the detector has

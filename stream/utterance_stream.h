@@ -76,7 +76,8 @@ typedef struct UtteranceSettings {
 } UtteranceSettings;
 
 /* 16 kHz, no gain, content type 0, half a second of hangover, no padding. */
-#define UTTERANCE_SETTINGS_DEFAULT {16000, 0, 0, 500, 0, 0}
+#define UTTERANCE_SETTINGS_DEFAULT \
+  { 16000, 0, 0, 500, 0, 0 }
 
 /* Times are counts of samples since the stream was opened. */
 typedef struct Utterance {

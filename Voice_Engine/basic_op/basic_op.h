@@ -17,11 +17,11 @@
  * Formats: 16-bit fractions are Q15, 32-bit fractions Q31, unless stated otherwise. Results
  * saturate. Shift counts may have any size; a negative count shifts the other way.
  *
- * Flags: 16-bit add, sub, mult, mult_r and sature set the overflow flag to 0 or 1; shifts and 32-bit
- * operators only ever raise it; the carry operators write both. The flags are process-wide words
- * that every engine call on every thread may change; the library never branches on them except in
- * the carry operators and L_sat. Frame calls and transforms leave in them what their operators, run
- * one after another, would leave.
+ * Flags: 16-bit add, sub, mult, mult_r and sature set the overflow flag to 0 or 1; shifts and
+ * 32-bit operators only ever raise it; the carry operators write both. The flags are process-wide
+ * words that every engine call on every thread may change; the library never branches on them
+ * except in the carry operators and L_sat. Frame calls and transforms leave in them what their
+ * operators, run one after another, would leave.
  *
  * Every function may be called from any thread. Pointers must be valid; nothing is checked.
  */

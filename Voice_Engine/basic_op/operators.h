@@ -66,7 +66,9 @@ inline Word16 mult_r(FlagSet &flags, Word16 a, Word16 b) {
 // --- 16-bit shifts: the overflow flag is only ever raised ----------------------------------------
 
 /// x >> n for n >= 0; sign bits fill in.
-constexpr Word16 shift_right(Word16 x, Word32 n) { return static_cast<Word16>(x >> (n < 15 ? n : 15)); }
+constexpr Word16 shift_right(Word16 x, Word32 n) {
+  return static_cast<Word16>(x >> (n < 15 ? n : 15));
+}
 
 /// x << n for n >= 0, saturated.
 template <class FlagSet>

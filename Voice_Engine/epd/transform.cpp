@@ -87,7 +87,8 @@ inline void split_pair(FlagSet &flags, Word16 *low, Word16 *high, const Word16 *
   // Not `turned` negated in both directions: the forward sum saturates after the change of sign.
   const Word32 along = L_mult(flags, odd_im, high_twiddle[0]);
   const Word32 across = L_mult(flags, odd_re, high_twiddle[1]);
-  const Word32 mirrored = kForward ? L_sub(flags, across, along) : L_negate(L_add(flags, along, across));
+  const Word32 mirrored =
+      kForward ? L_sub(flags, across, along) : L_negate(L_add(flags, along, across));
   high[1] = rounded_half(flags, L_negate(im), mirrored);
 }
 

@@ -52,7 +52,8 @@ ORVALIS_HIDDEN_TABLE(Table256, phs_tbl_256) = make_twiddles<256>(kTruncated);
 ORVALIS_HIDDEN_TABLE(Steps7, ii_table_WB) = make_steps<7>();
 ORVALIS_HIDDEN_TABLE(Steps6, ii_table_NB) = make_steps<6>();
 ORVALIS_HIDDEN_TABLE(Steps7, ii_table_256) = make_steps<7>();
-ORVALIS_HIDDEN_TABLE(BandPointers, phs_tbl) = {orvalis_phs_tbl_WB.data(), orvalis_phs_tbl_NB.data()};
+ORVALIS_HIDDEN_TABLE(BandPointers, phs_tbl) = {orvalis_phs_tbl_WB.data(),
+                                               orvalis_phs_tbl_NB.data()};
 ORVALIS_HIDDEN_TABLE(BandPointers, ii_table) = {orvalis_ii_table_WB.data(),
                                                 orvalis_ii_table_NB.data()};
 

@@ -1,0 +1,116 @@
+#include "Voice_Engine/epd/channel_tables.h"
+
+#include <array>
+
+#include "Voice_Engine/basic_op/constexpr_math.h"
+
+namespace orvalis {
+namespace {
+
+constexpr ChannelScale shift_by(Word16 places) { return {ChannelScale::kShift, places}; }
+constexpr ChannelScale times(Word16 factor_q15) { return {ChannelScale::kMultiply, factor_q15}; }
+
+constexpr ChannelBins ch_tbl_vad_WB[] = {
+    {0, 1},   {2, 3},   {4, 5},   {6, 7},   {8, 9},   {10, 11},  {12, 13},
+    {14, 16}, {17, 19}, {20, 22}, {23, 26}, {27, 30}, {31, 35},  {36, 41},
+    {42, 48}, {49, 55}, {56, 63}, {64, 73}, {74, 85}, {86, 109}, {110, 127}};
+
+// Reciprocals of the channel widths, but for channel 19, whose 24 bins are divided by 14.
+constexpr ChannelScale ch_tbl_sh_vad_WB[] = {
+    shift_by(1),  shift_by(1),  shift_by(1),  shift_by(1), shift_by(1), shift_by(1), shift_by(1),
+    times(10922), times(10922), times(10922), shift_by(2), shift_by(2), times(6553), times(5462),
+    times(4681),  times(4681),  shift_by(3),  times(3279), times(2731), times(2341), times(1820)};
+
+constexpr ChannelBins ch_tbl_vad_NB[] = {{2, 3},   {4, 5},   {6, 7},   {8, 9},   {10, 11}, {12, 13},
+                                         {14, 16}, {17, 19}, {20, 22}, {23, 26}, {27, 30}, {31, 35},
+                                         {36, 41}, {42, 48}, {49, 55}, {56, 63}};
+
+constexpr ChannelScale ch_tbl_sh_vad_NB[] = {shift_by(1),  shift_by(1), shift_by(1),  shift_by(1),
+                                             shift_by(1),  shift_by(1), times(10922), times(10922),
+                                             times(10922), shift_by(2), shift_by(2),  times(6553),
+                                             times(5462),  times(4681), times(4681),  shift_by(3)};
+
+constexpr ChannelBins ch_tbl[] = {{0, 1},   {2, 3},   {4, 5},   {6, 7},    {8, 10},
+                                  {11, 13}, {14, 16}, {17, 19}, {20, 22},  {23, 26},
+                                  {27, 30}, {31, 34}, {35, 39}, {40, 45},  {46, 52},
+                                  {53, 61}, {62, 72}, {73, 87}, {88, 104}, {105, 125}};
+
+constexpr ChannelScale ch_tbl_sh[] = {
+    shift_by(1),  shift_by(1),  shift_by(1), shift_by(1), times(10922), times(10922), times(10922),
+    times(10922), times(10922), shift_by(2), shift_by(2), shift_by(2),  times(6553),  times(5462),
+    times(4681),  times(3641),  times(2979), times(2185), times(1927),  times(1560)};
+
+/// Rising edge of a sine-squared window.
+template <std::size_t kLength>
+constexpr std::array<Word16, kLength> make_window_edge(double full_scale) {
+  std::array<Word16, kLength> edge{};
+  for (std::size_t i = 0; i < kLength; ++i) {
+    // sin^2(pi (i + 1/2) / 2L), as a cosine of the double angle
+    const double cosine = constexpr_math::cos_of_turn(static_cast<double>(i) + 0.5, 2.0 * kLength);
+    edge[i] = constexpr_math::rounded_word16(full_scale * (1 - cosine) / 2);
+  }
+  return edge;
+}
+
+// Only the wide-band detector's edge is made from 32768.
+constexpr auto window_vad_WB = make_window_edge<48>(32768);
+constexpr auto window_vad_NB = make_window_edge<24>(32767);
+constexpr auto window = make_window_edge<48>(32767);
+
+}  // namespace
+
+constinit const ChannelPlan kWideBandDetection = {
+    .channels = 21,
+    .frame_samples = 160,
+    .overlap = 48,
+    .transform_size = 256,
+    .bins = ch_tbl_vad_WB,
+    .scales = ch_tbl_sh_vad_WB,
+    .window_edge = window_vad_WB.data(),
+    .energy_floor = 12,
+    .seeding_frames = 10,
+    .scale_then_smooth = false,
+    .loud_level_q5 = 1638,
+    .metric_noise = 68,
+    .energy_silent = 252,
+    .deviation_voice = 2000,
+    .remember_reset = false,
+};
+
+constinit const ChannelPlan kNarrowBandDetection = {
+    .channels = 16,
+    .frame_samples = 80,
+    .overlap = 24,
+    .transform_size = 128,
+    .bins = ch_tbl_vad_NB,
+    .scales = ch_tbl_sh_vad_NB,
+    .window_edge = window_vad_NB.data(),
+    .energy_floor = 16,
+    .seeding_frames = 10,
+    .scale_then_smooth = false,
+    .loud_level_q5 = 1600,
+    .metric_noise = 45,
+    .energy_silent = 256,
+    .deviation_voice = 896,
+    .remember_reset = false,
+};
+
+constinit const ChannelPlan kSuppression = {
+    .channels = 20,
+    .frame_samples = 160,
+    .overlap = 48,
+    .transform_size = 256,
+    .bins = ch_tbl,
+    .scales = ch_tbl_sh,
+    .window_edge = window.data(),
+    .energy_floor = 16,
+    .seeding_frames = 4,
+    .scale_then_smooth = true,
+    .loud_level_q5 = 1920,
+    .metric_noise = 42,
+    .energy_silent = 320,
+    .deviation_voice = 896,
+    .remember_reset = true,
+};
+
+}  // namespace orvalis

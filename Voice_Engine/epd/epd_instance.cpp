@@ -1,0 +1,203 @@
+#include "Voice_Engine/epd/epd_instance.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+
+#include "Voice_Engine/epd/frame_screening.h"
+#include "Voice_Engine/platform/dump_file.h"
+#include "Voice_Engine/platform/log.h"
+
+namespace orvalis {
+namespace {
+
+constexpr char kInputSuffix[] = "_inputEPD.pcm";
+constexpr char kResultSuffix[] = "_resultEPD.pcm";
+constexpr Word32 kMostSmallSamples = 120;  // from here on audio counts as abnormal, at either rate
+constexpr SettlingTexts kSettlingTexts = {
+    .abnormal = "TQE: Check Abnormal Audio ... dont do NS ... in EPD_Proc_Frame",
+    .waiting =
+        "TQE: Check Abnormal Audio ... wait few more frame ... dont do NS ... in EPD_Proc_Frame",
+};
+
+long handle_number(const EpdInstance *epd) {
+  return static_cast<long>(reinterpret_cast<std::intptr_t>(epd));
+}
+
+bool dumps(const EpdInstance &epd) { return epd.pcmDumpEnabled == 1; }
+
+Word32 frame_length(const EpdInstance &epd) { return epd.rateMode == 0 ? 160 : 80; }
+
+/// Opens both dump files for the time of one call, so that they exist after it. Nothing is written
+/// through these handles.
+class DumpFilesPresent {
+public:
+  explicit DumpFilesPresent(const EpdInstance &epd) {
+    if (!dumps(epd)) return;
+    input_ = open_dump(kDumpFolder, &epd, kInputSuffix);
+    result_ = open_dump(kDumpFolder, &epd, kResultSuffix);
+  }
+  ~DumpFilesPresent() {
+    close_dump(input_);
+    close_dump(result_);
+  }
+  DumpFilesPresent(const DumpFilesPresent &) = delete;
+  DumpFilesPresent &operator=(const DumpFilesPresent &) = delete;
+
+private:
+  std::FILE *input_ = nullptr;
+  std::FILE *result_ = nullptr;
+};
+
+/// Logs a buffer that does not hold whole frames, and the settings while nothing is processed yet.
+void log_format(const EpdInstance &epd, Word32 numSample) {
+  const Word32 length = frame_length(epd);
+  if (numSample % length != 0) {
+    log_line(kLogDebug, kLogTag,
+             "VoiceEngine_JNI, Check pcm buffer size : numSample = %d, PCM_LEN = %d", numSample,
+             length);
+  }
+  if (epd.processedSamples == 0) {
+    log_line(kLogDebug, kLogTag,
+             "TQE: Velmora EPD ... numSample = %d ... epdMode = %d ... RATE : %d", numSample,
+             epd.epdMode, epd.rateMode == 0 ? 16000 : 8000);
+  }
+}
+
+void apply_input_gain(Word32 gain_mode, Word16 *frame, Word32 length) {
+  if (gain_mode == 1) {
+    for (Word32 i = 0; i < length; ++i) frame[i] = static_cast<Word16>(frame[i] >> 2);
+  } else if (gain_mode == 2) {
+    for (Word32 i = 0; i < length; ++i) frame[i] = static_cast<Word16>(frame[i] * 4);  // wraps
+  }
+}
+
+/// Counts the frames since the last speech and logs the hangover, which is the caller's to keep.
+void note_hangover(EpdInstance &epd, Word32 answer) {
+  if (answer == kSpeech) {
+    epd.HANGframe = -1;
+    return;
+  }
+  const bool logs = epd.hangLogEnabled == 1;
+  if (epd.HANGframe < 1) {
+    epd.HANGframe = 0;
+    if (logs) {
+      log_line(kLogDebug, kLogTag, "%li:TQE: vm_sum ... JAVA HANGOVER started!",
+               handle_number(&epd));
+    }
+  }
+  count_up(epd.HANGframe);
+  if (epd.HANGframe % 10 == 0 && logs) {
+    log_line(kLogDebug, kLogTag, "%li:TQE: _vm_sum ... HANGframe = %d", handle_number(&epd),
+             epd.HANGframe);
+  }
+}
+
+/// Judges one scaled frame and returns KEPD's answer. The decision hears the suppressed frame, the
+/// noise floor and the dump the unsuppressed one.
+Word32 answer_frame(EpdInstance *epd, Word16 *frame, bool suppresses, Word32 contentType,
+                    PlainFlags &flags, NsFlags &ns_flags) {
+  const Word32 length = frame_length(*epd);
+  Word16 unsuppressed[kMostFrameSamples];
+  std::copy_n(frame, length, unsuppressed);
+  if (suppresses) s1chns_C(ns_flags, &epd->suppressor, frame, frame);
+  if (dumps(*epd)) write_dump(epd->inputDumpFile, unsuppressed, length);
+
+  const Word32 answer = KEPDfunc(flags, &epd, frame, static_cast<std::uint32_t>(contentType));
+  KEPDfunc_NoiseEstimation(&epd, unsuppressed, answer);
+  note_hangover(*epd, answer);
+  if (dumps(*epd)) {
+    Word16 result[kMostFrameSamples];
+    std::fill_n(result, length, static_cast<Word16>(1000 * answer));
+    write_dump(epd->resultDumpFile, result, length);
+  }
+  return answer;
+}
+
+}  // namespace
+
+EpdInstance *EPD_Create(Word32 mode, Word32 pcmDumpEnabled) {
+  auto *epd = static_cast<EpdInstance *>(std::malloc(sizeof(EpdInstance)));
+  if (epd != nullptr) {
+    if (mode == 4) S1CHNSInit(&epd->secondary_suppressor, 0);
+    S1CHNSInit(&epd->suppressor, 2);
+    const Word32 rate_digit = (mode / 1000) % 10;
+    epd->rateMode = rate_digit > 1 ? 0 : rate_digit;
+    epd->epdMode = mode % 1000;
+    epd->inputGainMode = mode / 10000;
+    epd->HANGframe = -1;
+    epd->processedSamples = 0;
+    epd->abnormalCheckCount = 0;
+    epd->hangLogEnabled = 1;
+    epd->pcmDumpEnabled = pcmDumpEnabled;
+    InitKEPD(&epd);
+    InitNoiseEstimation(&epd);
+    if (dumps(*epd)) {
+      epd->inputDumpFile = open_dump(kDumpFolder, epd, kInputSuffix);
+      epd->resultDumpFile = open_dump(kDumpFolder, epd, kResultSuffix);
+    }
+  }
+  log_line(kLogDebug, kLogTag, "TQE: libOrvalis.so version %s %s in EPD Create, EPD MODE : %d",
+           kVersion, "IS127", mode);
+  return epd;
+}
+
+Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Word32 contentType) {
+  if (epd == nullptr) return -1;
+  log_format(*epd, numSample);
+  const DumpFilesPresent dump_files(*epd);
+  PublishedFlags<PlainFlags> flags;
+  PublishedFlags<NsFlags> ns_flags;
+
+  const Word32 length = frame_length(*epd);
+  Word32 running = epd->processedSamples;
+  Word16 abnormal_check_count = epd->abnormalCheckCount;
+  Word32 small_samples = 0;  // adds up over the frames of a call
+  Word32 result = 0;
+  for (Word32 rest = numSample; rest > 0; rest -= length, pcm += length) {
+    if (rest < length) return 0;  // whole frames only: this call is not counted
+    count_up(running, length);
+    if (is_null_frame(pcm, length, small_samples)) {
+      log_line(kLogDebug, kLogTag, "TQE: Null Check fail ... dont do EPD!");
+      continue;
+    }
+    Word16 frame[kMostFrameSamples];
+    std::copy_n(pcm, length, frame);
+    apply_input_gain(epd->inputGainMode, frame, length);
+    const bool settled = audio_settled(abnormal_check_count, running, length,
+                                       small_samples < kMostSmallSamples, kSettlingTexts);
+    const bool suppresses = settled && epd->rateMode == 0;
+    if (answer_frame(epd, frame, suppresses, contentType, *flags, *ns_flags) != kNoSpeech)
+      result = 1;
+  }
+  epd->processedSamples = running;
+  epd->abnormalCheckCount = abnormal_check_count;
+  return result;
+}
+
+Word32 reset_ALL_EPDparams(EpdInstance *epd) {
+  if (epd == nullptr) return -1;
+  epd->HANGframe = 0;
+  epd->hangLogEnabled = 1;
+  return KEPDfunc_Reset(&epd);
+}
+
+Word32 changeLogSetting(EpdInstance *epd) {
+  epd->hangLogEnabled = 0;
+  log_line(kLogDebug, kLogTag, "TQE: EPD(%li) LOG is disabled before ResetEPD", handle_number(epd));
+  return 0;
+}
+
+Word32 freeMemory_EPD(EpdInstance *epd) {
+  log_line(kLogDebug, kLogTag, "TQE: free EPD memory id : %li", handle_number(epd));
+  if (epd == nullptr || handle_number(epd) == -1) return -1;
+  if (dumps(*epd)) {
+    close_dump(epd->inputDumpFile);
+    close_dump(epd->resultDumpFile);
+  }
+  CloseKEPD(&epd);
+  std::free(epd);
+  return 0;
+}
+
+}  // namespace orvalis

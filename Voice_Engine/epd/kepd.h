@@ -1,0 +1,64 @@
+// End-point decision (KEPD) and noise-floor tracking: from voice decisions per frame to the answers
+// no speech, speech, end of speech.
+#pragma once
+
+#include <cstdint>
+
+#include "Voice_Engine/basic_op/flags.h"
+
+struct EpdInstance;
+
+namespace orvalis {
+
+/// Answers of KEPDfunc.
+inline constexpr Word32 kNoSpeech = 0;
+inline constexpr Word32 kSpeech = 1;
+inline constexpr Word32 kEndOfSpeech = 2;
+
+/// Decision state, part of the EPD instance.
+struct KepdState {
+  Word32 onset_cnt;      ///< voiced frames in a row
+  Word32 pause_cnt;      ///< unvoiced frames since speech was confirmed
+  Word32 in_speech;      ///< 1 while an utterance is open
+  Word32 long_speech;    ///< 1 once a pause has ended an utterance that was long enough
+  Word32 end_cnt;        ///< frames since long_speech was set
+  Word32 voiced_run;     ///< voiced frames in a row inside an utterance
+  Word32 speech_frames;  ///< frames of the open utterance
+  Word32 frame_cnt;      ///< frames since initialisation
+  float EnergyTHscore;   ///< exponent of the detector's energy gate
+};
+
+/// Noise-floor tracking state, part of the EPD instance. Energies are mean squares over 100.
+struct NoiseFloorState {
+  Word32 noise_frames;       ///< non-speech frames
+  Word32 speech_frames_ne;   ///< speech frames, stops at 45; 46 once KEPD has seen that
+  float speech_energy;       ///< sum, in the end mean, over the first 45 speech frames
+  float energy_hist[45];     ///< latest non-speech frames, oldest first
+  float noise_energy;        ///< running noise floor
+  float speech_noise_ratio;  ///< set once with the 45th speech frame
+};
+
+/// Clears the decision state and the detector of an instance; a sub-mode above 3 becomes 0.
+/// Returns 0, or -1 for a null record.
+Word32 InitKEPD(EpdInstance **handle);
+
+/// Clears the noise-floor state. Returns 0.
+Word32 InitNoiseEstimation(EpdInstance **handle);
+
+/// Answers one frame of the instance's length. Types from 2 on have the short timing. Returns -1
+/// for a null record.
+Word32 KEPDfunc(PlainFlags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type);
+
+/// Tracks the noise floor with the unsuppressed frame. The answer is not used. Returns 0.
+Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 answer);
+
+/// Forgets the open utterance. Returns 0.
+Word32 KEPDfunc_Reset(EpdInstance **handle);
+
+/// Holds nothing; returns 0.
+Word32 CloseKEPD(EpdInstance **handle);
+
+/// Mean square over 100, of 320 (mode 2), 160 (mode 0) or 80 samples.
+float getAbsoluteEnergy(const Word16 *x, Word32 rateMode);
+
+}  // namespace orvalis

@@ -1,0 +1,19 @@
+// Stateless questions about a block of samples: its energy in dB, its spectrum.
+#pragma once
+
+#include "Voice_Engine/basic_op/flags.h"
+
+namespace orvalis {
+
+/// 10 log10 of the variance of n samples, truncated to whole dB, at least 0.
+Word32 block_energy_db(const Word16 *x, Word32 n);
+
+/// The largest block_energy_db over blocks of 20 ms; the last one is read whole. 0 where n or the
+/// block length is below 1.
+Word32 largest_energy_db(const Word16 *x, Word32 n, Word32 rate_hz);
+
+/// Power spectrum 2 re^2 + 2 im^2 of one frame of sample pairs. Flag 0 takes 160 samples to 128
+/// bins, any other 80 samples to 64. Returns 1.
+Word32 getFrameSpectrum(PlainFlags &flags, const Word16 *x, Word32 *out, Word32 flag);
+
+}  // namespace orvalis

@@ -1,0 +1,140 @@
+#include "Voice_Engine/ns/s1chns.h"
+
+#include <algorithm>
+
+#include "Voice_Engine/basic_op/block_scaling.h"
+#include "Voice_Engine/epd/channel_tables.h"
+#include "Voice_Engine/epd/transform.h"
+
+namespace orvalis {
+namespace {
+
+constexpr int kFrame = 160;
+constexpr int kSynthesisOverlap = 96;
+constexpr int kBins = 128;
+constexpr Word16 kAnalysisHeadroom = 2;
+// Room for a spectrum whose parts add up; impulses may still saturate in the inverse transform.
+constexpr Word16 kSynthesisHeadroom = 4;
+constexpr Word16 kDeEmphasis = 26214;  // 0.8 in Q15
+
+/// Lowers the SNR indices of frames that hold little speech, so that single channels do not ring.
+void calm_channels(Word16 *snr, Word16 voice_metric) {
+  constexpr Word16 kSpeechLike = 12;
+  constexpr Word16 kKept = 13;
+  constexpr Word16 kLeastMetric = 56;
+  const auto speech_like = std::count_if(snr, snr + kSuppressionChannels,
+                                         [](Word16 index) { return index >= kSpeechLike; });
+  if (speech_like >= 5) return;
+  for (int i = 0; i < kSuppressionChannels; ++i) {
+    if (voice_metric < kLeastMetric || snr[i] < kKept) snr[i] = 1;
+  }
+}
+
+/// Gain of a channel in Q15 from its SNR index and the overall gain in dB, Q21.
+Word16 channel_gain(NsFlags &flags, Word16 snr, Word32 base_q21, Word16 slope_q15) {
+  constexpr Word16 kLeastSnr = 6;
+  constexpr Word16 kGainPerStep = 14879;  // 0.454 dB, in Q21 after L_mult and L_shl
+  const Word16 steps = sub(flags, std::max(snr, kLeastSnr), kLeastSnr);
+  const Word32 rise = L_shl(flags, L_mult(flags, steps, kGainPerStep), 5);
+  const Word32 gain_q21 = std::min(L_add(flags, rise, base_q21), Word32{0});
+  Word32 exponent_q26 = L_shl(flags, L_mpy_ls(flags, gain_q21, slope_q15), 5);
+  if (exponent_q26 == 0) exponent_q26 = -1;  // fnExp10 is at its best below 0
+  return extract_h(fnExp10(flags, exponent_q26));
+}
+
+/// Sets the gains of all bins.
+void set_gains(NsFlags &flags, S1chnsState &ns, ChannelFindings &found) {
+  const Word32 noise = sum_energies(flags, ns.ch_noise, kSuppressionChannels);
+  const Word32 noise_level = L_negate(log10_energy(flags, noise));
+  const Word32 base_q21 = std::max(L_mpy_ls(flags, noise_level, kDecibels), ns.min_gain_q21);
+  calm_channels(found.snr, found.voice_metric);
+  for (int i = 0; i < kSuppressionChannels; ++i) {
+    const Word16 gain = channel_gain(flags, found.snr[i], base_q21, ns.gain_slope_q15);
+    const ChannelBins bins = kSuppression.bins[i];
+    std::fill(&ns.bin_gain_q15[bins.first], &ns.bin_gain_q15[bins.last + 1], gain);
+  }
+}
+
+/// Brings a spectrum that is scaled by 2^shift back to samples.
+void synthesise(NsFlags &flags, Word16 *buffer, Word16 shift) {
+  const Word16 spectrum_shift =
+      block_norm_AL(flags, buffer, kMostTransformSize, kSynthesisHeadroom);
+  real_fft(flags, buffer, Direction::kInverse, ns_transform_plan());
+  block_denorm_AL(flags, buffer, kMostTransformSize, add(flags, shift, spectrum_shift));
+}
+
+void overlap_add(NsFlags &flags, Word16 *buffer, Word16 *tail) {
+  for (int i = 0; i < kSynthesisOverlap; ++i) buffer[i] = add(flags, buffer[i], tail[i]);
+  std::copy_n(&buffer[kFrame], kSynthesisOverlap, tail);
+}
+
+/// Undoes the pre-emphasis. The first product truncates, the others round.
+void de_emphasise(NsFlags &flags, const Word16 *x, Word16 &memory, Word16 *in, Word16 *out) {
+  Word16 feedback = mult(flags, kDeEmphasis, memory);
+  for (int i = 0; i < kFrame; ++i) {
+    if (i > 0) feedback = mult_r(flags, kDeEmphasis, memory);
+    memory = add(flags, x[i], feedback);
+    in[i] = memory;
+    out[i] = memory;
+  }
+}
+
+}  // namespace
+
+Word32 S1CHNSInit(S1chnsState *state, Word16 mode) {
+  S1chnsState &ns = *state;
+  ns.frame_cnt = 0;
+  ns.first_frame = 1;
+  ns.gain_slope_q15 = 1638;
+  ns.init_mode = mode;
+  ns.min_gain_q21 = mode == 2   ? word32(0xFDB33333)
+                    : mode == 3 ? word32(0xFF400000)
+                                : word32(0xFE600000);
+  ns.pre_emp_mem = 0;
+  ns.de_emp_mem = 0;
+  ns.update_cnt = 0;
+  ns.hyster_cnt = 0;
+  ns.last_update_cnt = 0;
+  std::ranges::fill(ns.synthesis_overlap, Word16{0});
+  std::ranges::fill(ns.bin_gain_q15, Word16{0});
+  std::ranges::fill(ns.analysis_overlap, Word16{0});
+  std::ranges::fill(ns.ch_enrg, 0);
+  ns.prev_shift = 0;
+  return 0;
+}
+
+void s1chns_C(NsFlags &flags, S1chnsState *state, Word16 *in, Word16 *out) {
+  S1chnsState &ns = *state;
+  const ChannelPlan &plan = kSuppression;
+  if (ns.frame_cnt != MAX_16) ns.frame_cnt += 1;
+
+  const Word16 shift = block_norm_AL(flags, in, kFrame, kAnalysisHeadroom);
+  Word16 buffer[kMostTransformSize];
+  assemble_frame(flags, plan, in, shift, ns.prev_shift, ns.pre_emp_mem, ns.analysis_overlap,
+                 buffer);
+  window_edges(flags, plan, buffer);
+  real_fft(flags, buffer, Direction::kForward, ns_transform_plan());
+
+  ChannelState channels = {.energy = ns.ch_enrg,
+                           .noise = ns.ch_noise,
+                           .long_term_q5 = ns.ch_enrg_long_db,
+                           .update_cnt = ns.update_cnt,
+                           .hyster_cnt = ns.hyster_cnt,
+                           .last_update_cnt = ns.last_update_cnt,
+                           .frame_cnt = ns.frame_cnt,
+                           .first_frame = ns.first_frame == 1};
+  ChannelFindings found = analyse_channels(flags, plan, channels, buffer, shift);
+  set_gains(flags, ns, found);
+  if (found.is_noise) track_noise(flags, plan, channels);
+
+  for (int k = 0; k < kBins; ++k) {
+    buffer[2 * k] = mult(flags, buffer[2 * k], ns.bin_gain_q15[k]);
+    buffer[2 * k + 1] = mult(flags, buffer[2 * k + 1], ns.bin_gain_q15[k]);
+  }
+  synthesise(flags, buffer, shift);
+  overlap_add(flags, buffer, ns.synthesis_overlap);
+  de_emphasise(flags, buffer, ns.de_emp_mem, in, out);
+  ns.first_frame = 0;
+}
+
+}  // namespace orvalis

@@ -1,0 +1,43 @@
+#include "Voice_Engine/platform/dump_file.h"
+
+#include <cstdint>
+#include <cstring>
+
+namespace orvalis {
+namespace {
+
+constexpr std::size_t kPathSize = 256;
+constexpr std::size_t kLongestHandle = 20;
+constexpr std::size_t kLongestSuffix = sizeof "_resultEPD.pcm" - 1;
+constexpr std::size_t kRootSize =
+    kPathSize - (sizeof kDumpFolder - 1) - kLongestHandle - kLongestSuffix;
+
+constinit char root[kRootSize] = "";
+
+}  // namespace
+
+bool set_dump_root(const char *directory) {
+  const std::size_t length = directory == nullptr ? 0 : std::strlen(directory);
+  if (length >= kRootSize) return false;
+  std::memcpy(root, directory == nullptr ? "" : directory, length + 1);
+  return true;
+}
+
+std::FILE *open_dump(const char *folder, const void *handle, const char *suffix) {
+  char path[kPathSize];
+  const auto number = static_cast<long>(reinterpret_cast<std::intptr_t>(handle));
+  std::snprintf(path, sizeof path, "%s%s%ld%s", root, folder, number, suffix);
+  return std::fopen(path, "ab");
+}
+
+void write_dump(std::FILE *file, const Word16 *samples, int count) {
+  if (file == nullptr) return;
+  [[maybe_unused]] const std::size_t written =
+      std::fwrite(samples, sizeof *samples, static_cast<std::size_t>(count), file);
+}
+
+void close_dump(std::FILE *file) {
+  if (file != nullptr) std::fclose(file);
+}
+
+}  // namespace orvalis

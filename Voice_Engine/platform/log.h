@@ -1,0 +1,22 @@
+// Log lines: to Android's log there, elsewhere to the host's sink or standard error.
+#pragma once
+
+namespace orvalis {
+
+inline constexpr char kLogTag[] = "Orvalis";
+
+/// Priorities of the Android log.
+inline constexpr int kLogDebug = 3;
+inline constexpr int kLogInfo = 4;
+inline constexpr int kLogError = 6;
+
+using LogSink = void (*)(int priority, const char *tag, const char *text, void *user);
+
+/// Directs log lines; null restores standard error. Not to be changed while instances run.
+void set_log_sink(LogSink sink, void *user);
+
+/// Writes one line. Texts longer than 255 bytes are cut.
+__attribute__((format(printf, 3, 4))) void log_line(int priority, const char *tag,
+                                                    const char *format, ...);
+
+}  // namespace orvalis

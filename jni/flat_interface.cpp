@@ -1,0 +1,78 @@
+// The flat C interface: judges arguments, then forwards. The core behind it trusts them.
+#include "Voice_Engine/epd/epd_instance.h"
+#include "Voice_Engine/epd/queries.h"
+#include "Voice_Engine/platform/dump_file.h"
+#include "Voice_Engine/platform/export.h"
+#include "Voice_Engine/platform/log.h"
+#include "jni/orvalis.h"
+
+namespace {
+
+// Exported names may be interposed by a host, so they never call one another.
+int32_t process_frames(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
+                       int32_t contentType) {
+  if (pcm == nullptr && numSample > 0) return -1;
+  return orvalis::EPD_Proc_Frame(epd, pcm, numSample, contentType);
+}
+
+}  // namespace
+
+extern "C" {
+
+ORVALIS_EXPORT const char *GetVersion(void) { return orvalis::kVersion; }
+
+ORVALIS_EXPORT EpdInstance *InitializeEPD(int32_t mode, int32_t pcmDumpEnabled) {
+  return orvalis::EPD_Create(mode, pcmDumpEnabled);
+}
+
+ORVALIS_EXPORT int32_t ProcessEPDFrameByCnttype(EpdInstance *epd, const int16_t *pcm,
+                                                int32_t numSample, int32_t contentType) {
+  return process_frames(epd, pcm, numSample, contentType);
+}
+
+ORVALIS_EXPORT int32_t ProcessEPDFrameByMode(EpdInstance *epd, const int16_t *pcm,
+                                             int32_t numSample, int32_t mode) {
+  return process_frames(epd, pcm, numSample, mode);
+}
+
+ORVALIS_EXPORT int32_t ProcessEPDFrame(EpdInstance *epd, const int16_t *pcm, int32_t numSample) {
+  if (epd == nullptr) return -1;
+  return process_frames(epd, pcm, numSample, epd->rateMode);
+}
+
+ORVALIS_EXPORT int32_t ResetEPDparams(EpdInstance *epd) {
+  return orvalis::reset_ALL_EPDparams(epd);
+}
+
+ORVALIS_EXPORT int32_t setLogging(EpdInstance *epd, int32_t /*value*/) {
+  if (epd == nullptr) return -1;
+  return orvalis::changeLogSetting(epd);
+}
+
+ORVALIS_EXPORT int32_t FreeMemoryEPD(EpdInstance *epd) { return orvalis::freeMemory_EPD(epd); }
+
+ORVALIS_EXPORT int32_t computeEnergy(const int16_t *pcm, int32_t n) {
+  return pcm == nullptr ? 0 : orvalis::block_energy_db(pcm, n);
+}
+
+ORVALIS_EXPORT int32_t ComputeEnergy(const int16_t *pcm, int32_t numSample, int32_t samplingRate) {
+  return pcm == nullptr ? 0 : orvalis::largest_energy_db(pcm, numSample, samplingRate);
+}
+
+ORVALIS_EXPORT int32_t getSpectrum(const int16_t *pcm, int32_t *spectrum, int32_t samplingRate) {
+  if (pcm == nullptr || spectrum == nullptr) return 0;
+  orvalis::PublishedFlags<orvalis::PlainFlags> flags;
+  return orvalis::getFrameSpectrum(*flags, pcm, spectrum, samplingRate == 16000 ? 0 : 1);
+}
+
+ORVALIS_EXPORT void SetLogSink(void (*sink)(int priority, const char *tag, const char *text,
+                                            void *user),
+                               void *user) {
+  orvalis::set_log_sink(sink, user);
+}
+
+ORVALIS_EXPORT int32_t SetDumpRoot(const char *directory) {
+  return orvalis::set_dump_root(directory) ? 0 : -1;
+}
+
+}  // extern "C"
