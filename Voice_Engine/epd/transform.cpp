@@ -23,37 +23,50 @@ void bit_reverse(Word16 *x, Word32 size) {
   }
 }
 
-/// Radix-2 butterfly with the twiddle factor c + j s; the inverse uses its conjugate. Forward
-/// halves its outputs. Index arithmetic needs no operators: the last sum overwrites the flag.
-template <Direction kDirection, class FlagSet>
-inline void butterfly(FlagSet &flags, Word16 *upper, Word16 *lower, Word16 c, Word16 s) {
-  constexpr bool kForward = kDirection == Direction::kForward;
-  Word32 re = L_mult(flags, lower[0], c);
-  Word32 im = L_mult(flags, lower[1], c);
-  re = kForward ? L_msu(flags, re, lower[1], s) : L_mac(flags, re, lower[1], s);
-  im = kForward ? L_mac(flags, im, lower[0], s) : L_msu(flags, im, lower[0], s);
-  const Word16 turned_re = round_BOP(flags, re);
-  const Word16 turned_im = round_BOP(flags, im);
-
-  constexpr int kHalving = kForward ? 1 : 0;
-  lower[0] = shift_right(sub(flags, upper[0], turned_re), kHalving);
-  lower[1] = shift_right(sub(flags, upper[1], turned_im), kHalving);
-  upper[0] = shift_right(add(flags, upper[0], turned_re), kHalving);
-  upper[1] = shift_right(add(flags, upper[1], turned_im), kHalving);
+constexpr Word16 saturated(Word32 x) {
+  return static_cast<Word16>(x > MAX_16 ? MAX_16 : x < MIN_16 ? MIN_16 : x);
 }
 
-template <Direction kDirection, class FlagSet>
-void complex_stages(FlagSet &flags, Word16 *x, const TransformPlan &plan) {
+/// Rounds a Q30 sum of two products to Q15: what round_BOP(L_mac(L_mult())) gives. A twiddle factor
+/// has |c| + |s| < 46342, so the sum stays below 2^31 and only its end can saturate.
+constexpr Word16 rounded_q15(Word32 sum_q30) { return saturated((sum_q30 + 0x4000) >> 15); }
+
+/// Radix-2 butterfly with the twiddle factor c + j s; the inverse uses its conjugate. Forward
+/// halves its outputs. Returns its last sum before saturation: each butterfly overwrites the
+/// overflow flag with that sum's, so only the very last one's is ever seen.
+template <Direction kDirection>
+inline Word32 butterfly(Word16 *upper, Word16 *lower, Word16 c, Word16 s) {
+  constexpr bool kForward = kDirection == Direction::kForward;
+  const Word32 across_re = kForward ? -lower[1] * s : lower[1] * s;
+  const Word32 across_im = kForward ? lower[0] * s : -lower[0] * s;
+  const Word16 re = rounded_q15(lower[0] * c + across_re);
+  const Word16 im = rounded_q15(lower[1] * c + across_im);
+
+  constexpr int kHalving = kForward ? 1 : 0;
+  const Word32 last_sum = upper[1] + im;
+  lower[0] = shift_right(saturated(upper[0] - re), kHalving);
+  lower[1] = shift_right(saturated(upper[1] - im), kHalving);
+  upper[0] = shift_right(saturated(upper[0] + re), kHalving);
+  upper[1] = shift_right(saturated(last_sum), kHalving);
+  return last_sum;
+}
+
+/// The complex transform. Returns the last sum, unsaturated: all that the flag will tell of it.
+template <Direction kDirection>
+Word32 complex_stages(Word16 *x, const TransformPlan &plan) {
   bit_reverse(x, plan.size);
+  Word32 last_sum = 0;
   for (Word32 stage = 0; stage < plan.stages; ++stage) {
     const Word32 half_span = 2 << stage;
-    for (Word32 j = 0; j < half_span; j += 2) {
-      const Word16 *twiddle = &plan.twiddles[j * plan.steps[stage]];
-      for (Word32 k = j; k < plan.size; k += 2 * half_span) {
-        butterfly<kDirection>(flags, &x[k], &x[k + half_span], twiddle[0], twiddle[1]);
+    const Word32 twiddle_step = plan.steps[stage];
+    for (Word32 k = 0; k < plan.size; k += 2 * half_span) {
+      for (Word32 j = 0; j < half_span; j += 2) {
+        const Word16 *twiddle = &plan.twiddles[j * twiddle_step];
+        last_sum = butterfly<kDirection>(&x[k + j], &x[k + j + half_span], twiddle[0], twiddle[1]);
       }
     }
   }
+  return last_sum;
 }
 
 template <class FlagSet>
@@ -109,20 +122,20 @@ void split(FlagSet &flags, Word16 *x, const TransformPlan &plan) {
 template <class FlagSet>
 void complex_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
   if (direction == Direction::kForward) {
-    complex_stages<Direction::kForward>(flags, x, plan);
+    sature(flags, complex_stages<Direction::kForward>(x, plan));
   } else {
-    complex_stages<Direction::kInverse>(flags, x, plan);
+    sature(flags, complex_stages<Direction::kInverse>(x, plan));
   }
 }
 
 template <class FlagSet>
 void real_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
   if (direction == Direction::kForward) {
-    complex_stages<Direction::kForward>(flags, x, plan);
+    sature(flags, complex_stages<Direction::kForward>(x, plan));
     split<Direction::kForward>(flags, x, plan);
   } else {
     split<Direction::kInverse>(flags, x, plan);
-    complex_stages<Direction::kInverse>(flags, x, plan);
+    sature(flags, complex_stages<Direction::kInverse>(x, plan));
   }
 }
 
