@@ -1,0 +1,183 @@
+// Where the utterances of real recordings lie, clean and in noise: against the recordings' own
+// energy and the number of words that their transcripts hold.
+#include <gtest/gtest.h>
+
+#include <fstream>
+#include <map>
+#include <numeric>
+#include <sstream>
+
+#include "jni/orvalis.h"
+#include "stream/utterance_stream.h"
+#include "tests/support/noise.h"
+#include "tests/support/recordings.h"
+
+namespace {
+
+using namespace orvalis::test;
+
+struct Span {
+  double start_s;
+  double end_s;
+};
+
+std::vector<Span> utterances_of(const Pcm &pcm, int32_t rate_hz) {
+  UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
+  settings.rate_hz = rate_hz;
+  UtteranceStream *stream = OpenUtteranceStream(&settings);
+  EXPECT_EQ(PushUtteranceAudio(stream, pcm.data(), static_cast<int32_t>(pcm.size())),
+            static_cast<int32_t>(pcm.size()));
+  FlushUtteranceStream(stream);
+  std::vector<Span> spans;
+  for (Utterance next; NextUtterance(stream, &next) == 1;) {
+    spans.push_back({double(next.start) / rate_hz, double(next.end) / rate_hz});
+  }
+  CloseUtteranceStream(stream);
+  return spans;
+}
+
+/// The range of a recording's frames whose level reaches its loudest frame's less `below_db`.
+Span active_range(const Pcm &pcm, int32_t rate_hz, double below_db) {
+  const auto levels = frame_levels(pcm, static_cast<std::size_t>(rate_hz / 100));
+  const double threshold = *std::max_element(levels.begin(), levels.end()) - below_db;
+  const auto is_active = [&](double level) { return level >= threshold; };
+  const auto first = std::find_if(levels.begin(), levels.end(), is_active);
+  const auto last = std::find_if(levels.rbegin(), levels.rend(), is_active);
+  return {0.01 * double(first - levels.begin()), 0.01 * double(levels.rend() - last)};
+}
+
+/// The range that holds all of a recording's energy but `rest` of it on either side.
+Span energetic_range(const Pcm &pcm, int32_t rate_hz, double rest) {
+  std::vector<double> energy;
+  double sum = 0;
+  for (const std::int16_t sample : pcm) energy.push_back(sum += double(sample) * sample);
+  const auto time_of = [&](double share) {
+    const auto at = std::lower_bound(energy.begin(), energy.end(), share * sum);
+    return double(at - energy.begin()) / rate_hz;
+  };
+  return {time_of(rest), time_of(1 - rest)};
+}
+
+/// Mean level of the frames within 30 dB of the loudest one.
+double speech_level(const Pcm &pcm, int32_t rate_hz) {
+  const auto levels = frame_levels(pcm, static_cast<std::size_t>(rate_hz / 100));
+  const double threshold = *std::max_element(levels.begin(), levels.end()) - 30;
+  double power = 0;
+  int frames = 0;
+  for (const double level : levels) {
+    if (level < threshold) continue;
+    power += std::pow(10, level / 10);
+    ++frames;
+  }
+  return 10 * std::log10(power / frames);
+}
+
+/// The recording with noise `below_db` under its speech and `margin` samples of that noise around.
+Pcm in_noise(const Pcm &speech, std::size_t margin, NoiseColour colour, double level_db) {
+  const auto noise = unit_noise(speech.size() + 2 * margin, colour, 20260705);
+  const double scale = std::pow(10, level_db / 20);
+  Pcm mixed(noise.size());
+  for (std::size_t i = 0; i < mixed.size(); ++i) {
+    const bool inside = i >= margin && i < margin + speech.size();
+    mixed[i] = to_sample(scale * noise[i] + (inside ? speech[i - margin] : 0));
+  }
+  return mixed;
+}
+
+/// Words of each recording by its name, from lines like "<s> ten of clubs </s> (001)".
+std::map<std::string, int> words_of(const std::string &transcript) {
+  std::ifstream file(std::string(ORVALIS_SPEECH_16K) + "/" + transcript);
+  EXPECT_TRUE(file) << transcript;
+  std::map<std::string, int> words;
+  for (std::string line; std::getline(file, line);) {
+    std::istringstream fields(line);
+    int count = 0;
+    for (std::string field; fields >> field;) {
+      if (field.front() == '(') words[field.substr(1, field.size() - 2)] = count;
+      if (field.front() != '<' && field.front() != '(') ++count;
+    }
+  }
+  return words;
+}
+
+struct Condition {
+  const char *name;
+  NoiseColour colour;
+  double below_db;
+  double start_slack_s;  // how much of the loud part may be missing
+  double end_slack_s;
+};
+
+// Clean means noise so low that it only keeps the pauses from being null audio.
+const Condition kConditions[] = {{"clean", NoiseColour::kWhite, 60, 0.05, 0.05},
+                                 {"white at 20 dB", NoiseColour::kWhite, 20, 0.05, 0.05},
+                                 {"pink at 20 dB", NoiseColour::kPink, 20, 0.05, 0.05},
+                                 {"white at 10 dB", NoiseColour::kWhite, 10, 0.10, 0.20},
+                                 {"pink at 10 dB", NoiseColour::kPink, 10, 0.10, 0.20}};
+
+TEST(Recordings, EachSentenceIsOneUtteranceWhereItsWordsAre) {
+  auto words = words_of("librivox/transcription");
+  words.merge(words_of("cards/cards.transcription"));
+  ASSERT_EQ(words.size(), 10u);
+  for (const auto &[name, count] : words) {
+    const bool is_card = name.size() == 3;
+    const Pcm speech = speech_16k((is_card ? "cards/" : "librivox/") + name + ".wav");
+    const Span loud = energetic_range(speech, 16000, 0.005);
+    const Span audible = active_range(speech, 16000, 40);
+    for (const Condition &condition : kConditions) {
+      SCOPED_TRACE(name + ", " + condition.name);
+      constexpr double kMargin_s = 1.5;
+      const double level = speech_level(speech, 16000) - condition.below_db;
+      const Pcm mixed = in_noise(speech, 24000, condition.colour, level);
+      const auto found = utterances_of(mixed, 16000);
+      ASSERT_EQ(found.size(), 1u);
+      const Span span = {found[0].start_s - kMargin_s, found[0].end_s - kMargin_s};
+      EXPECT_LT(span.start_s, loud.start_s + condition.start_slack_s);
+      EXPECT_GT(span.end_s, loud.end_s - condition.end_slack_s);
+      EXPECT_GT(span.start_s, audible.start_s - 0.05);
+      EXPECT_LT(span.end_s, audible.end_s + 0.05);
+      const double seconds_per_word = (span.end_s - span.start_s) / count;
+      EXPECT_GT(seconds_per_word, 0.18);
+      EXPECT_LT(seconds_per_word, 0.60);
+    }
+  }
+}
+
+TEST(Recordings, CommandsAndNumbersAreFoundAtBothRates) {
+  struct Recording {
+    const char *name;
+    int32_t rate_hz;
+  };
+  for (const Recording &recording : {Recording{"goforward.raw", 16000},
+                                     {"something.raw", 16000},
+                                     {"tidigits/dhd.2934z.raw", 16000},
+                                     {"wav/hts1a.wav", 8000},
+                                     {"wav/big_dog.wav", 8000}}) {
+    SCOPED_TRACE(recording.name);
+    const Pcm speech =
+        recording.rate_hz == 16000 ? speech_16k(recording.name) : speech_8k(recording.name);
+    const Span loud = energetic_range(speech, recording.rate_hz, 0.005);
+    const double level = speech_level(speech, recording.rate_hz);
+    const auto margin = static_cast<std::size_t>(recording.rate_hz * 3 / 2);
+    for (const double below_db : {60.0, 20.0}) {
+      const auto found = utterances_of(
+          in_noise(speech, margin, NoiseColour::kPink, level - below_db), recording.rate_hz);
+      ASSERT_EQ(found.size(), 1u) << below_db;
+      EXPECT_LT(found[0].start_s - 1.5, loud.start_s + 0.1) << below_db;
+      EXPECT_GT(found[0].end_s - 1.5, loud.end_s - 0.1) << below_db;
+    }
+  }
+}
+
+TEST(Recordings, SteadyNoiseHoldsNoUtterance) {
+  for (const int32_t rate_hz : {16000, 8000}) {
+    for (const double dbfs : {-50.0, -30.0}) {
+      const double level = 20 * std::log10(32768) + dbfs;
+      const Pcm noise =
+          in_noise({}, static_cast<std::size_t>(rate_hz) * 30, NoiseColour::kWhite, level);
+      EXPECT_TRUE(utterances_of(noise, rate_hz).empty()) << rate_hz << " Hz, " << dbfs << " dBFS";
+    }
+  }
+}
+
+}  // namespace
