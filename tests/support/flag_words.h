@@ -1,0 +1,37 @@
+// The six process-wide flag words as one value, to prove who touches which.
+#pragma once
+
+#include <array>
+
+#include "basic_op.h"
+
+namespace orvalis::test {
+
+enum Copy { PLAIN, NS, ZOLT };
+
+/// Overflow and carry of the plain, the ns_ and the ZOLT_ copy.
+using FlagWords = std::array<int, 6>;
+
+inline FlagWords read_flags() {
+  return {Overflow, Carry, ns_Overflow, ns_Carry, Overflow_ZOLT, Carry_ZOLT};
+}
+
+inline void write_flags(const FlagWords &words) {
+  Overflow = words[0];
+  Carry = words[1];
+  ns_Overflow = words[2];
+  ns_Carry = words[3];
+  Overflow_ZOLT = static_cast<int16_t>(words[4]);
+  Carry_ZOLT = static_cast<int16_t>(words[5]);
+}
+
+/// One copy's flags as given; the others hold a value that no operator writes.
+inline FlagWords flags_of(Copy copy, int overflow, int carry) {
+  FlagWords words;
+  words.fill(7);
+  words[2 * copy] = overflow;
+  words[2 * copy + 1] = carry;
+  return words;
+}
+
+}  // namespace orvalis::test
