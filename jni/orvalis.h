@@ -168,7 +168,7 @@ int32_t computeEnergy(const int16_t *pcm, int32_t n);
 int32_t ComputeEnergy(const int16_t *pcm, int32_t numSample, int32_t samplingRate);
 
 /*
- * Power spectrum of one frame: 2 re^2 + 2 im^2 of each bin, saturated at 2^31 - 1, of a complex
+ * Power spectrum of one frame: 2 re^2 + 2 im^2 of each bin, at most 2^30, of a complex
  * transform over sample pairs (even samples real, odd ones imaginary, zero-padded, no window),
  * scaled by the reciprocal of its size.
  *

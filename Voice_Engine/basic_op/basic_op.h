@@ -110,7 +110,7 @@ int32_t L_macNs(int32_t sum, int16_t a, int16_t b); /* L_add_c(sum, L_mult(a, b)
 int32_t ns_L_macNs(int32_t sum, int16_t a, int16_t b);
 int32_t L_msuNs(int32_t sum, int16_t a, int16_t b); /* L_sub_c(sum, L_mult(a, b)) */
 int32_t ns_L_msuNs(int32_t sum, int16_t a, int16_t b);
-int32_t L_sat(int32_t x); /* x, or the end of the range that the flags name; clears both flags */
+int32_t L_sat(int32_t x); /* x; after an overflow the end of the range, clearing both flags */
 int32_t ns_L_sat(int32_t x);
 
 /* ---- 32-bit shifts -------------------------------------------------------------------------- */

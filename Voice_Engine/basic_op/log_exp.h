@@ -42,8 +42,7 @@ inline Word32 fnLog2(FlagSet &flags, Word32 x) {
   const Word16 exponent = negate(add(flags, shift, 1));
   Word32 polynomial = L_mult(flags, mult_r(flags, mantissa, mantissa), -11050);
   polynomial = L_mac(flags, polynomial, mantissa, 32709);
-  constexpr Word32 kConstant = -21712 * 65536 + 43824;
-  polynomial = L_add(flags, polynomial, kConstant) >> 3;
+  polynomial = L_add(flags, polynomial, L_deposit_h(-21712)) >> 3;
   return L_add(flags, polynomial & 0x03FFFFFF, L_deposit_h(shl(flags, exponent, 10)));
 }
 

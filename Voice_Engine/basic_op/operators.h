@@ -207,7 +207,7 @@ inline Word32 L_msuNs(FlagSet &flags, Word32 sum, Word16 a, Word16 b) {
   return L_sub_c(flags, sum, L_mult(flags, a, b));
 }
 
-/// After carry arithmetic: the end of the range that overflowed, or x; clears both flags.
+/// After carry arithmetic: x, or if it overflowed the end of the range, clearing both flags.
 template <class FlagSet>
 inline Word32 L_sat(FlagSet &flags, Word32 x) {
   if (flags.overflow == 0) return x;
