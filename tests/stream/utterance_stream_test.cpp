@@ -15,11 +15,10 @@
 #include "jni/orvalis.h"
 #include "tests/support/random.h"
 #include "tests/support/recordings.h"
-#include "tests/support/wrapped_malloc.h"
+#include "tests/support/scripted_malloc.h"
 
 namespace {
 
-using orvalis::test::malloc_control;
 using orvalis::test::Pcm;
 
 // One character a frame: '1' speech, '0' none, 'n' null audio.
@@ -353,11 +352,9 @@ TEST(UtteranceStream, RefusesBadArguments) {
 
 TEST(UtteranceStream, OpensOnlyWithAllItsMemory) {
   const UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
-  for (int failing = 0; failing < 2; ++failing) {
-    malloc_control.calls_until_failure = failing;
-    UtteranceStream *stream = OpenUtteranceStream(&settings);
-    malloc_control.calls_until_failure = -1;
-    EXPECT_EQ(stream, nullptr) << "allocation " << failing;
+  for (int granted = 0; granted < 2; ++granted) {
+    const auto script = orvalis::test::ScriptedMalloc::failing(granted);
+    EXPECT_EQ(OpenUtteranceStream(&settings), nullptr) << granted;
   }
   EXPECT_NE(open(settings), nullptr);
 }

@@ -1,10 +1,12 @@
-// The real recordings that tests run on.
+// Recordings of speech, as samples. A file that is missing or of another kind ends the test.
 #pragma once
 
-#include <gtest/gtest.h>
-
+#include <algorithm>
 #include <cstdint>
-#include <cstdio>
+#include <cstring>
+#include <fstream>
+#include <iterator>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -12,32 +14,35 @@ namespace orvalis::test {
 
 using Pcm = std::vector<std::int16_t>;
 
-/// Reads 16-bit PCM; of a WAV file, what follows its 44-byte header. A missing file fails the test.
-inline Pcm read_pcm(const std::string &path) {
-  std::FILE *file = std::fopen(path.c_str(), "rb");
-  if (file == nullptr) {
-    ADD_FAILURE() << "no recording " << path;
-    return {};
+/// Mono 16-bit samples of a WAV file, or of a headerless one of native byte order.
+inline Pcm load_recording(const std::string &path) {
+  std::ifstream file(path, std::ios::binary);
+  const std::string bytes{std::istreambuf_iterator<char>(file), {}};
+  std::size_t begin = 0;
+  std::size_t end = bytes.size();
+  if (bytes.starts_with("RIFF")) {
+    // Format 1 (PCM), one channel; block size and width of a sample.
+    const bool is_mono_pcm = bytes.compare(8, 12, std::string("WAVEfmt \x10\0\0\0", 12)) == 0 &&
+                             bytes.compare(20, 4, std::string("\1\0\1\0", 4)) == 0 &&
+                             bytes.compare(32, 8, std::string("\2\0\x10\0data", 8)) == 0;
+    if (!is_mono_pcm || bytes.size() < 44) throw std::runtime_error(path + ": not mono 16-bit PCM");
+    std::uint32_t data_bytes = 0;
+    std::memcpy(&data_bytes, &bytes[40], sizeof data_bytes);
+    begin = 44;
+    end = std::min(end, begin + data_bytes);
   }
-  if (path.ends_with(".wav")) std::fseek(file, 44, SEEK_SET);
-  Pcm pcm;
-  std::int16_t block[4096];
-  while (const std::size_t read = std::fread(block, sizeof *block, 4096, file)) {
-    pcm.insert(pcm.end(), block, block + read);
-  }
-  std::fclose(file);
-  EXPECT_FALSE(pcm.empty()) << path;
-  return pcm;
+  Pcm samples((end - begin) / 2);
+  if (samples.empty()) throw std::runtime_error(path + ": no samples");
+  std::memcpy(samples.data(), &bytes[begin], 2 * samples.size());
+  return samples;
 }
 
-/// A recording at 16 kHz, by its name below the folder of the spoken sentences.
 inline Pcm speech_16k(const std::string &name) {
-  return read_pcm(std::string(ORVALIS_SPEECH_16K) + "/" + name);
+  return load_recording(std::string(ORVALIS_SPEECH_16K "/") + name);
 }
 
-/// A recording at 8 kHz.
 inline Pcm speech_8k(const std::string &name) {
-  return read_pcm(std::string(ORVALIS_SPEECH_8K) + "/" + name);
+  return load_recording(std::string(ORVALIS_SPEECH_8K "/") + name);
 }
 
 /// Read sentences at 16 kHz, in the order of their transcripts.
