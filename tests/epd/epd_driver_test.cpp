@@ -133,8 +133,8 @@ TEST_F(EpdDriver, UnpacksTheMode) {
                                   {INT32_MAX, 0, 0, 214748},
                                   {INT32_MIN, 0, -3, -214748}};
   for (const auto &[mode, sub_mode, rate_mode, gain] : kCases) {
-    log.take();
-    const Detector epd(InitializeEPD(mode, 0));
+    Detector epd(InitializeEPD(mode, 0));
+    const std::string id = number(epd.get());
     EXPECT_EQ(log.take(), LogLines{version_line(mode)});
     EXPECT_EQ(epd->rateMode, rate_mode) << mode;
     EXPECT_EQ(epd->inputGainMode, gain) << mode;
@@ -145,6 +145,9 @@ TEST_F(EpdDriver, UnpacksTheMode) {
     EXPECT_EQ(epd->processedSamples, length);
     EXPECT_EQ(epd->suppressor.frame_cnt, wide ? 1 : 0);
     EXPECT_TRUE(mode != 4 || epd->secondary_suppressor.frame_cnt == 0);
+    log.take();
+    epd.reset();
+    EXPECT_EQ(log.take(), LogLines{debug_line("TQE: free EPD memory id : " + id)});
   }
   EXPECT_STREQ(GetVersion(), "160705");
 }
