@@ -353,7 +353,7 @@ TEST(UtteranceStream, RefusesBadArguments) {
 TEST(UtteranceStream, OpensOnlyWithAllItsMemory) {
   const UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   for (int granted = 0; granted < 2; ++granted) {
-    const auto script = orvalis::test::ScriptedMalloc::failing(granted);
+    const auto memory = orvalis::test::ScriptedMalloc::failing(granted);
     EXPECT_EQ(OpenUtteranceStream(&settings), nullptr) << granted;
   }
   EXPECT_NE(open(settings), nullptr);
