@@ -1,0 +1,297 @@
+// The built tool as its users run it: command line in, text and exit status out.
+#include <gtest/gtest.h>
+#include <samplerate.h>
+
+#include <algorithm>
+#include <array>
+#include <fstream>
+#include <nlohmann/json.hpp>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "tests/support/audio_file.h"
+#include "tests/support/child_process.h"
+#include "tests/support/temporary_folder.h"
+
+namespace orvalis::test {
+namespace {
+
+using Json = nlohmann::json;
+
+const std::string kWide = ORVALIS_SPEECH_16K "/cards/005.wav";
+const std::string kWideRaw = ORVALIS_SPEECH_16K "/goforward.raw";
+const std::string kNarrow = ORVALIS_SPEECH_8K "/wav/all.wav";  // six utterances
+constexpr std::size_t kWavHeader = 44;
+
+std::vector<Json> json_lines(const std::string &text) {
+  std::vector<Json> lines;
+  std::istringstream stream(text);
+  for (std::string line; std::getline(stream, line);) lines.push_back(Json::parse(line));
+  return lines;
+}
+
+std::vector<Json> without_names(std::vector<Json> lines) {
+  for (Json &line : lines) line.erase("file");
+  return lines;
+}
+
+class Tool : public testing::Test {
+protected:
+  struct Result {
+    int status;
+    std::string out, err;
+  };
+
+  static std::string command(const std::string &arguments) {
+    return ORVALIS_TOOL_PATH " " + arguments;
+  }
+
+  Result run(const std::string &arguments, std::string_view input = {}) const {
+    ChildProcess child(command(arguments), folder_.path());
+    child.write(input);
+    const int status = child.finish();
+    return {status, child.output(), child.errors()};
+  }
+
+  /// The utterances, of a run that must go well and quietly.
+  std::vector<Json> epd(const std::string &arguments, std::string_view input = {}) const {
+    const Result result = run("epd --format json " + arguments, input);
+    EXPECT_EQ(result.status, 0) << arguments;
+    EXPECT_EQ(result.err, "") << arguments;
+    return json_lines(result.out);
+  }
+
+  TemporaryFolder folder_;
+};
+
+TEST_F(Tool, TableAndJsonTellTheSame) {
+  std::string expected;
+  std::string name;
+  for (const Json &found : epd(kWide + " " + kNarrow)) {
+    const double rate = found["rate"];
+    EXPECT_EQ(rate, found["file"] == kWide ? 16000 : 8000);
+    for (const std::string moment : {"start", "end", "began", "ended"})
+      EXPECT_DOUBLE_EQ(found[moment], found[moment + "_sample"].get<double>() / rate);
+    EXPECT_LT(found["start_sample"], found["began_sample"]);
+    if (found["file"] != name) {
+      if (!name.empty()) expected += "\n";
+      expected += name = found["file"];
+      expected += "\nutterance     start       end  duration\n";
+    }
+    std::array<char, 80> row;
+    std::snprintf(row.data(), row.size(), "%9d %9.3f %9.3f %9.3f%s\n", found["number"].get<int>(),
+                  found["start"].get<double>(), found["end"].get<double>(),
+                  found["end"].get<double>() - found["start"].get<double>(),
+                  found["open"] ? "  open" : "");
+    expected += row.data();
+  }
+  EXPECT_EQ(name, kNarrow);
+  EXPECT_EQ(run("epd " + kWide + " " + kNarrow).out, expected);
+}
+
+TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
+  for (const std::string &path : {kWide, kNarrow}) {
+    const auto expected = without_names(epd(path));
+    ASSERT_FALSE(expected.empty());
+    const std::string wav = read_file(path);
+    const std::string samples = wav.substr(kWavHeader);
+    std::ofstream(folder_ / "samples", std::ios::binary) << samples;
+    const std::string raw = path == kWide ? "--raw " : "--raw --rate 8000 ";
+
+    EXPECT_EQ(without_names(epd("-", wav)), expected);
+    EXPECT_EQ(without_names(epd("- <" + path)), expected);
+    EXPECT_EQ(without_names(epd(raw + "-", samples)), expected);
+    EXPECT_EQ(without_names(epd(raw + (folder_ / "samples"))), expected);
+
+    // A live recorder's header, which cannot tell the length, and the same audio in two channels.
+    const std::string open_end = wav.substr(0, kWavHeader - 4) + "\xff\xff\xff\xff" + samples;
+    EXPECT_EQ(without_names(epd("-", open_end)), expected);
+    std::string doubled;
+    for (std::size_t i = 0; i + 1 < samples.size(); i += 2)
+      doubled += samples.substr(i, 2) + samples.substr(i, 2);
+    EXPECT_EQ(without_names(epd(raw + "--channels 2 -", doubled)), expected);
+  }
+}
+
+TEST_F(Tool, ResampledStereoGivesNearlyTheSameUtterances) {
+  const std::vector<float> original = read_audio(kWide);
+  std::vector<float> resampled(original.size() * 3);
+  SRC_DATA job{};
+  job.data_in = original.data();
+  job.input_frames = static_cast<long>(original.size());
+  job.data_out = resampled.data();
+  job.output_frames = static_cast<long>(resampled.size());
+  job.src_ratio = 44100.0 / 16000;
+  ASSERT_EQ(src_simple(&job, SRC_SINC_BEST_QUALITY, 1), 0);
+  resampled.resize(static_cast<std::size_t>(job.output_frames_gen));
+
+  // Left silent, right with speech.
+  std::vector<float> stereo;
+  for (const float sample : resampled) stereo.insert(stereo.end(), {0.0F, sample});
+  write_audio(folder_ / "stereo.flac", stereo, 44100, 2, SF_FORMAT_FLAC | SF_FORMAT_PCM_24);
+
+  const auto expected = epd(kWide);
+  ASSERT_FALSE(expected.empty());
+  for (const std::string channel : {"--channel 2 ", ""}) {
+    const auto found = epd(channel + (folder_ / "stereo.flac"));
+    ASSERT_EQ(found.size(), expected.size());
+    for (std::size_t i = 0; i < found.size(); ++i) {
+      EXPECT_EQ(found[i]["rate"], 16000);
+      EXPECT_NEAR(found[i]["start"], expected[i]["start"], 0.05);
+      EXPECT_NEAR(found[i]["end"], expected[i]["end"], 0.05);
+    }
+  }
+  EXPECT_TRUE(epd("--channel 1 " + (folder_ / "stereo.flac")).empty());
+}
+
+TEST_F(Tool, OptionsReachTheDetector) {
+  const auto plain = epd(kNarrow);
+  EXPECT_GT(epd("--hangover 0 " + kNarrow).size(), plain.size());
+  EXPECT_LT(epd("--hangover 2000 " + kNarrow).size(), plain.size());
+
+  const auto padded = epd("--pad-before 70 --pad-after 90 " + kNarrow);
+  ASSERT_EQ(padded.size(), plain.size());
+  for (std::size_t i = 0; i < plain.size(); ++i) {
+    EXPECT_EQ(padded[i]["start_sample"], plain[i]["start_sample"].get<int>() - 70 * 8);
+    EXPECT_EQ(padded[i]["end_sample"], plain[i]["end_sample"].get<int>() + 90 * 8);
+  }
+
+  EXPECT_LT(epd("--content-type 2 " + kWide)[0]["ended"], epd(kWide)[0]["ended"]);
+  EXPECT_EQ(epd("--gain 1 " + kNarrow), plain);
+
+  // A gain of 4 undoes what the audio lacks, and divides by 4 what it has too much.
+  std::vector<short> quiet, loud;
+  for (const float sample : read_audio(kNarrow)) {
+    quiet.push_back(static_cast<short>(sample * 32768 / 32));
+    loud.push_back(static_cast<short>(quiet.back() * 4));
+  }
+  write_audio(folder_ / "quiet.wav", quiet, 8000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
+  write_audio(folder_ / "loud.wav", loud, 8000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
+  const auto as_loud = without_names(epd(folder_ / "loud.wav"));
+  const auto as_quiet = without_names(epd(folder_ / "quiet.wav"));
+  EXPECT_NE(as_loud, as_quiet);
+  EXPECT_EQ(without_names(epd("--gain 4 " + (folder_ / "quiet.wav"))), as_loud);
+  EXPECT_EQ(without_names(epd("--gain 0.25 " + (folder_ / "loud.wav"))), as_quiet);
+}
+
+TEST_F(Tool, FramesAgreeWithUtterances) {
+  for (const std::string &options : {kWide, kNarrow, "--gain 4 --content-type 2 " + kWide}) {
+    const auto frames = epd("--frames " + options);
+    const auto utterances = epd(options);
+    ASSERT_FALSE(utterances.empty());
+    const auto answer = [](const Json &frame) { return frame["answer"] == 1; };
+    const auto first = std::ranges::find_if(frames, answer);
+    const auto last = std::ranges::find_if(frames.rbegin(), frames.rend(), answer);
+    ASSERT_NE(first, frames.end());
+    EXPECT_EQ((*first)["frame"], first - frames.begin());
+    EXPECT_NEAR((*first)["start"].get<double>() + 0.01, utterances.front()["began"], 1e-9);
+    EXPECT_NEAR((*last)["start"].get<double>() + 0.01, utterances.back()["ended"], 1e-9);
+  }
+  const std::string table = run("epd --frames " + kWide).out;
+  EXPECT_EQ(table.substr(0, 60), "    frame     start    answer\n        0      0.00         0\n");
+}
+
+TEST_F(Tool, LogLinesAreShownOnRequestOnly) {
+  const Result logged = run("epd --log " + kWide);
+  EXPECT_NE(logged.err.find("/Orvalis: "), std::string::npos);
+  EXPECT_EQ(logged.out, run("epd " + kWide).out);
+  EXPECT_EQ(run("epd --frames " + kWide).err, "");
+}
+
+TEST_F(Tool, SilenceAndNoAudioAreNoErrors) {
+  write_audio<short>(folder_ / "none.wav", {}, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
+  write_audio(folder_ / "silence.wav", std::vector<short>(50000), 48000, 1,
+              SF_FORMAT_WAV | SF_FORMAT_PCM_16);
+  for (const std::string &arguments :
+       {folder_ / "none.wav", folder_ / "silence.wav", std::string("--raw -")}) {
+    EXPECT_TRUE(epd(arguments).empty());
+    EXPECT_EQ(run("epd " + arguments).out, "no utterance\n");
+  }
+}
+
+TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
+  const std::string wav = read_file(kWide);
+  const auto write = [&](const char *name, const std::string &bytes) {
+    std::ofstream(folder_ / name, std::ios::binary) << bytes;
+    return folder_ / name;
+  };
+  const std::vector<std::string> bad = {folder_ / "missing.wav",
+                                        folder_.path(),
+                                        write("empty.wav", ""),
+                                        write("text.wav", "This is a letter, not audio.\n"),
+                                        write("header.wav", wav.substr(0, 30)),
+                                        write("cut.wav", wav.substr(0, wav.size() / 2))};
+  std::string arguments = kWide;
+  for (const std::string &name : bad) arguments += " " + name + " " + kWide;
+  const Result result = run("epd --format json " + arguments);
+  EXPECT_EQ(result.status, 1);
+
+  std::istringstream messages(result.err);
+  std::string message;
+  for (const std::string &name : bad) {
+    ASSERT_TRUE(std::getline(messages, message)) << name;
+    EXPECT_EQ(message.find("orvalis: " + name + ": "), 0U) << message;
+    EXPECT_GT(message.size(), name.size() + 15) << message;
+  }
+  EXPECT_FALSE(std::getline(messages, message)) << message;
+
+  // Each good file, and what the half of one holds.
+  const auto found = json_lines(result.out);
+  const auto good = epd(kWide);
+  EXPECT_EQ(std::ranges::count(found, good.at(0)), 7);
+  EXPECT_EQ(found.back(), good.back());
+  EXPECT_TRUE(std::ranges::any_of(found, [&](const Json &one) { return one["file"] == bad[5]; }));
+
+  EXPECT_EQ(run("epd --channel 2 " + kWide).status, 1);
+  EXPECT_EQ(run("epd -", "no audio at all").err.find("orvalis: standard input: "), 0U);
+}
+
+TEST_F(Tool, WrongUsageEndsWith2) {
+  for (const std::string arguments :
+       {"", "unknown", "epd", "epd --unknown x", "epd --format xml x", "epd --gain 2 x",
+        "epd --hangover -1 x", "epd --pad-after 1.5 x", "epd --channel 0 x", "epd --rate 16000 x",
+        "epd --raw --rate 0 x", "epd --raw --rate fast x", "epd --raw --channels 0 x",
+        "epd --content-type -1 x", "epd --frames --hangover 9 x", "epd - -"}) {
+    const Result result = run(arguments);
+    EXPECT_EQ(result.status, 2) << arguments;
+    EXPECT_EQ(result.out, "") << arguments;
+    EXPECT_EQ(result.err.find("orvalis: "), 0U) << result.err;
+  }
+  const Result help = run("epd --help");
+  EXPECT_EQ(help.status, 0);
+  for (const char *word : {"--hangover", "--raw", "--channel", "arecord", "Exit status"})
+    EXPECT_NE(help.out.find(word), std::string::npos) << word;
+  EXPECT_NE(run("version").out.find("library 160705\n"), std::string::npos);
+}
+
+TEST_F(Tool, LiveAudioIsAnsweredBeforeItEnds) {
+  const std::string samples = read_file(kNarrow).substr(kWavHeader);
+  ChildProcess child(command("epd --raw --rate 8000 -"), folder_.path());
+  // The first utterance is over after 2.5 s, the second begins after 3.3 s.
+  child.write(std::string_view(samples).substr(0, 2 * 8000 * 33 / 10));
+  EXPECT_TRUE(child.prints("\n        1 "));
+  EXPECT_EQ(child.output().find("\n        2 "), std::string::npos);
+  child.write(std::string_view(samples).substr(2 * 8000 * 33 / 10));
+  EXPECT_EQ(child.finish(), 0);
+  EXPECT_EQ(child.output(), run("epd " + kNarrow).out);
+}
+
+TEST_F(Tool, OutputThatFailsEndsWith1) {
+  // More than a pipe holds, so that the reader is gone for certain before the end.
+  const std::string status_file = folder_ / "status";
+  ChildProcess child("{ " + command("epd --frames --format json " + kNarrow) + "; echo $? >" +
+                         status_file + "; } | true",
+                     folder_.path());
+  child.finish();
+  EXPECT_EQ(read_file(status_file), "1\n");
+  EXPECT_EQ(child.errors(), "");
+
+  const Result full = run("epd " + kWide + " >/dev/full");
+  EXPECT_EQ(full.status, 1);
+  EXPECT_EQ(full.err, "orvalis: standard output: No space left on device\n");
+  EXPECT_EQ(run("epd " + kWide + " >&-").status, 1);
+}
+
+}  // namespace
+}  // namespace orvalis::test
