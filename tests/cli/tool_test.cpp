@@ -20,8 +20,8 @@ namespace {
 using Json = nlohmann::json;
 
 const std::string kWide = ORVALIS_SPEECH_16K "/cards/005.wav";
-const std::string kWideRaw = ORVALIS_SPEECH_16K "/goforward.raw";
-const std::string kNarrow = ORVALIS_SPEECH_8K "/wav/all.wav";  // six utterances
+const std::string kWideOpen = ORVALIS_SPEECH_16K "/cards/001.wav";  // ends in speech
+const std::string kNarrow = ORVALIS_SPEECH_8K "/wav/all.wav";       // six utterances
 constexpr std::size_t kWavHeader = 44;
 
 std::vector<Json> json_lines(const std::string &text) {
@@ -66,11 +66,13 @@ protected:
 };
 
 TEST_F(Tool, TableAndJsonTellTheSame) {
+  const std::string files = kWide + " " + kNarrow + " " + kWideOpen;
   std::string expected;
   std::string name;
-  for (const Json &found : epd(kWide + " " + kNarrow)) {
+  bool open = false;
+  for (const Json &found : epd(files)) {
     const double rate = found["rate"];
-    EXPECT_EQ(rate, found["file"] == kWide ? 16000 : 8000);
+    EXPECT_EQ(rate, found["file"] == kNarrow ? 8000 : 16000);
     for (const std::string moment : {"start", "end", "began", "ended"})
       EXPECT_DOUBLE_EQ(found[moment], found[moment + "_sample"].get<double>() / rate);
     EXPECT_LT(found["start_sample"], found["began_sample"]);
@@ -85,9 +87,11 @@ TEST_F(Tool, TableAndJsonTellTheSame) {
                   found["end"].get<double>() - found["start"].get<double>(),
                   found["open"] ? "  open" : "");
     expected += row.data();
+    open = found["open"];
   }
-  EXPECT_EQ(name, kNarrow);
-  EXPECT_EQ(run("epd " + kWide + " " + kNarrow).out, expected);
+  EXPECT_EQ(name, kWideOpen);
+  EXPECT_TRUE(open);
+  EXPECT_EQ(run("epd " + files).out, expected);
 }
 
 TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
