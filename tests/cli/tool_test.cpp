@@ -216,6 +216,10 @@ TEST_F(Tool, SilenceAndNoAudioAreNoErrors) {
 
 TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
   const std::string wav = read_file(kWide);
+  const std::vector<float> samples = read_audio(kWide);
+  write_audio(folder_ / "whole.flac", samples, 16000, 1, SF_FORMAT_FLAC | SF_FORMAT_PCM_16);
+  write_audio(folder_ / "whole.caf", samples, 16000, 1, SF_FORMAT_CAF | SF_FORMAT_PCM_16);
+  const std::string flac = read_file(folder_ / "whole.flac");
   const auto write = [&](const char *name, const std::string &bytes) {
     std::ofstream(folder_ / name, std::ios::binary) << bytes;
     return folder_ / name;
@@ -225,7 +229,8 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
                                         write("empty.wav", ""),
                                         write("text.wav", "This is a letter, not audio.\n"),
                                         write("header.wav", wav.substr(0, 30)),
-                                        write("cut.wav", wav.substr(0, wav.size() / 2))};
+                                        write("cut.wav", wav.substr(0, wav.size() / 2)),
+                                        write("cut.flac", flac.substr(0, flac.size() / 2))};
   std::string arguments = kWide;
   for (const std::string &name : bad) arguments += " " + name + " " + kWide;
   const Result result = run("epd --format json " + arguments);
@@ -240,14 +245,17 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
   }
   EXPECT_FALSE(std::getline(messages, message)) << message;
 
-  // Each good file, and what the half of one holds.
+  // Each good file, and what the halves of two hold.
   const auto found = json_lines(result.out);
   const auto good = epd(kWide);
-  EXPECT_EQ(std::ranges::count(found, good.at(0)), 7);
+  EXPECT_EQ(std::ranges::count(found, good.at(0)), 8);
   EXPECT_EQ(found.back(), good.back());
-  EXPECT_TRUE(std::ranges::any_of(found, [&](const Json &one) { return one["file"] == bad[5]; }));
+  for (const std::string &cut : {bad[5], bad[6]})
+    EXPECT_TRUE(std::ranges::any_of(found, [&](const Json &one) { return one["file"] == cut; }));
 
   EXPECT_EQ(run("epd --channel 2 " + kWide).status, 1);
+  // A format that needs seeking must not pass for silence on a pipe.
+  EXPECT_EQ(run("epd -", read_file(folder_ / "whole.caf")).status, 1);
   EXPECT_EQ(run("epd -", "no audio at all").err.find("orvalis: standard input: "), 0U);
 }
 
