@@ -5,7 +5,6 @@
 #include <utterance_stream.h>
 
 #include <algorithm>
-#include <cstdio>
 #include <limits>
 #include <memory>
 #include <new>
@@ -102,7 +101,7 @@ int run_epd(EpdOptions &options) {
     try {
       report_file(name, options, *report);
     } catch (const AudioError &error) {
-      fmt::print(stderr, "orvalis: {}: {}\n", name == "-" ? "standard input" : name, error.what());
+      print_error(fmt::format("{}: {}", name == "-" ? "standard input" : name, error.what()));
       status = 1;
     }
   }

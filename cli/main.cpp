@@ -5,7 +5,6 @@
 #include <CLI/CLI.hpp>
 #include <cerrno>
 #include <csignal>
-#include <cstdio>
 #include <string>
 #include <system_error>
 
@@ -55,9 +54,9 @@ int main(int argc, char **argv) {
   try {
     return run(argc, argv);
   } catch (const std::system_error &error) {
-    if (error.code() != std::errc::broken_pipe) fmt::print(stderr, "orvalis: {}\n", error.what());
+    if (error.code() != std::errc::broken_pipe) orvalis::cli::print_error(error.what());
   } catch (const std::exception &error) {
-    fmt::print(stderr, "orvalis: {}\n", error.what());
+    orvalis::cli::print_error(error.what());
   }
   return kFailed;
 }

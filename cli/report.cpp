@@ -109,4 +109,8 @@ void print_line(const std::string &line) {
     throw std::system_error(errno, std::generic_category(), "standard output");
 }
 
+void print_error(const std::string &message) {
+  std::fputs(("orvalis: " + message + "\n").c_str(), stderr);
+}
+
 }  // namespace orvalis::cli

@@ -32,4 +32,7 @@ std::unique_ptr<Report> make_json_report();
 /// Writes to standard output and flushes; throws std::system_error if that fails.
 void print_line(const std::string &line);
 
+/// Writes "orvalis: ..." to standard error; there is nobody to tell if that fails.
+void print_error(const std::string &message);
+
 }  // namespace orvalis::cli

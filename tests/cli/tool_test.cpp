@@ -47,7 +47,7 @@ protected:
     return ORVALIS_TOOL_PATH " " + arguments;
   }
 
-  Result run(const std::string &arguments, std::string_view input = {}) const {
+  Result run(const std::string &arguments, const std::string &input = {}) const {
     ChildProcess child(command(arguments), folder_.path());
     child.write(input);
     const int status = child.finish();
@@ -55,7 +55,7 @@ protected:
   }
 
   /// The utterances, of a run that must go well and quietly.
-  std::vector<Json> epd(const std::string &arguments, std::string_view input = {}) const {
+  std::vector<Json> epd(const std::string &arguments, const std::string &input = {}) const {
     const Result result = run("epd --format json " + arguments, input);
     EXPECT_EQ(result.status, 0) << arguments;
     EXPECT_EQ(result.err, "") << arguments;
@@ -281,10 +281,10 @@ TEST_F(Tool, LiveAudioIsAnsweredBeforeItEnds) {
   const std::string samples = read_file(kNarrow).substr(kWavHeader);
   ChildProcess child(command("epd --raw --rate 8000 -"), folder_.path());
   // The first utterance is over after 2.5 s, the second begins after 3.3 s.
-  child.write(std::string_view(samples).substr(0, 2 * 8000 * 33 / 10));
+  child.write(samples.substr(0, 2 * 8000 * 33 / 10));
   EXPECT_TRUE(child.prints("\n        1 "));
   EXPECT_EQ(child.output().find("\n        2 "), std::string::npos);
-  child.write(std::string_view(samples).substr(2 * 8000 * 33 / 10));
+  child.write(samples.substr(2 * 8000 * 33 / 10));
   EXPECT_EQ(child.finish(), 0);
   EXPECT_EQ(child.output(), run("epd " + kNarrow).out);
 }
@@ -303,6 +303,7 @@ TEST_F(Tool, OutputThatFailsEndsWith1) {
   EXPECT_EQ(full.status, 1);
   EXPECT_EQ(full.err, "orvalis: standard output: No space left on device\n");
   EXPECT_EQ(run("epd " + kWide + " >&-").status, 1);
+  EXPECT_EQ(run("epd missing 2>&-").status, 1);
 }
 
 }  // namespace

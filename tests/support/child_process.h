@@ -35,7 +35,7 @@ public:
   ChildProcess &operator=(const ChildProcess &) = delete;
 
   /// Writes to the child's standard input, which stays open.
-  void write(std::string_view bytes) {
+  void write(const std::string &bytes) {
     std::fwrite(bytes.data(), 1, bytes.size(), input_);
     std::fflush(input_);
   }
