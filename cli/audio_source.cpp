@@ -91,12 +91,20 @@ AudioSource::AudioSource(const std::string &name, const AudioSettings &settings)
       throw AudioError(fmt::format("a rate of {} Hz cannot be converted", info_.samplerate));
     resampler_.emplace(info_.samplerate, 16000);
   }
-  interleaved_.resize(static_cast<std::size_t>(std::max(1, info_.samplerate / 100)) *
-                      static_cast<std::size_t>(info_.channels));
+  const bool single = info_.channels == 1 || channel_ > 0;
+  untouched_ = (info_.format & SF_FORMAT_SUBMASK) == SF_FORMAT_PCM_16 && single && !resampler_;
+  const auto values = static_cast<std::size_t>(std::max(1, info_.samplerate / 100)) *
+                      static_cast<std::size_t>(info_.channels);
+  interleaved16_.resize(untouched_ ? values : 0);
+  interleaved_.resize(untouched_ ? 0 : values);
 }
 
 std::span<const std::int16_t> AudioSource::read() {
   samples_.clear();
+  if (untouched_) {
+    ended_ = ended_ || !read_untouched();
+    return samples_;
+  }
   // The resampler gives nothing until it has heard half the length of its filter.
   while (samples_.empty() && !ended_) {
     ended_ = !read_mono();
@@ -110,8 +118,21 @@ std::span<const std::int16_t> AudioSource::read() {
   return samples_;
 }
 
-/// Reads into mono_; false at the end. Through float for every format: that holds 16 and 24 bits
-/// exactly, while libsndfile's own way to 16 bits truncates and does not scale float files.
+/// Reads 16-bit samples of one channel into samples_; false at the end.
+bool AudioSource::read_untouched() {
+  const auto channels = static_cast<std::size_t>(info_.channels);
+  const auto first = static_cast<std::size_t>(std::max(channel_, 1) - 1);
+  const sf_count_t frames =
+      sf_readf_short(file_.get(), interleaved16_.data(),
+                     static_cast<sf_count_t>(interleaved16_.size() / channels));
+  frames_read_ += frames;
+  for (std::size_t i = 0; i < static_cast<std::size_t>(frames); ++i)
+    samples_.push_back(interleaved16_[i * channels + first]);
+  return frames > 0;
+}
+
+/// Reads into mono_; false at the end. Through float, which holds 24 bits exactly: libsndfile's own
+/// way to 16 bits truncates and does not scale float files.
 bool AudioSource::read_mono() {
   const auto channels = static_cast<std::size_t>(info_.channels);
   const sf_count_t frames = sf_readf_float(file_.get(), interleaved_.data(),

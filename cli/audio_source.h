@@ -47,17 +47,19 @@ private:
     void operator()(SNDFILE *file) const { sf_close(file); }
   };
 
+  bool read_untouched();
   bool read_mono();
 
   std::unique_ptr<SNDFILE, Closer> file_;
   SF_INFO info_{};
   bool piped_ = false;
   bool ended_ = false;
+  bool untouched_ = false;  ///< 16-bit samples go to the engine as they are
   int channel_ = 0;
   sf_count_t frames_read_ = 0;
   std::optional<Resampler> resampler_;
   std::vector<float> interleaved_, mono_, resampled_;
-  std::vector<std::int16_t> samples_;
+  std::vector<std::int16_t> interleaved16_, samples_;
 };
 
 }  // namespace orvalis::cli
