@@ -1,0 +1,34 @@
+/* The worked example of orvalis.h, word for word, and a main program around it:
+ * example_epd RECORDING    (raw 16-bit PCM, 16 kHz) */
+// clang-format off
+#include <stdio.h>
+#include "orvalis.h"
+
+int report_speech(const int16_t *pcm, int32_t samples)
+{
+    EpdInstance *epd = InitializeEPD(0, 0);    // 16 kHz, no dump files
+    int32_t previous = 0;
+    if (epd == NULL)
+        return -1;
+    for (int32_t at = 0; at + 160 <= samples; at += 160) {
+        int32_t speech = ProcessEPDFrame(epd, pcm + at, 160);
+        if (speech != previous)
+            printf("%s after %.2f s\n", speech ? "speech" : "silence", (at + 160) / 16000.0);
+        previous = speech;
+    }
+    return FreeMemoryEPD(epd);
+}
+// clang-format on
+
+#include "tests/support/read_pcm.h"
+
+int main(int argc, char **argv) {
+  int32_t samples;
+  int16_t *pcm;
+  int32_t failed;
+  if (argc != 2) return 2;
+  pcm = read_pcm(argv[1], &samples);
+  failed = report_speech(pcm, samples);
+  free(pcm);
+  return failed != 0;
+}

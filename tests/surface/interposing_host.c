@@ -1,0 +1,93 @@
+/* Prints what the library answers over a recording. Built once as it is, and once with functions
+ * and tables of its own under names that the library exports too, all of them wrong: the library
+ * must not notice, and both programs print the same.
+ *   interposing_host RECORDING    (raw 16-bit PCM) */
+#include "jni/orvalis.h"
+#include "stream/utterance_stream.h"
+#include "tests/support/read_pcm.h"
+
+#ifdef HOST_INTERPOSES
+#include <dlfcn.h>
+
+int16_t add(int16_t a, int16_t b) { return (int16_t)(a ^ b ^ 0x55); }
+int16_t sub(int16_t a, int16_t b) { return (int16_t)(a ^ b ^ 0x33); }
+int16_t norm_l(int32_t x) { return (int16_t)(x & 3); }
+int32_t L_mac(int32_t sum, int16_t a, int16_t b) { return sum ^ a ^ b; }
+int32_t L_add(int32_t a, int32_t b) { return a ^ b; }
+int32_t L_ns_add(int32_t a, int32_t b) { return a ^ b; }
+int32_t fnLog10(int32_t x) { return ~x; }
+void r_fft_epd(int16_t *buffer, int16_t isign, int32_t band) {
+  buffer[0] = (int16_t)(isign + band);
+}
+void r_fft_ns(int16_t *buffer, int16_t isign) { buffer[0] = isign; }
+int16_t window[160] = {1, 2, 3};
+int16_t phs_tbl_WB[256] = {1, 2, 3};
+int16_t phs_tbl_256[256] = {1, 2, 3};
+int16_t tablog[33] = {1, 2, 3};
+const int16_t *phs_tbl[2] = {window, window};
+
+/* Without this the test could pass because nothing was interposed. */
+static void check_interposed(const char *name, const void *own) {
+  if (dlsym(RTLD_DEFAULT, name) == own) return;
+  fprintf(stderr, "%s is not interposed\n", name);
+  exit(2);
+}
+
+static void check_all_interposed(void) {
+  check_interposed("add", (const void *)(uintptr_t)add);
+  check_interposed("phs_tbl_WB", phs_tbl_WB);
+  check_interposed("tablog", tablog);
+}
+#else
+static void check_all_interposed(void) {}
+#endif
+
+static void print_answers(const int16_t *pcm, int32_t samples, int32_t mode, int32_t content_type) {
+  const int32_t frame = mode == 0 ? 160 : 80;
+  EpdInstance *epd = InitializeEPD(mode, 0);
+  printf("mode %d, content type %d: ", (int)mode, (int)content_type);
+  for (int32_t at = 0; at + frame <= samples; at += frame) {
+    putchar('0' + ProcessEPDFrameByCnttype(epd, pcm + at, frame, content_type));
+  }
+  putchar('\n');
+  FreeMemoryEPD(epd);
+}
+
+static void print_queries(const int16_t *pcm, int32_t samples, int32_t rate_hz) {
+  uint32_t folded = 0;
+  for (int32_t at = 0; at + 160 <= samples; at += 160) {
+    int32_t spectrum[128] = {0};
+    getSpectrum(pcm + at, spectrum, rate_hz);
+    for (int i = 0; i < 128; ++i) folded = folded * 31u + (uint32_t)spectrum[i];
+    folded = folded * 31u + (uint32_t)computeEnergy(pcm + at, 160);
+  }
+  printf("queries at %d Hz: %08lx\n", (int)rate_hz, (unsigned long)folded);
+}
+
+static void print_utterances(const int16_t *pcm, int32_t samples) {
+  UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
+  UtteranceStream *stream = OpenUtteranceStream(&settings);
+  Utterance found;
+  PushUtteranceAudio(stream, pcm, samples);
+  FlushUtteranceStream(stream);
+  while (NextUtterance(stream, &found) == 1) {
+    printf("utterance %ld to %ld\n", (long)found.start, (long)found.end);
+  }
+  CloseUtteranceStream(stream);
+}
+
+int main(int argc, char **argv) {
+  int32_t samples;
+  int16_t *pcm;
+  if (argc != 2) return 2;
+  check_all_interposed();
+  pcm = read_pcm(argv[1], &samples);
+  print_answers(pcm, samples, 0, 0);
+  print_answers(pcm, samples, 0, 2);
+  print_answers(pcm, samples, 1000, 0);
+  print_queries(pcm, samples, 16000);
+  print_queries(pcm, samples, 8000);
+  print_utterances(pcm, samples);
+  free(pcm);
+  return 0;
+}
