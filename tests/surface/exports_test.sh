@@ -1,31 +1,56 @@
 #!/bin/sh
-# Holds the finished library against its export list, both ways, and against what it may need.
-#   exports_test.sh LIBRARY EXPORT_LIST
+# Holds the finished library against its export list, both ways, against the public headers, and
+# against what it may need.
+#   exports_test.sh LIBRARY EXPORT_LIST HEADER...
 LC_ALL=C
 export LC_ALL
+library=$1
+list=$2
+shift 2
 failed=0
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
+cd "$work" || exit 1
 
-sed -n 's/^ *\([A-Za-z_][A-Za-z0-9_]*\);$/\1/p' "$2" | sort >"$work/listed"
-nm -D --defined-only "$1" | awk '{print $3}' | sort >"$work/exported"
-if [ ! -s "$work/listed" ] || ! diff "$work/listed" "$work/exported" >"$work/differences"; then
-  echo "listed (<) and exported (>) names differ:"
-  cat "$work/differences"
+# complain_if_any MESSAGE FILE
+complain_if_any() {
+  [ -s "$2" ] || return 0
+  echo "$1"
+  cat "$2"
   failed=1
-fi
+}
+
+nm -D --defined-only "$library" | awk '{print $3}' | sort >exported
+sed -n 's/^ *\([A-Za-z_][A-Za-z0-9_]*\);$/\1/p' "$list" | sort >listed
+comm -23 listed exported >missing
+complain_if_any "listed but not exported:" missing
+comm -13 listed exported >surplus
+complain_if_any "exported but not listed:" surplus
+
+# The linker exports nothing that is not listed, so a name that the list forgot shows only here.
+cat "$@" | sed -e 's|/\*.*\*/||' -e '/\/\*/,/\*\//d' -e '/^#/d' >declarations
+{
+  grep -o '[A-Za-z_][A-Za-z0-9_]*(' declarations | tr -d '('
+  sed -n 's/^extern .*int[0-9]*_t *\**\(const \)\{0,1\}//p' declarations |
+    tr -d ' ;' | tr ',' '\n' | sed 's/\[.*//'
+} | sort >declared
+comm -23 declared exported >undelivered
+complain_if_any "declared in a public header but not exported:" undelivered
 
 # The C library, its mathematics and, on some machines, the loader: no C++ runtime.
-readelf -dW "$1" | sed -n 's/.*(NEEDED).*\[\(.*\)\]/\1/p' >"$work/needed"
-if [ ! -s "$work/needed" ] || grep -Ev '^(libc|libm|ld-linux[^.]*)\.so' "$work/needed" >"$work/extra"; then
-  echo "the library needs more than libc and libm:"
-  cat "$work/extra"
-  failed=1
-fi
+readelf -dW "$library" | sed -n 's/.*(NEEDED).*\[\(.*\)\]/\1/p' >needed
+grep -Ev '^(libc|libm|ld-linux[^.]*)\.so' needed >unwanted
+complain_if_any "the library needs more than libc and libm:" unwanted
 
 # Loadable where pages have 16 KB.
-if ! readelf -lW "$1" | awk '$1 == "LOAD" {++n; if ($NF != "0x4000") bad = 1} END {exit bad || !n}'; then
-  echo "a segment is not aligned to 16 KB"
-  failed=1
-fi
+readelf -lW "$library" | awk '$1 == "LOAD" && $NF != "0x4000"' >misaligned
+complain_if_any "segments that are not aligned to 16 KB:" misaligned
+
+# Every check above passes on nothing at all.
+for list in exported declared needed; do
+  if [ ! -s $list ]; then
+    echo "nothing $list: the tools that read the library have failed"
+    failed=1
+  fi
+done
 exit $failed
