@@ -14,9 +14,9 @@
  *              and 2k + 1 are the real and imaginary part of bin k = 1..N/2 - 1
  *
  * isign 1 is forward, anything else inverse. Forward transforms halve at every stage: a bin is the
- * discrete Fourier transform divided by N/2. Inverse transforms do not scale. Sums saturate, forward
- * ones before they are halved, so complex input beyond 11585 in a part may lose accuracy. The
- * overflow flag of the operators' copy holds what the last operators left.
+ * discrete Fourier transform divided by N/2. Inverse transforms do not scale. Sums saturate,
+ * forward ones before they are halved, so complex input beyond 11585 in a part may lose accuracy.
+ * The overflow flag of the operators' copy holds what the last operators left.
  *
  * Any thread may call; the buffer must hold N values, nothing is checked.
  */
