@@ -62,6 +62,19 @@ struct ChannelState {
   bool first_frame;
 };
 
+/// The analysed part of a state record whose fields have the names of the channel analysis.
+template <class Record>
+inline ChannelState channels_of(Record &record, Word32 frame_cnt) {
+  return {.energy = record.ch_enrg,
+          .noise = record.ch_noise,
+          .long_term_q5 = record.ch_enrg_long_db,
+          .update_cnt = record.update_cnt,
+          .hyster_cnt = record.hyster_cnt,
+          .last_update_cnt = record.last_update_cnt,
+          .frame_cnt = frame_cnt,
+          .first_frame = record.first_frame == 1};
+}
+
 /// What one frame's analysis found.
 struct ChannelFindings {
   Word16 snr[kMostChannels];  ///< channel SNR in steps of 3/8 dB, from 0

@@ -77,14 +77,7 @@ Word32 VelmoraVAD(PlainFlags &flags, VelmoraVadState **state, const Word16 *fram
     buffer[i] = mult_r(flags, buffer[i], MAX_16);
   real_fft(flags, buffer, Direction::kForward, epd_transform_plan(band));
 
-  ChannelState channels = {.energy = vad.ch_enrg,
-                           .noise = vad.ch_noise,
-                           .long_term_q5 = vad.ch_enrg_long_db,
-                           .update_cnt = vad.update_cnt,
-                           .hyster_cnt = vad.hyster_cnt,
-                           .last_update_cnt = vad.last_update_cnt,
-                           .frame_cnt = vad.vad_frame_cnt,
-                           .first_frame = vad.first_frame == 1};
+  ChannelState channels = channels_of(vad, vad.vad_frame_cnt);
   const ChannelFindings found = analyse_channels(flags, plan, channels, buffer, shift);
   vad.tot_enrg = found.unclamped_energy;
   if (vad.vad_frame_cnt <= plan.seeding_frames) {

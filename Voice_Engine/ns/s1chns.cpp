@@ -115,14 +115,7 @@ void s1chns_C(NsFlags &flags, S1chnsState *state, Word16 *in, Word16 *out) {
   window_edges(flags, plan, buffer);
   real_fft(flags, buffer, Direction::kForward, ns_transform_plan());
 
-  ChannelState channels = {.energy = ns.ch_enrg,
-                           .noise = ns.ch_noise,
-                           .long_term_q5 = ns.ch_enrg_long_db,
-                           .update_cnt = ns.update_cnt,
-                           .hyster_cnt = ns.hyster_cnt,
-                           .last_update_cnt = ns.last_update_cnt,
-                           .frame_cnt = ns.frame_cnt,
-                           .first_frame = ns.first_frame == 1};
+  ChannelState channels = channels_of(ns, ns.frame_cnt);
   ChannelFindings found = analyse_channels(flags, plan, channels, buffer, shift);
   set_gains(flags, ns, found);
   if (found.is_noise) track_noise(flags, plan, channels);
