@@ -5,6 +5,7 @@
 #include <utterance_stream.h>
 
 #include <algorithm>
+#include <csignal>
 #include <limits>
 #include <memory>
 #include <new>
@@ -88,9 +89,16 @@ void report_file(const std::string &name, const EpdOptions &options, Report &rep
   source.check_complete();
 }
 
+/// Ctrl-C ends whoever writes into the pipe as well: what was said last is then still reported, at
+/// the end of the input. A second Ctrl-C ends the tool.
+void outlive_one_interrupt() {
+  std::signal(SIGINT, [](int) { std::signal(SIGINT, SIG_DFL); });
+}
+
 int run_epd(EpdOptions &options) {
-  if (std::ranges::count(options.files, "-") > 1)
-    throw CLI::ValidationError("FILE", "standard input can be read only once");
+  const auto inputs = std::ranges::count(options.files, "-");
+  if (inputs > 1) throw CLI::ValidationError("FILE", "standard input can be read only once");
+  if (inputs == 1) outlive_one_interrupt();
   options.detector.input_gain = options.gain == "0.25" ? 1 : options.gain == "4" ? 2 : 0;
   if (!options.log) SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
 
