@@ -1,0 +1,154 @@
+// The decision whether noise may be learnt, and its neighbours, on both sides of every threshold.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
+#include <set>
+
+#include "Voice_Engine/epd/channel_tables.h"
+
+namespace orvalis::test {
+namespace {
+
+struct Limits {
+  const char *name;
+  const ChannelPlan *plan;
+  Word16 metric;     ///< noise up to here
+  Word32 silent;     ///< undecided up to here
+  Word16 deviation;  ///< voice from here on
+  int seeding;
+  Word16 loud_level_q5;
+  bool remembers_reset;
+  int bins_checksum;  ///< sum of (1-based channel) * (first bin + 1000 * last bin)
+  int scale_checksum;
+  double window_scale;
+};
+
+constexpr Limits kLimits[] = {
+    {"Wide", &kWideBandDetection, 68, 252, 2000, 10, 1638, false, 12904127, 1595544, 32768},
+    {"Narrow", &kNarrowBandDetection, 45, 256, 896, 10, 1600, false, 4717182, 1095318, 32767},
+    {"Suppressor", &kSuppression, 42, 320, 896, 4, 1920, true, 11807152, 1660563, 32767},
+};
+
+/// A made state.
+struct Channels {
+  Word32 energy[kMostChannels] = {}, noise[kMostChannels] = {};
+  Word16 long_term_q5[kMostChannels] = {};
+  Word16 update_cnt = 30, hyster_cnt = 0, last_update_cnt = 30;
+  Word32 frame_cnt = 1000;
+
+  bool decide(const Limits &limits, int metric, Word32 total, int deviation) {
+    PlainFlags flags;
+    ChannelState state = view();
+    ChannelFindings found{};
+    found.voice_metric = static_cast<Word16>(metric);
+    found.total_energy = total;
+    found.deviation_q5 = static_cast<Word16>(deviation);
+    return decide_noise(flags, *limits.plan, state, found);
+  }
+  ChannelState view() {
+    return {energy, noise, long_term_q5, update_cnt, hyster_cnt, last_update_cnt, frame_cnt, false};
+  }
+};
+
+class ChannelDecision : public testing::TestWithParam<Limits> {};
+INSTANTIATE_TEST_SUITE_P(Plans, ChannelDecision, testing::ValuesIn(kLimits),
+                         [](const auto &plan) { return plan.param.name; });
+
+TEST_P(ChannelDecision, ThresholdsOnBothSides) {
+  const Limits &limits = GetParam();
+  const auto expect = [&](int metric, Word32 total, int deviation, bool noise, Word16 count) {
+    Channels channels;
+    EXPECT_EQ(channels.decide(limits, metric, total, deviation), noise)
+        << metric << " " << total << " " << deviation;
+    EXPECT_EQ(channels.update_cnt, count) << metric << " " << total << " " << deviation;
+  };
+  const Word16 voice = limits.metric + 1, calm = limits.deviation - 1;
+  expect(limits.metric, MAX_32, MAX_16, true, 0);
+  expect(voice, limits.silent, calm, false, 30);
+  expect(voice, limits.silent + 1, calm, false, 31);
+  expect(voice, limits.silent + 1, limits.deviation, false, 30);
+}
+
+TEST_P(ChannelDecision, FiftyCalmFramesForceAnUpdate) {
+  const Limits &limits = GetParam();
+  Channels channels;
+  channels.update_cnt = channels.last_update_cnt = 0;
+  for (int frame = 1; frame <= 60; ++frame) {
+    EXPECT_EQ(channels.decide(limits, MAX_16, MAX_32, 0), frame > 49) << frame;
+    EXPECT_EQ(channels.update_cnt, frame);
+  }
+  channels.update_cnt = MAX_16 - 1;
+  for (int frame = 0; frame < 3; ++frame) {
+    EXPECT_TRUE(channels.decide(limits, MAX_16, MAX_32, 0));
+    EXPECT_EQ(channels.update_cnt, MAX_16);
+  }
+}
+
+TEST_P(ChannelDecision, SevenUnchangedFramesForgetTheCount) {
+  const Limits &limits = GetParam();
+  Channels channels;
+  for (int frame = 1; frame <= 7; ++frame) {
+    EXPECT_EQ(channels.update_cnt, 30) << frame;
+    channels.decide(limits, MAX_16, MAX_32, MAX_16);
+    EXPECT_EQ(channels.hyster_cnt, frame);
+  }
+  EXPECT_EQ(channels.update_cnt, 0);
+  EXPECT_EQ(channels.last_update_cnt, limits.remembers_reset ? 0 : 30);
+  channels.decide(limits, MAX_16, MAX_32, MAX_16);
+  EXPECT_EQ(channels.hyster_cnt, limits.remembers_reset ? 8 : 0);
+
+  channels.decide(limits, MAX_16, MAX_32, 0);
+  EXPECT_EQ(channels.hyster_cnt, 0) << "a counted frame starts again";
+  channels.update_cnt = channels.last_update_cnt = 0;
+  channels.hyster_cnt = MAX_16;
+  channels.decide(limits, 0, MAX_32, 0);
+  EXPECT_EQ(channels.hyster_cnt, MAX_16) << "noise may last";
+}
+
+TEST_P(ChannelDecision, NoiseIsSeededInTheFirstFrames) {
+  for (int past : {0, 1}) {
+    Channels channels;
+    channels.frame_cnt = GetParam().seeding + past;
+    const int last = GetParam().plan->channels - 1;
+    channels.energy[0] = 4095;
+    channels.energy[last] = 4097;
+    ChannelState state = channels.view();
+    seed_noise(*GetParam().plan, state);
+    EXPECT_EQ(channels.noise[0], past ? 0 : 4096);
+    EXPECT_EQ(channels.noise[last], past ? 0 : 4097);
+  }
+}
+
+TEST_P(ChannelDecision, ShareOfThePastFollowsItsCurve) {
+  PlainFlags flags;
+  std::set<int> seen;
+  for (double total = 300; total < MAX_32; total *= 1.002) {
+    const auto energy = static_cast<Word32>(total);
+    const int below = GetParam().loud_level_q5 - level_q5(flags, energy);
+    const int step = std::clamp(32 * below, -32768, 32767);
+    const int share_q10 = 1023 - static_cast<int>(std::floor(803.0 * step / 32768));
+    const int expected = share_q10 >= 1024 ? 32440 : share_q10 > 510 ? 32 * share_q10 : 16383;
+    ASSERT_EQ(long_term_share(flags, *GetParam().plan, energy), expected) << share_q10;
+    seen.insert(share_q10);
+  }
+  for (int edge : {510, 511, 1023, 1024}) EXPECT_TRUE(seen.contains(edge)) << edge;
+}
+
+TEST_P(ChannelDecision, TablesAreTheirFormulasAndLists) {
+  const ChannelPlan &plan = *GetParam().plan;
+  int bins = 0, scales = 0;
+  for (int i = 0; i < plan.channels; ++i) {
+    bins += (i + 1) * (plan.bins[i].first + 1000 * plan.bins[i].last);
+    scales += (i + 1) * (2 * plan.scales[i].value + plan.scales[i].kind);
+  }
+  EXPECT_EQ(bins, GetParam().bins_checksum);
+  EXPECT_EQ(scales, GetParam().scale_checksum);
+  for (int i = 0; i < plan.overlap; ++i) {
+    const double sine = std::sin(M_PI * (i + 0.5) / (2 * plan.overlap));
+    EXPECT_EQ(plan.window_edge[i], std::lround(GetParam().window_scale * sine * sine)) << i;
+  }
+}
+
+}  // namespace
+}  // namespace orvalis::test
