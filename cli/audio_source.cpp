@@ -101,21 +101,21 @@ AudioSource::AudioSource(const std::string &name, const AudioSettings &settings)
 
 std::span<const std::int16_t> AudioSource::read() {
   samples_.clear();
-  if (untouched_) {
-    ended_ = ended_ || !read_untouched();
-    return samples_;
-  }
   // The resampler gives nothing until it has heard half the length of its filter.
-  while (samples_.empty() && !ended_) {
-    ended_ = !read_mono();
-    if (resampler_) {
-      resampled_.clear();
-      resampler_->process(mono_, ended_, resampled_);
-    }
-    std::ranges::transform(resampler_ ? resampled_ : mono_, std::back_inserter(samples_),
-                           to_word16);
-  }
+  while (samples_.empty() && !ended_) ended_ = !(untouched_ ? read_untouched() : read_converted());
+  samples_read_ += static_cast<std::int64_t>(samples_.size());
   return samples_;
+}
+
+/// Reads into samples_ by way of the resampler and rounding; false at the end.
+bool AudioSource::read_converted() {
+  const bool more = read_mono();
+  if (resampler_) {
+    resampled_.clear();
+    resampler_->process(mono_, !more, resampled_);
+  }
+  std::ranges::transform(resampler_ ? resampled_ : mono_, std::back_inserter(samples_), to_word16);
+  return more;
 }
 
 /// Reads 16-bit samples of one channel into samples_; false at the end.

@@ -39,6 +39,9 @@ public:
   /// The next samples, about 10 ms, so that a live source is heard at once. Empty at the end.
   std::span<const std::int16_t> read();
 
+  /// Samples that read() has returned so far.
+  std::int64_t samples_read() const { return samples_read_; }
+
   /// After the end: throws if that was a read error, or came before the end that the header names.
   void check_complete() const;
 
@@ -48,6 +51,7 @@ private:
   };
 
   bool read_untouched();
+  bool read_converted();
   bool read_mono();
 
   std::unique_ptr<SNDFILE, Closer> file_;
@@ -57,6 +61,7 @@ private:
   bool untouched_ = false;  ///< 16-bit samples go to the engine as they are
   int channel_ = 0;
   sf_count_t frames_read_ = 0;
+  std::int64_t samples_read_ = 0;
   std::optional<Resampler> resampler_;
   std::vector<float> interleaved_, mono_, resampled_;
   std::vector<std::int16_t> interleaved16_, samples_;

@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "cli/audio_source.h"
+#include "cli/label_reports.h"
 #include "cli/report.h"
 
 namespace orvalis::cli {
@@ -84,7 +85,7 @@ void report_file(const std::string &name, const EpdOptions &options, Report &rep
   settings.rate_hz = source.rate_hz();
   report.begin_file(name, settings.rate_hz);
   (options.frames ? report_frames : report_utterances)(source, settings, report);
-  report.end_file();
+  report.end_file(source.samples_read());
   // Last, so that a damaged file still gives what could be decided.
   source.check_complete();
 }
@@ -95,6 +96,21 @@ void outlive_one_interrupt() {
   std::signal(SIGINT, [](int) { std::signal(SIGINT, SIG_DFL); });
 }
 
+std::unique_ptr<Report> make_report(const EpdOptions &options) {
+  const bool several = options.files.size() > 1;
+  const std::string &format = options.format;
+  if (format == "json") return make_json_report();
+  if (format == "csv") return make_csv_report();
+  if (options.frames && format != "table")
+    throw CLI::ValidationError("--frames", "the format " + format + " knows utterances only");
+  if (format == "rttm") return make_rttm_report();
+  if (several && format != "table")
+    throw CLI::ValidationError("--format", format + " describes one file, but several are given");
+  if (format == "labels") return make_labels_report();
+  if (format == "textgrid") return make_textgrid_report();
+  return make_table_report(several);
+}
+
 int run_epd(EpdOptions &options) {
   const auto inputs = std::ranges::count(options.files, "-");
   if (inputs > 1) throw CLI::ValidationError("FILE", "standard input can be read only once");
@@ -102,8 +118,7 @@ int run_epd(EpdOptions &options) {
   options.detector.input_gain = options.gain == "0.25" ? 1 : options.gain == "4" ? 2 : 0;
   if (!options.log) SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
 
-  const std::unique_ptr<Report> report =
-      options.format == "json" ? make_json_report() : make_table_report(options.files.size() > 1);
+  const std::unique_ptr<Report> report = make_report(options);
   int status = 0;
   for (const std::string &name : options.files) {
     try {
@@ -125,10 +140,15 @@ constexpr const char *kExamples = R"(Input:
   Each utterance is printed the moment it is decided.
 
 Output:
-  Times are seconds of the input. JSON has one object a line; its *_sample fields
-  count samples at its "rate". "start" and "end" are the borders of the utterance;
-  "began" and "ended" tell when the detector gave its first and last answer
-  "speech". "open" marks an utterance that the end of the audio has cut.
+  Times are seconds of the input. "start" and "end" are the borders of the
+  utterance; "began" and "ended" tell when the detector gave its first and last
+  answer "speech". "open" marks an utterance that the end of the audio has cut.
+    table     to read
+    json      one object a line; *_sample fields count samples at its "rate"
+    csv       for a spreadsheet
+    labels    a label track for Audacity (one file)
+    textgrid  an interval tier for Praat (one file, written at its end)
+    rttm      SPEAKER lines for diarisation tools
 
 Exit status:
   0 all files done; 1 a file could not be read (the others are done); 2 wrong usage.
@@ -138,6 +158,7 @@ Examples:
   orvalis epd --format json --hangover 800 a.flac b.mp3
   orvalis epd --pad-before 200 --pad-after 300 --channel 2 call.wav
   orvalis epd --raw --rate 8000 line.raw
+  orvalis epd --format labels take.wav >take.txt
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis epd --raw -)";
 
 }  // namespace
@@ -155,8 +176,8 @@ void add_epd_command(CLI::App &app, int &exit_status) {
   epd->add_option("FILE", options->files, "Audio files; \"-\" is standard input")
       ->required()
       ->type_name("");
-  epd->add_option("--format", options->format, "table (to read) or json (an object a line)")
-      ->check(CLI::IsMember({"table", "json"}).description(""))
+  epd->add_option("--format", options->format, "table, json, csv, labels, textgrid or rttm")
+      ->check(CLI::IsMember({"table", "json", "csv", "labels", "textgrid", "rttm"}).description(""))
       ->type_name("NAME")
       ->capture_default_str();
 

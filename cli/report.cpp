@@ -33,7 +33,7 @@ public:
     print_line(fmt::format("{:9} {:9.2f} {:9}", number, static_cast<double>(number) / 100, answer));
   }
 
-  void end_file() override {
+  void end_file(std::int64_t) override {
     if (empty_) print_line("no utterance");
   }
 
@@ -82,7 +82,7 @@ public:
            {"answer", answer}});
   }
 
-  void end_file() override {}
+  void end_file(std::int64_t) override {}
 
 private:
   double seconds(std::int64_t samples) const { return static_cast<double>(samples) / rate_hz_; }

@@ -20,7 +20,8 @@ public:
   virtual void utterance(const Utterance &utterance) = 0;
   /// The detector's answer to a frame of 10 ms, numbered from 0.
   virtual void frame(std::int64_t number, int answer) = 0;
-  virtual void end_file() = 0;
+  /// All of `samples` were heard.
+  virtual void end_file(std::int64_t samples) = 0;
 };
 
 /// For a reader. `headings`: several files are coming, each gets its name above it.

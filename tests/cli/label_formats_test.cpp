@@ -1,0 +1,146 @@
+// The tool's label formats, read as the programs they are for read them.
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <nlohmann/json.hpp>
+#include <regex>
+#include <sstream>
+#include <string>
+#include <vector>
+
+#include "tests/support/child_process.h"
+#include "tests/support/temporary_folder.h"
+
+namespace orvalis::test {
+namespace {
+
+const std::string kRecording = ORVALIS_SPEECH_8K "/wav/all.wav";  // six utterances
+constexpr double kSeconds = 456912 / 8000.0;
+
+struct Span {
+  double start, end;
+};
+
+class LabelFormats : public testing::Test {
+protected:
+  std::string run(const std::string &arguments, int expected_status = 0) const {
+    ChildProcess child(ORVALIS_TOOL_PATH " epd " + arguments, folder_.path());
+    EXPECT_EQ(child.finish(), expected_status) << arguments << child.errors();
+    return child.output();
+  }
+
+  std::vector<Span> utterances() const {
+    std::istringstream lines(run("--format json " + kRecording));
+    std::vector<Span> found;
+    for (std::string line; std::getline(lines, line);) {
+      const auto fields = nlohmann::json::parse(line);
+      found.push_back({fields["start"], fields["end"]});
+    }
+    EXPECT_EQ(found.size(), 6u);
+    return found;
+  }
+
+  static void expect_same(const std::vector<Span> &found, const std::vector<Span> &expected,
+                          double tolerance = 1e-6) {
+    ASSERT_EQ(found.size(), expected.size());
+    for (std::size_t i = 0; i < found.size(); ++i) {
+      EXPECT_NEAR(found[i].start, expected[i].start, tolerance);
+      EXPECT_NEAR(found[i].end, expected[i].end, tolerance);
+    }
+  }
+
+  TemporaryFolder folder_;
+};
+
+/// Fields of a CSV line; quoted ones may hold commas and doubled quotes.
+std::vector<std::string> csv_fields(const std::string &line) {
+  static const std::regex field("(\"((?:[^\"]|\"\")*)\"|([^,\"]*))(,|$)");
+  std::vector<std::string> fields;
+  for (auto at = line.cbegin(); at != line.cend();) {
+    std::smatch match;
+    EXPECT_TRUE(
+        std::regex_search(at, line.cend(), match, field, std::regex_constants::match_continuous));
+    fields.push_back(match[2].matched ? std::regex_replace(match[2].str(), std::regex("\"\""), "\"")
+                                      : match[3].str());
+    at = match[0].second;
+  }
+  return fields;
+}
+
+TEST_F(LabelFormats, CsvHoldsEveryFieldAndAnyFileName) {
+  const std::string name = folder_ / "two, \"three\".wav";
+  std::filesystem::copy(kRecording, name);
+  std::istringstream lines(run("--format csv '" + name + "'"));
+  std::string line;
+  std::getline(lines, line);
+  EXPECT_EQ(line, "file,number,start,end,duration,began,ended,open");
+  std::vector<Span> found;
+  while (std::getline(lines, line)) {
+    const auto fields = csv_fields(line);
+    ASSERT_EQ(fields.size(), 8u) << line;
+    EXPECT_EQ(fields[0], name);
+    found.push_back({std::stod(fields[2]), std::stod(fields[3])});
+    EXPECT_NEAR(std::stod(fields[4]), found.back().end - found.back().start, 1e-6);
+  }
+  expect_same(found, utterances());
+  EXPECT_EQ(run("--format csv --frames " + kRecording).find("file,frame,start,answer\n"), 0u);
+}
+
+TEST_F(LabelFormats, LabelsAreTabSeparated) {
+  std::istringstream lines(run("--format labels " + kRecording));
+  std::vector<Span> found;
+  std::string label;
+  for (Span span; lines >> span.start >> span.end && std::getline(lines, label);) {
+    EXPECT_EQ(label, "\tutterance " + std::to_string(found.size() + 1));
+    found.push_back(span);
+  }
+  expect_same(found, utterances());
+}
+
+TEST_F(LabelFormats, RttmNamesTheFileAndGivesDurations) {
+  std::istringstream lines(run("--format rttm " + kRecording));
+  std::vector<Span> found;
+  std::string type, file, na, speaker;
+  int channel;
+  double start, duration;
+  while (lines >> type >> file >> channel >> start >> duration >> na >> na >> speaker >> na >> na) {
+    EXPECT_EQ(type + file + std::to_string(channel) + speaker + na, "SPEAKERall1speech<NA>");
+    found.push_back({start, start + duration});
+  }
+  expect_same(found, utterances(), 1e-3);
+}
+
+TEST_F(LabelFormats, TextGridCoversTheFileWithoutHoles) {
+  const std::string text = run("--format textgrid " + kRecording);
+  EXPECT_EQ(text.find("File type = \"ooTextFile\"\nObject class = \"TextGrid\"\n"), 0u);
+  // As Praat reads: numbers and quoted strings in their order, whatever stands between.
+  static const std::regex token("(?:= )(-?[0-9.]+|\"[^\"]*\")");
+  std::vector<std::string> values;
+  for (std::sregex_iterator it(text.begin(), text.end(), token), end; it != end; ++it)
+    values.push_back((*it)[1]);
+  const std::size_t kHead = 10;
+  ASSERT_GT(values.size(), kHead);
+  EXPECT_NEAR(std::stod(values[3]), kSeconds, 1e-6);
+  EXPECT_EQ(values[5], "\"IntervalTier\"");
+  const std::size_t count = std::stoul(values[9]);
+  ASSERT_EQ(values.size(), kHead + 3 * count);
+  std::vector<Span> found;
+  double end = 0;
+  for (std::size_t i = kHead; i < values.size(); i += 3) {
+    EXPECT_EQ(std::stod(values[i]), end);
+    end = std::stod(values[i + 1]);
+    if (values[i + 2] == "\"speech\"") found.push_back({std::stod(values[i]), end});
+  }
+  EXPECT_NEAR(end, kSeconds, 1e-6);
+  expect_same(found, utterances());
+}
+
+TEST_F(LabelFormats, OneFileFormatsRefuseSeveral) {
+  for (const std::string format : {"labels", "textgrid"})
+    run("--format " + format + " " + kRecording + " " + kRecording, 2);
+  for (const std::string format : {"labels", "textgrid", "rttm"})
+    run("--frames --format " + format + " " + kRecording, 2);
+}
+
+}  // namespace
+}  // namespace orvalis::test
