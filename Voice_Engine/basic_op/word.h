@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <limits>
 
 namespace orvalis {
 
@@ -18,6 +19,8 @@ inline constexpr Word32 MIN_32 = INT32_MIN;
 static_assert((-3 >> 1) == -2, "right shift of a negative value is arithmetic");
 static_assert(-7 / 2 == -3 && -7 % 2 == -1, "division truncates toward zero");
 static_assert(static_cast<Word16>(0x18000) == MIN_16, "narrowing keeps the low bits");
+static_assert(std::numeric_limits<float>::is_iec559 && std::numeric_limits<double>::is_iec559,
+              "float and double are IEEE-754 single and double");
 
 /// a + b modulo 2^32: the wrap-around is meant.
 constexpr Word32 wrapping_add(Word32 a, Word32 b) {

@@ -71,14 +71,7 @@ struct Subject {
       for (int i = plan.overlap; i < plan.frame_samples; ++i)
         buffer[i] = mult_r(flags, buffer[i], MAX_16);
     real_fft(flags, buffer, Direction::kForward, transform);
-    ChannelState channels = {.energy = s.ch_enrg,
-                             .noise = s.ch_noise,
-                             .long_term_q5 = s.ch_enrg_long_db,
-                             .update_cnt = s.update_cnt,
-                             .hyster_cnt = s.hyster_cnt,
-                             .last_update_cnt = s.last_update_cnt,
-                             .frame_cnt = s.*frame_cnt,
-                             .first_frame = s.first_frame == 1};
+    ChannelState channels = channels_of(s, s.*frame_cnt);
     return analyse_channels(flags, plan, channels, buffer, shift);
   }
 
