@@ -49,8 +49,8 @@ private:
 };
 
 std::vector<Word16> speech(Word32 band) {
-  return band == 0 ? with_level_jumps(ORVALIS_SPEECH_16K "/numbers.raw", 8000)
-                   : with_level_jumps(ORVALIS_SPEECH_8K "/raw/hts1.raw", 4000);
+  return band == 0 ? with_level_jumps(speech_16k("numbers.raw"), 8000)
+                   : with_level_jumps(speech_8k("raw/hts1.raw"), 4000);
 }
 
 template <class Judge>

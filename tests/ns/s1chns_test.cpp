@@ -40,7 +40,7 @@ public:
   NsFlags flags;
 };
 
-std::vector<Word16> speech() { return with_level_jumps(ORVALIS_SPEECH_16K "/numbers.raw", 8000); }
+std::vector<Word16> speech() { return with_level_jumps(speech_16k("numbers.raw"), 8000); }
 
 Subject<S1chnsState, NsFlags> subject() {
   return {.plan = kSuppression,

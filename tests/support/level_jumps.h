@@ -2,26 +2,16 @@
 // its memories keep changing.
 #pragma once
 
-#include <gtest/gtest.h>
-
 #include <algorithm>
 #include <cmath>
-#include <cstdint>
-#include <fstream>
-#include <iterator>
-#include <string>
-#include <vector>
+
+#include "tests/support/recordings.h"
 
 namespace orvalis::test {
 
-/// A raw 16-bit recording in stretches of as it is, four times (saturated), as it is, a quarter;
-/// then a stretch of a tone that fades from full scale, where no 32 bits hold its energy.
-inline std::vector<std::int16_t> with_level_jumps(const std::string &path, std::size_t stretch) {
-  std::ifstream file(path, std::ios::binary);
-  const std::string bytes{std::istreambuf_iterator<char>(file), {}};
-  EXPECT_GT(bytes.size(), 2 * stretch) << path;
-  std::vector<std::int16_t> samples(bytes.size() / 2);
-  std::copy_n(bytes.data(), 2 * samples.size(), reinterpret_cast<char *>(samples.data()));
+/// A recording in stretches of as it is, four times (saturated), as it is, a quarter; then a
+/// stretch of a tone that fades from full scale, where no 32 bits hold its energy.
+inline Pcm with_level_jumps(Pcm samples, std::size_t stretch) {
   constexpr double kGains[] = {1, 4, 1, 0.25};
   for (std::size_t i = 0; i < samples.size(); ++i) {
     const double scaled = kGains[i / stretch % 4] * samples[i];
