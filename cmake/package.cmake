@@ -1,5 +1,5 @@
-# What an installation holds beside the tool: the library, its headers, and how pkg-config, CMake and
-# Debian find them. No installed file knows its own prefix, so that an installation may be moved.
+# What an installation holds beside the tool: the library, its headers, and how pkg-config, CMake
+# and Debian find them. No installed file knows its own prefix: an installation may be moved.
 include(CMakePackageConfigHelpers)
 
 set(header_folder ${CMAKE_INSTALL_INCLUDEDIR}/orvalis)
