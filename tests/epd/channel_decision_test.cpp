@@ -22,6 +22,8 @@ struct Limits {
   int bins_checksum;  ///< sum of (1-based channel) * (first bin + 1000 * last bin)
   int scale_checksum;
   double window_scale;
+
+  friend void PrintTo(const Limits &limits, std::ostream *out) { *out << limits.name; }
 };
 
 constexpr Limits kLimits[] = {
