@@ -9,6 +9,7 @@
 #include <cmath>
 #include <memory>
 #include <random>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -66,14 +67,28 @@ UtteranceSettings settings_of(int32_t rate, int32_t content_type, int32_t hangov
   return {rate, 0, content_type, hangover_ms, pad_before_ms, pad_after_ms};
 }
 
-std::string run(char answer, int frames) {
-  return std::string(static_cast<std::size_t>(frames), answer);
+/// The script of runs like "50o 60s 2n": frames without speech, with speech, of null audio.
+std::string frames(const std::string &runs) {
+  std::string answers;
+  std::istringstream in(runs);
+  int count = 0;
+  for (char kind = 0; in >> count >> kind;)
+    answers.append(static_cast<std::size_t>(count), kind == 's' ? '1' : kind == 'o' ? '0' : 'n');
+  return answers;
 }
 
-std::vector<Utterance> take_all(UtteranceStream *stream) {
-  std::vector<Utterance> found;
-  for (Utterance next; NextUtterance(stream, &next) == 1;) found.push_back(next);
-  return found;
+/// Takes what was decided to the end of a list.
+void take_all(const Stream &stream, std::vector<Utterance> &found) {
+  for (Utterance next; NextUtterance(stream.get(), &next) == 1;) found.push_back(next);
+}
+
+/// Pushes what is left of the audio, as far as it is taken.
+void push_rest(const Stream &stream, const Pcm &pcm, std::size_t &done,
+               std::size_t piece = INT32_MAX) {
+  const std::size_t length = std::min(piece, pcm.size() - done);
+  const auto taken = PushUtteranceAudio(stream.get(), &pcm[done], static_cast<int32_t>(length));
+  EXPECT_GE(taken, 0);
+  done += static_cast<std::size_t>(taken);
 }
 
 /// Audio for a script: noise, or zeros where a frame is null.
@@ -93,47 +108,46 @@ std::vector<Utterance> utterances_of(const UtteranceSettings &settings, const st
   pcm.resize(pcm.size() + static_cast<std::size_t>(rest), 100);
   const Stream stream = open(settings);
   std::vector<Utterance> found;
-  std::size_t done = 0;
-  while (done < pcm.size()) {
-    const int32_t taken =
-        PushUtteranceAudio(stream.get(), &pcm[done], static_cast<int32_t>(pcm.size() - done));
-    EXPECT_GE(taken, 0);
-    done += static_cast<std::size_t>(taken);
-    for (const Utterance &next : take_all(stream.get())) found.push_back(next);
-  }
+  for (std::size_t done = 0; done < pcm.size(); take_all(stream, found))
+    push_rest(stream, pcm, done);
   EXPECT_EQ(FlushUtteranceStream(stream.get()), rest);
-  for (const Utterance &next : take_all(stream.get())) found.push_back(next);
+  take_all(stream, found);
   play("");
   for (std::size_t i = 0; i < found.size(); ++i)
     EXPECT_EQ(found[i].number, static_cast<int>(i) + 1);
   return found;
 }
 
-/// Start and end in frames, as "start-end start-end".
-std::string spans(const UtteranceSettings &settings, const std::string &answers) {
-  const int32_t frame = settings.rate_hz / 100;
-  std::string text;
-  for (const Utterance &next : utterances_of(settings, answers)) {
-    EXPECT_EQ(next.start % frame, 0);
-    EXPECT_EQ(next.end % frame, 0);
-    if (!text.empty()) text += ' ';
-    text += std::to_string(next.start / frame) + "-" + std::to_string(next.end / frame);
+/// Settings and a script, and the utterances in frames, as "start-end start-end".
+struct Case {
+  UtteranceSettings settings;
+  std::string runs;
+  std::string spans;
+};
+
+void expect_spans(const std::vector<Case> &cases) {
+  for (const auto &[settings, runs, expected] : cases) {
+    const int32_t frame = settings.rate_hz / 100;
+    std::string spans;
+    for (const Utterance &next : utterances_of(settings, frames(runs))) {
+      EXPECT_EQ(next.start % frame, 0);
+      EXPECT_EQ(next.end % frame, 0);
+      if (!spans.empty()) spans += ' ';
+      spans += std::to_string(next.start / frame) + "-" + std::to_string(next.end / frame);
+    }
+    EXPECT_EQ(spans, expected) << runs;
   }
-  return text;
 }
 
 TEST(UtteranceStream, DatesPiecesBackByTheDetectorsDelay) {
-  struct Case {
-    int32_t rate, content_type, start_frames, end_frames;
-  };
-  for (const Case &c : {Case{16000, 0, 5, 25}, Case{16000, 1, 5, 25}, Case{16000, 2, 3, 14},
-                        Case{16000, -1, 3, 14}, Case{8000, 0, 5, 28}, Case{8000, 7, 3, 17}}) {
-    const int32_t frame = c.rate / 100;
-    const auto found = utterances_of(settings_of(c.rate, c.content_type, 500),
-                                     run('0', 60) + run('1', 90) + run('0', 80));
+  constexpr int32_t kCases[][4] = {{16000, 0, 5, 25},  {16000, 1, 5, 25}, {16000, 2, 3, 14},
+                                   {16000, -1, 3, 14}, {8000, 0, 5, 28},  {8000, 7, 3, 17}};
+  for (const auto &[rate, content_type, start_frames, end_frames] : kCases) {
+    const int32_t frame = rate / 100;
+    const auto found = utterances_of(settings_of(rate, content_type, 500), frames("60o 90s 80o"));
     ASSERT_EQ(found.size(), 1u);
-    EXPECT_EQ(found[0].start, (60 - c.start_frames) * frame);
-    EXPECT_EQ(found[0].end, (150 - c.end_frames) * frame);
+    EXPECT_EQ(found[0].start, (60 - start_frames) * frame);
+    EXPECT_EQ(found[0].end, (150 - end_frames) * frame);
     EXPECT_EQ(found[0].began, 61 * frame);
     EXPECT_EQ(found[0].ended, 150 * frame);
     EXPECT_EQ(found[0].open, 0);
@@ -142,95 +156,74 @@ TEST(UtteranceStream, DatesPiecesBackByTheDetectorsDelay) {
 
 TEST(UtteranceStream, ClipsToTheInputAndToThePreviousPiece) {
   const auto no_hangover = settings_of(16000, 0, 0);
-  EXPECT_EQ(spans(no_hangover, run('0', 2) + run('1', 60) + "00"), "0-37");
-  // The interrupted piece ends undated at 90; the next onset is dated back into it.
-  EXPECT_EQ(spans(no_hangover, run('0', 50) + run('1', 40) + "n0" + run('1', 60) + "00"),
-            "45-90 90-127");
-  // A piece that is no longer than the closing pause holds no speech.
-  EXPECT_EQ(spans(no_hangover, run('0', 50) + run('1', 20) + run('0', 40)), "");
+  expect_spans({{no_hangover, "2o 60s 2o", "0-37"},
+                // The interrupted piece ends undated; the next onset is dated back into it.
+                {no_hangover, "50o 40s 1n 1o 60s 2o", "45-90 90-127"},
+                // A piece that is no longer than the closing pause holds no speech.
+                {no_hangover, "50o 20s 40o", ""}});
 }
 
 TEST(UtteranceStream, JoinsWithinTheHangover) {
-  const std::string first = run('0', 50) + run('1', 60);
-  const auto answers = [&](int gap) { return first + run('0', gap) + run('1', 60) + run('0', 80); };
-  EXPECT_EQ(spans(settings_of(16000, 0, 500), answers(49)), "45-194");
-  EXPECT_EQ(spans(settings_of(16000, 0, 500), answers(50)), "45-85 155-195");
-  EXPECT_EQ(spans(settings_of(16000, 0, 509), answers(50)), "45-85 155-195");
-  EXPECT_EQ(spans(settings_of(16000, 0, 0), answers(1)), "45-85 106-146");
-  EXPECT_EQ(spans(settings_of(8000, 0, 500), answers(49)), "45-191");
-  EXPECT_EQ(spans(settings_of(16000, 0, 20), answers(1)), "45-146");
+  expect_spans({{settings_of(16000, 0, 500), "50o 60s 49o 60s 80o", "45-194"},
+                {settings_of(16000, 0, 500), "50o 60s 50o 60s 80o", "45-85 155-195"},
+                {settings_of(16000, 0, 509), "50o 60s 50o 60s 80o", "45-85 155-195"},
+                {settings_of(16000, 0, 0), "50o 60s 1o 60s 80o", "45-85 106-146"},
+                {settings_of(8000, 0, 500), "50o 60s 49o 60s 80o", "45-191"},
+                {settings_of(16000, 0, 20), "50o 60s 1o 60s 80o", "45-146"}});
 }
 
 TEST(UtteranceStream, TreatsNullAudioAsSilence) {
   const auto settings = settings_of(16000, 0, 100);
-  const std::string before = run('0', 50) + run('1', 60);
   // Interrupted for good: the end is the last answer 1.
-  EXPECT_EQ(spans(settings, before + run('n', 100)), "45-110");
-  // Resumed without a new onset: not dated back, whether joined or not.
-  EXPECT_EQ(spans(settings, before + run('n', 9) + run('1', 40) + run('0', 60)), "45-134");
-  EXPECT_EQ(spans(settings, before + run('n', 10) + run('1', 40) + run('0', 60)), "45-110 120-135");
-  // The detector answered 0 in between, so the next run is a new onset.
-  EXPECT_EQ(spans(settings, before + "nn0n" + run('n', 20) + run('1', 40) + run('0', 60)),
-            "45-110 129-149");
-  // Resumed into nothing but the closing pause: the joined end stays.
-  EXPECT_EQ(spans(settings, before + "nn" + run('1', 10) + run('0', 60)), "45-110");
+  expect_spans({{settings, "50o 60s 100n", "45-110"},
+                // Resumed without a new onset: not dated back, whether joined or not.
+                {settings, "50o 60s 9n 40s 60o", "45-134"},
+                {settings, "50o 60s 10n 40s 60o", "45-110 120-135"},
+                // The detector answered 0 in between, so the next run is a new onset.
+                {settings, "50o 60s 2n 1o 21n 40s 60o", "45-110 129-149"},
+                // Resumed into nothing but the closing pause: the joined end stays.
+                {settings, "50o 60s 2n 10s 60o", "45-110"}});
 }
 
 TEST(UtteranceStream, DropsWhatTheDetectorRefused) {
   const auto settings = settings_of(16000, 2, 500);
-  EXPECT_EQ(spans(settings, run('0', 50) + run('1', 19) + run('0', 80)), "");
-  EXPECT_EQ(spans(settings, run('0', 50) + run('1', 20) + run('0', 80)), "47-56");
-  EXPECT_EQ(spans(settings_of(16000, 1, 500), run('0', 50) + run('1', 19 + 25) + run('0', 80)),
-            "45-69");
-  // A refused run neither lengthens its predecessor nor restarts the hangover.
-  const std::string first = run('0', 50) + run('1', 60);
-  EXPECT_EQ(spans(settings, first + run('0', 20) + run('1', 19) + run('0', 80)), "47-96");
-  EXPECT_EQ(
-      spans(settings, first + run('0', 20) + run('1', 19) + run('0', 11) + run('1', 30) + "00"),
-      "47-96 157-176");
-  EXPECT_EQ(
-      spans(settings, first + run('0', 20) + run('1', 19) + run('0', 10) + run('1', 30) + "00"),
-      "47-175");
-  // Null audio does not split the detector's count of answers.
-  EXPECT_EQ(spans(settings, run('0', 50) + run('1', 10) + "nn" + run('1', 20) + run('0', 80)),
-            "47-68");
-  EXPECT_EQ(spans(settings, run('0', 50) + run('1', 10) + "nn" + run('1', 9) + run('0', 80)), "");
-  EXPECT_EQ(spans(settings, first + "0" + run('1', 10) + "nn0" + run('0', 80)), "47-96");
-  EXPECT_EQ(spans(settings, run('0', 50) + run('1', 10) + "nn" + run('1', 15) + run('0', 80)),
-            "47-63");
-  // Refused after the hangover is over: the predecessor is handed out once.
-  EXPECT_EQ(spans(settings_of(16000, 2, 100),
-                  first + "00" + run('1', 10) + run('n', 20) + run('1', 5) + run('0', 80)),
-            "47-96");
-  // A refused run is no neighbour whose padding would meet.
-  EXPECT_EQ(
-      spans(settings_of(16000, 2, 0, 0, 1000), first + run('0', 20) + run('1', 19) + run('0', 80)),
-      "47-196");
+  expect_spans({{settings, "50o 19s 80o", ""},
+                {settings, "50o 20s 80o", "47-56"},
+                {settings_of(16000, 1, 500), "50o 44s 80o", "45-69"},
+                // A refused run neither lengthens its predecessor nor restarts the hangover.
+                {settings, "50o 60s 20o 19s 80o", "47-96"},
+                {settings, "50o 60s 20o 19s 11o 30s 2o", "47-96 157-176"},
+                {settings, "50o 60s 20o 19s 10o 30s 2o", "47-175"},
+                // Null audio does not split the detector's count of answers.
+                {settings, "50o 10s 2n 20s 80o", "47-68"},
+                {settings, "50o 10s 2n 9s 80o", ""},
+                {settings, "50o 60s 1o 10s 2n 81o", "47-96"},
+                {settings, "50o 10s 2n 15s 80o", "47-63"},
+                // Refused after the hangover is over: the predecessor is handed out once.
+                {settings_of(16000, 2, 100), "50o 60s 2o 10s 20n 5s 80o", "47-96"},
+                // A refused run is no neighbour whose padding would meet.
+                {settings_of(16000, 2, 0, 0, 1000), "50o 60s 20o 19s 80o", "47-196"}});
 }
 
 TEST(UtteranceStream, PadsUpToTheMiddleOfAGap) {
   // Speech from frame 45 to 85 and from 155 to 195: a gap of 70 frames.
-  const std::string answers =
-      run('0', 50) + run('1', 60) + run('0', 50) + run('1', 60) + run('0', 100);
-  const auto padded = [&](int before_ms, int after_ms) {
-    return spans(settings_of(16000, 0, 0, before_ms, after_ms), answers);
-  };
-  EXPECT_EQ(padded(100, 200), "35-105 145-215");
-  EXPECT_EQ(padded(350, 350), "10-120 120-230");
-  EXPECT_EQ(padded(1000, 1000), "0-120 120-295");
-  EXPECT_EQ(padded(1000, 50), "0-90 120-200");
-  EXPECT_EQ(padded(0, 100000), "45-120 155-320");
-  EXPECT_EQ(padded(0, 500), "45-120 155-245");
+  const std::string runs = "50o 60s 50o 60s 100o";
+  expect_spans({{settings_of(16000, 0, 0, 100, 200), runs, "35-105 145-215"},
+                {settings_of(16000, 0, 0, 350, 350), runs, "10-120 120-230"},
+                {settings_of(16000, 0, 0, 1000, 1000), runs, "0-120 120-295"},
+                {settings_of(16000, 0, 0, 1000, 50), runs, "0-90 120-200"},
+                {settings_of(16000, 0, 0, 0, 100000), runs, "45-120 155-320"},
+                {settings_of(16000, 0, 0, 0, 500), runs, "45-120 155-245"}});
 
   // An odd gap leaves no sample to both and none to neither.
-  const auto found = utterances_of(settings_of(8000, 0, 0, 5000, 5000), answers, 33);
+  const auto found = utterances_of(settings_of(8000, 0, 0, 5000, 5000), frames(runs), 33);
   ASSERT_EQ(found.size(), 2u);
   EXPECT_EQ(found[0].end, found[1].start);
   EXPECT_EQ(found[1].end, 320 * 80 + 33) << "padding may use the samples that were not judged";
 }
 
 TEST(UtteranceStream, FlushClosesWhatIsOpen) {
-  const std::string answers = run('0', 50) + run('1', 30);
+  const std::string answers = frames("50o 30s");
   for (const int32_t content_type : {0, 2}) {
     const auto found = utterances_of(settings_of(16000, content_type, 500), answers, 159);
     ASSERT_EQ(found.size(), 1u);
@@ -244,39 +237,10 @@ TEST(UtteranceStream, FlushClosesWhatIsOpen) {
             80 * 160 + 157);
   EXPECT_EQ(FlushUtteranceStream(stream.get()), 157);
   EXPECT_EQ(FlushUtteranceStream(stream.get()), 157);
-  EXPECT_EQ(take_all(stream.get()).size(), 1u);
-  EXPECT_EQ(PushUtteranceAudio(stream.get(), pcm.data(), 3), -1);
-  play("");
-}
-
-TEST(UtteranceStream, StopsWhenTheQueueIsFullAndLosesNothing) {
-  std::string answers = run('0', 50);
-  for (int i = 0; i < 40; ++i) answers += run('1', 30) + run('0', 10);
-  answers += run('1', 30);  // still open at the end
-  const auto settings = settings_of(16000, 0, 0);
-  const auto expected = utterances_of(settings, answers);
-  ASSERT_EQ(expected.size(), 41u);
-
-  play(answers);
-  const Pcm pcm = audio_for(answers, 160);
-  const Stream stream = open(settings);
-  const auto total = static_cast<int32_t>(pcm.size());
-  int32_t done = PushUtteranceAudio(stream.get(), pcm.data(), total);
-  EXPECT_LT(done, total);
-  EXPECT_EQ(PushUtteranceAudio(stream.get(), &pcm[static_cast<std::size_t>(done)], total - done),
-            0);
   std::vector<Utterance> found;
-  Utterance next;
-  while (done < total) {  // one out, some in: the queue stays full to the end
-    ASSERT_EQ(NextUtterance(stream.get(), &next), 1);
-    found.push_back(next);
-    done += PushUtteranceAudio(stream.get(), &pcm[static_cast<std::size_t>(done)], total - done);
-  }
-  EXPECT_EQ(FlushUtteranceStream(stream.get()), 0);
-  for (const Utterance &last : take_all(stream.get())) found.push_back(last);
-  ASSERT_EQ(found.size(), expected.size());
-  for (std::size_t i = 0; i < found.size(); ++i) EXPECT_EQ(found[i].start, expected[i].start) << i;
-  EXPECT_EQ(found.back().open, 1);
+  take_all(stream, found);
+  EXPECT_EQ(found.size(), 1u);
+  EXPECT_EQ(PushUtteranceAudio(stream.get(), pcm.data(), 3), -1);
   play("");
 }
 
@@ -285,6 +249,35 @@ std::vector<std::array<int64_t, 6>> fields(const std::vector<Utterance> &utteran
   for (const Utterance &u : utterances)
     all.push_back({u.start, u.end, u.began, u.ended, u.number, u.open});
   return all;
+}
+
+TEST(UtteranceStream, StopsWhenTheQueueIsFullAndLosesNothing) {
+  std::string runs = "50o";
+  for (int i = 0; i < 40; ++i) runs += " 30s 10o";
+  const std::string answers = frames(runs + " 30s");  // still open at the end
+  const auto settings = settings_of(16000, 0, 0);
+  const auto expected = utterances_of(settings, answers);
+  ASSERT_EQ(expected.size(), 41u);
+
+  play(answers);
+  const Pcm pcm = audio_for(answers, 160);
+  const Stream stream = open(settings);
+  std::size_t done = 0;
+  push_rest(stream, pcm, done);
+  EXPECT_LT(done, pcm.size());
+  const std::size_t full = done;
+  push_rest(stream, pcm, done);
+  EXPECT_EQ(done, full);
+  std::vector<Utterance> found;
+  while (done < pcm.size()) {  // one out, some in: the queue stays full to the end
+    ASSERT_EQ(NextUtterance(stream.get(), &found.emplace_back()), 1);
+    push_rest(stream, pcm, done);
+  }
+  EXPECT_EQ(FlushUtteranceStream(stream.get()), 0);
+  take_all(stream, found);
+  EXPECT_EQ(fields(found), fields(expected));
+  EXPECT_EQ(found.back().open, 1);
+  play("");
 }
 
 TEST(UtteranceStream, AnswersDoNotDependOnTheCut) {
@@ -296,14 +289,10 @@ TEST(UtteranceStream, AnswersDoNotDependOnTheCut) {
   const auto push_all = [&](auto &&piece_length) {
     const Stream stream = open(settings);
     std::vector<Utterance> found;
-    for (std::size_t done = 0; done < pcm.size();) {
-      const auto piece = std::min<std::size_t>(piece_length(), pcm.size() - done);
-      done += static_cast<std::size_t>(
-          PushUtteranceAudio(stream.get(), &pcm[done], static_cast<int32_t>(piece)));
-      for (const Utterance &next : take_all(stream.get())) found.push_back(next);
-    }
+    for (std::size_t done = 0; done < pcm.size(); take_all(stream, found))
+      push_rest(stream, pcm, done, piece_length());
     FlushUtteranceStream(stream.get());
-    for (const Utterance &next : take_all(stream.get())) found.push_back(next);
+    take_all(stream, found);
     return fields(found);
   };
   const auto expected = push_all([&] { return pcm.size(); });
