@@ -1,5 +1,5 @@
 /* The worked example of orvalis.h, word for word, and a main program around it:
- * example_epd RECORDING    (raw 16-bit PCM, 16 kHz) */
+ * example_epd <RECORDING    (raw 16-bit PCM, 16 kHz) */
 // clang-format off
 #include <stdio.h>
 #include "orvalis.h"
@@ -22,13 +22,4 @@ int report_speech(const int16_t *pcm, int32_t samples)
 
 #include "tests/support/read_pcm.h"
 
-int main(int argc, char **argv) {
-  int32_t samples;
-  int16_t *pcm;
-  int32_t failed;
-  if (argc != 2) return 2;
-  pcm = read_pcm(argv[1], &samples);
-  failed = report_speech(pcm, samples);
-  free(pcm);
-  return failed != 0;
-}
+int main(void) { return report_speech(pcm, read_pcm()) != 0; }

@@ -1,5 +1,5 @@
 /* The worked example of utterance_stream.h, word for word, and a main program around it:
- * example_stream RECORDING    (raw 16-bit PCM, 16 kHz) */
+ * example_stream <RECORDING    (raw 16-bit PCM, 16 kHz) */
 // clang-format off
 #include <stdio.h>
 #include "utterance_stream.h"
@@ -26,13 +26,4 @@ int print_utterances(const int16_t *pcm, int32_t samples)
 
 #include "tests/support/read_pcm.h"
 
-int main(int argc, char **argv) {
-  int32_t samples;
-  int16_t *pcm;
-  int32_t failed;
-  if (argc != 2) return 2;
-  pcm = read_pcm(argv[1], &samples);
-  failed = print_utterances(pcm, samples);
-  free(pcm);
-  return failed != 0;
-}
+int main(void) { return print_utterances(pcm, read_pcm()) != 0; }

@@ -1,6 +1,6 @@
 /* A C host that reads and writes the flags by name. Built at a fixed position (the flags then lie
  * in the program's own image), as a position-independent program, and opening the library at run
- * time: all three must share the engine's flags, and print the same. host_test RECORDING    (raw
+ * time: all three must share the engine's flags, and print the same. host_test <RECORDING    (raw
  * 16-bit PCM, 16 kHz) */
 #include "Voice_Engine/basic_op/basic_op.h"
 #include "Voice_Engine/epd/fixed_fft.h"
@@ -9,6 +9,7 @@
 
 #ifdef HOST_OPENS_LIBRARY
 #include <dlfcn.h>
+#include <stdlib.h>
 
 static void *symbol(const char *name) {
   static void *library = NULL;
@@ -31,7 +32,6 @@ static void *symbol(const char *name) {
 #define add              IN_LIBRARY(add)
 #define L_add            IN_LIBRARY(L_add)
 #define L_ns_add         IN_LIBRARY(L_ns_add)
-#define L_add_c          IN_LIBRARY(L_add_c)
 #define L_sat            IN_LIBRARY(L_sat)
 #define ZOLT_L_sub       IN_LIBRARY(ZOLT_L_sub)
 #define r_fft_epd        IN_LIBRARY(r_fft_epd)
@@ -62,29 +62,20 @@ static void operators(void) {
   expect(ns_Overflow, kPoison, "ns_Overflow after L_add");
   expect(add(1, 2), 3, "add");
   expect(Overflow, 0, "Overflow after add");
-  expect(L_add(1, 2), 3, "L_add");
-  expect(Overflow, 0, "Overflow after an L_add that fits");
-
   expect(L_ns_add(INT32_MIN, -1), INT32_MIN, "L_ns_add");
   expect(ns_Overflow, 1, "ns_Overflow after L_ns_add");
   expect(Overflow, 0, "Overflow after L_ns_add");
-
-  Overflow_ZOLT = 0;
   expect(ZOLT_L_sub(INT32_MIN, 1), INT32_MIN, "ZOLT_L_sub");
   expect(Overflow_ZOLT, 1, "Overflow_ZOLT after ZOLT_L_sub");
 
   /* The engine reads what the host writes. */
-  Carry = 1;
-  expect(L_add_c(5, 6), 12, "L_add_c with a carry of the host");
-  expect(Carry, 0, "Carry after L_add_c");
   Overflow = 1;
   Carry = 1;
   expect(L_sat(5), INT32_MIN, "L_sat with flags of the host");
-  expect(Overflow, 0, "Overflow after L_sat");
-  expect(Carry, 0, "Carry after L_sat");
+  expect(Overflow + Carry, 0, "flags after L_sat");
 }
 
-/* One transform always ends in operators that write the flag; over noise it ends both ways. */
+/* Over full-scale noise the inverse transform leaves both values of the flag. */
 static void transforms(void) {
   int32_t seen[2] = {0, 0};
   uint32_t state = 1;
@@ -102,13 +93,11 @@ static void transforms(void) {
     if (Overflow == 0 || Overflow == 1) ++seen[Overflow];
     expect(ns_Overflow == 0 || ns_Overflow == 1, 1, "ns_Overflow after r_fft_ns is a flag");
   }
-  expect(seen[0] + seen[1], 200, "transforms that wrote Overflow");
-  expect(seen[0] > 0 && seen[1] > 0, 1, "both flags seen");
+  expect(seen[0] > 0 && seen[1] > 0 && seen[0] + seen[1] == 200, 1, "both flags seen");
   for (int i = 0; i < 256; ++i) expect(phs_tbl[0][i], phs_tbl_WB[i], "entry of phs_tbl[0]");
-  printf("transforms: %d without overflow, %d with\n", (int)seen[0], (int)seen[1]);
 }
 
-static void frames(const int16_t *pcm, int32_t samples) {
+static void frames(int32_t samples) {
   EpdInstance *epd = InitializeEPD(0, 0);
   int32_t judged = 0;
   int32_t raised[2] = {0, 0};
@@ -126,14 +115,9 @@ static void frames(const int16_t *pcm, int32_t samples) {
   expect(FreeMemoryEPD(epd), 0, "FreeMemoryEPD");
 }
 
-int main(int argc, char **argv) {
-  int32_t samples;
-  int16_t *pcm;
-  if (argc != 2) return 2;
-  pcm = read_pcm(argv[1], &samples);
+int main(void) {
   operators();
   transforms();
-  frames(pcm, samples);
-  free(pcm);
+  frames(read_pcm());
   return failures != 0;
 }

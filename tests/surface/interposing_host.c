@@ -1,13 +1,14 @@
 /* Prints what the library answers over a recording. Built once as it is, and once with functions
  * and tables of its own under names that the library exports too, all of them wrong: the library
  * must not notice, and both programs print the same.
- *   interposing_host RECORDING    (raw 16-bit PCM) */
+ *   interposing_host <RECORDING    (raw 16-bit PCM) */
 #include "jni/orvalis.h"
 #include "stream/utterance_stream.h"
 #include "tests/support/read_pcm.h"
 
 #ifdef HOST_INTERPOSES
 #include <dlfcn.h>
+#include <stdlib.h>
 
 int16_t add(int16_t a, int16_t b) { return (int16_t)(a ^ b ^ 0x55); }
 int16_t sub(int16_t a, int16_t b) { return (int16_t)(a ^ b ^ 0x33); }
@@ -32,17 +33,17 @@ static void check_interposed(const char *name, const void *own) {
   fprintf(stderr, "%s is not interposed\n", name);
   exit(2);
 }
+#endif
 
 static void check_all_interposed(void) {
+#ifdef HOST_INTERPOSES
   check_interposed("add", (const void *)(uintptr_t)add);
   check_interposed("phs_tbl_WB", phs_tbl_WB);
   check_interposed("tablog", tablog);
-}
-#else
-static void check_all_interposed(void) {}
 #endif
+}
 
-static void print_answers(const int16_t *pcm, int32_t samples, int32_t mode, int32_t content_type) {
+static void print_answers(int32_t samples, int32_t mode, int32_t content_type) {
   const int32_t frame = mode == 0 ? 160 : 80;
   EpdInstance *epd = InitializeEPD(mode, 0);
   printf("mode %d, content type %d: ", (int)mode, (int)content_type);
@@ -53,7 +54,7 @@ static void print_answers(const int16_t *pcm, int32_t samples, int32_t mode, int
   FreeMemoryEPD(epd);
 }
 
-static void print_queries(const int16_t *pcm, int32_t samples, int32_t rate_hz) {
+static void print_queries(int32_t samples, int32_t rate_hz) {
   uint32_t folded = 0;
   for (int32_t at = 0; at + 160 <= samples; at += 160) {
     int32_t spectrum[128] = {0};
@@ -64,7 +65,7 @@ static void print_queries(const int16_t *pcm, int32_t samples, int32_t rate_hz) 
   printf("queries at %d Hz: %08lx\n", (int)rate_hz, (unsigned long)folded);
 }
 
-static void print_utterances(const int16_t *pcm, int32_t samples) {
+static void print_utterances(int32_t samples) {
   UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   UtteranceStream *stream = OpenUtteranceStream(&settings);
   Utterance found;
@@ -76,18 +77,14 @@ static void print_utterances(const int16_t *pcm, int32_t samples) {
   CloseUtteranceStream(stream);
 }
 
-int main(int argc, char **argv) {
-  int32_t samples;
-  int16_t *pcm;
-  if (argc != 2) return 2;
+int main(void) {
+  const int32_t samples = read_pcm();
   check_all_interposed();
-  pcm = read_pcm(argv[1], &samples);
-  print_answers(pcm, samples, 0, 0);
-  print_answers(pcm, samples, 0, 2);
-  print_answers(pcm, samples, 1000, 0);
-  print_queries(pcm, samples, 16000);
-  print_queries(pcm, samples, 8000);
-  print_utterances(pcm, samples);
-  free(pcm);
+  print_answers(samples, 0, 0);
+  print_answers(samples, 0, 2);
+  print_answers(samples, 1000, 0);
+  print_queries(samples, 16000);
+  print_queries(samples, 8000);
+  print_utterances(samples);
   return 0;
 }

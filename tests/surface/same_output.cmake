@@ -4,7 +4,7 @@
 string(REPLACE "|" ";" PROGRAMS "${PROGRAMS}")
 unset(first)
 foreach(program IN LISTS PROGRAMS)
-  execute_process(COMMAND ${program} ${RECORDING}
+  execute_process(COMMAND ${program} INPUT_FILE ${RECORDING}
                   OUTPUT_VARIABLE output ERROR_VARIABLE errors RESULT_VARIABLE result)
   if(NOT result EQUAL 0)
     message("${output}${errors}")
