@@ -31,11 +31,6 @@ std::vector<Json> json_lines(const std::string &text) {
   return lines;
 }
 
-std::vector<Json> without_names(std::vector<Json> lines) {
-  for (Json &line : lines) line.erase("file");
-  return lines;
-}
-
 class Tool : public testing::Test {
 protected:
   struct Result {
@@ -60,6 +55,18 @@ protected:
     EXPECT_EQ(result.status, 0) << arguments;
     EXPECT_EQ(result.err, "") << arguments;
     return json_lines(result.out);
+  }
+
+  /// The same without the file's name.
+  std::vector<Json> unnamed(const std::string &arguments, const std::string &input = {}) const {
+    std::vector<Json> lines = epd(arguments, input);
+    for (Json &line : lines) line.erase("file");
+    return lines;
+  }
+
+  std::string write(const std::string &name, const std::string &bytes) const {
+    std::ofstream(folder_ / name, std::ios::binary) << bytes;
+    return folder_ / name;
   }
 
   TemporaryFolder folder_;
@@ -96,25 +103,24 @@ TEST_F(Tool, TableAndJsonTellTheSame) {
 
 TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
   for (const std::string &path : {kWide, kNarrow}) {
-    const auto expected = without_names(epd(path));
+    const auto expected = unnamed(path);
     ASSERT_FALSE(expected.empty());
     const std::string wav = read_file(path);
     const std::string samples = wav.substr(kWavHeader);
-    std::ofstream(folder_ / "samples", std::ios::binary) << samples;
     const std::string raw = path == kWide ? "--raw " : "--raw --rate 8000 ";
 
-    EXPECT_EQ(without_names(epd("-", wav)), expected);
-    EXPECT_EQ(without_names(epd("- <" + path)), expected);
-    EXPECT_EQ(without_names(epd(raw + "-", samples)), expected);
-    EXPECT_EQ(without_names(epd(raw + (folder_ / "samples"))), expected);
+    EXPECT_EQ(unnamed("-", wav), expected);
+    EXPECT_EQ(unnamed("- <" + path), expected);
+    EXPECT_EQ(unnamed(raw + "-", samples), expected);
+    EXPECT_EQ(unnamed(raw + write("samples", samples)), expected);
 
     // A live recorder's header, which cannot tell the length, and the same audio in two channels.
     const std::string open_end = wav.substr(0, kWavHeader - 4) + "\xff\xff\xff\xff" + samples;
-    EXPECT_EQ(without_names(epd("-", open_end)), expected);
+    EXPECT_EQ(unnamed("-", open_end), expected);
     std::string doubled;
     for (std::size_t i = 0; i + 1 < samples.size(); i += 2)
       doubled += samples.substr(i, 2) + samples.substr(i, 2);
-    EXPECT_EQ(without_names(epd(raw + "--channels 2 -", doubled)), expected);
+    EXPECT_EQ(unnamed(raw + "--channels 2 -", doubled), expected);
   }
 }
 
@@ -172,11 +178,11 @@ TEST_F(Tool, OptionsReachTheDetector) {
   }
   write_audio(folder_ / "quiet.wav", quiet, 8000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
   write_audio(folder_ / "loud.wav", loud, 8000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
-  const auto as_loud = without_names(epd(folder_ / "loud.wav"));
-  const auto as_quiet = without_names(epd(folder_ / "quiet.wav"));
+  const auto as_loud = unnamed(folder_ / "loud.wav");
+  const auto as_quiet = unnamed(folder_ / "quiet.wav");
   EXPECT_NE(as_loud, as_quiet);
-  EXPECT_EQ(without_names(epd("--gain 4 " + (folder_ / "quiet.wav"))), as_loud);
-  EXPECT_EQ(without_names(epd("--gain 0.25 " + (folder_ / "loud.wav"))), as_quiet);
+  EXPECT_EQ(unnamed("--gain 4 " + (folder_ / "quiet.wav")), as_loud);
+  EXPECT_EQ(unnamed("--gain 0.25 " + (folder_ / "loud.wav")), as_quiet);
 }
 
 TEST_F(Tool, FramesAgreeWithUtterances) {
@@ -220,10 +226,6 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
   write_audio(folder_ / "whole.flac", samples, 16000, 1, SF_FORMAT_FLAC | SF_FORMAT_PCM_16);
   write_audio(folder_ / "whole.caf", samples, 16000, 1, SF_FORMAT_CAF | SF_FORMAT_PCM_16);
   const std::string flac = read_file(folder_ / "whole.flac");
-  const auto write = [&](const char *name, const std::string &bytes) {
-    std::ofstream(folder_ / name, std::ios::binary) << bytes;
-    return folder_ / name;
-  };
   const std::vector<std::string> bad = {folder_ / "missing.wav",
                                         folder_.path(),
                                         write("empty.wav", ""),
