@@ -1,8 +1,9 @@
-// Block scaling against its definition, sample by sample.
+// Block scaling against its definition: blocks of two or three samples as operands, of which the
+// first few are the block, so that those behind it must stay.
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <vector>
+#include <span>
 
 #include "basic_op.h"
 #include "expect_operator.h"
@@ -12,101 +13,80 @@ namespace {
 
 using definition::Flags;
 using definition::Wide;
-using Block = std::vector<int16_t>;
 
-constexpr int16_t LENGTH = 24, GUARD = 2;
+/// Samples and what was returned, in one word that a test can compare.
+template <class Sample>
+int64_t folded(std::span<const Sample> samples, int64_t returned = 0) {
+  auto word = static_cast<uint64_t>(returned);
+  for (const Sample x : samples) word = word * 65599 + static_cast<uint64_t>(x);
+  return static_cast<int64_t>(word);
+}
 
-Wide loudest(const Block &block, int length) {
+Wide largest(Flags &f, std::span<const Wide> x, Wide length) {
   Wide peak = 0;
-  for (int i = 0; i < length; ++i) peak = std::max<Wide>(peak, std::abs(int{block[i]}));
-  return std::min(peak, definition::max16);
+  for (Wide i = 0; i < length; ++i) peak = std::max(peak, definition::abs_s(f, x[i]));
+  return peak;
 }
 
-/// Random blocks of every loudness, a silent one and full-scale ones; two samples of guard behind.
-std::vector<Block> blocks() {
-  std::vector<Block> all{Block(LENGTH + GUARD, 0), Block(LENGTH + GUARD, INT16_MIN),
-                         Block(LENGTH + GUARD, INT16_MAX)};
-  std::mt19937_64 random = seeded_generator();
-  for (int shift = 0; shift < 16; ++shift)
-    for (int i = 0; i < 20; ++i) {
-      Block &block = all.emplace_back(LENGTH + GUARD);
-      for (int16_t &x : block) x = static_cast<int16_t>(static_cast<int16_t>(random()) >> shift);
-    }
-  return all;
+template <int16_t (*normalise)(int16_t *, int16_t, int16_t)>
+int64_t normalised(int16_t a, int16_t b, int16_t c, int16_t length, int16_t headroom) {
+  int16_t x[] = {a, b, c};
+  const int16_t shift = normalise(x, length % 4, headroom);
+  return folded<int16_t>(x, shift);
 }
 
-/// Hands every block, length, shift or headroom and standing flag of both copies to `check`.
-template <class Check>
-void for_each_case(Check check) {
-  for (const Copy copy : {PLAIN, NS})
-    for (const Block &block : blocks())
-      for (const int length : {-1, 0, 1, 7, int{LENGTH}})
-        for (int amount = -3; amount <= 4; ++amount)
-          for (int overflow = 0; overflow < 2; ++overflow) {
-            SCOPED_TRACE(testing::Message()
-                         << "copy " << copy << ", length " << length << ", amount " << amount
-                         << ", block " << testing::PrintToString(block));
-            write_flags(flags_of(copy, overflow, 1));
-            check(copy, block, static_cast<int16_t>(length), static_cast<int16_t>(amount),
-                  Flags{overflow, 1});
-            if (testing::Test::HasFailure()) return;
-          }
+template <int16_t (*normalise)(int16_t *, int16_t *, int16_t, int16_t)>
+int64_t two_normalised(int16_t a, int16_t b, int16_t c, int16_t d, int16_t length,
+                       int16_t headroom) {
+  int16_t x[] = {a, b, c, d};
+  const int16_t shift = normalise(x, x + 2, length % 3, headroom);
+  return folded<int16_t>(x, shift);
+}
+
+template <void (*denormalise)(int16_t *, int16_t, int16_t)>
+int64_t denormalised(int16_t a, int16_t b, int16_t c, int16_t length, int16_t shift) {
+  int16_t x[] = {a, b, c};
+  denormalise(x, length % 4, shift);
+  return folded<int16_t>(x);
 }
 
 TEST(BlockScaling, NormaliseOneBlock) {
-  for_each_case([](Copy copy, const Block &block, int16_t length, int16_t headroom, Flags flags) {
-    Block got = block, expected = block;
-    const int16_t shift =
-        (copy == NS ? ns_cblock_norm : block_norm_AL)(got.data(), length, headroom);
-    EXPECT_EQ(shift,
-              definition::norm_s(flags, loudest(block, std::max<int>(length, 1))) - headroom);
-    flags.overflow = 0;
-    for (int i = 0; i < length; ++i)
-      expected[i] = static_cast<int16_t>(definition::shift_r(flags, block[i], shift));
-    EXPECT_EQ(got, expected);
-    EXPECT_EQ(read_flags(), flags_of(copy, flags.overflow, flags.carry));
-  });
-  Block silent(LENGTH, 0);
-  EXPECT_EQ(block_norm_AL(silent.data(), LENGTH, 2), -2);
+  const auto define = [](Flags &f, Wide a, Wide b, Wide c, Wide length, Wide headroom) {
+    Wide x[] = {a, b, c};
+    const Wide peak = largest(f, x, std::max<Wide>(length % 4, 1));
+    const Wide shift = definition::sub(f, definition::norm_s(f, peak), headroom);
+    for (Wide i = 0; i < length % 4; ++i) x[i] = definition::shift_r(f, x[i], shift);
+    return folded<Wide>(x, shift);
+  };
+  expect_operator("block_norm", PLAIN, normalised<block_norm_AL>, define);
+  expect_operator("block_norm", NS, normalised<ns_cblock_norm>, define);
 }
 
 TEST(BlockScaling, NormaliseTwoBlocksWithOneShift) {
-  for_each_case([](Copy copy, const Block &block, int16_t length, int16_t headroom, Flags flags) {
-    Block a = block, b(block.rbegin(), block.rend());
-    for (int16_t &x : b) x = static_cast<int16_t>(x / 3);
-    const Block a_before = a, b_before = b;
-    if (headroom % 2) std::swap(a, b);
-    const Wide peak = std::max(loudest(a_before, length), loudest(b_before, length));
-    const int16_t shift =
-        (copy == NS ? ns_cblock_norm2 : block_norm2)(a.data(), b.data(), length, headroom);
-    if (headroom % 2) std::swap(a, b);
-    EXPECT_EQ(shift, definition::norm_s(flags, peak) - headroom);
-    flags.overflow = 0;
-    Block a_expected = a_before, b_expected = b_before;
-    for (int i = 0; i < length; ++i) {
-      a_expected[i] = static_cast<int16_t>(definition::shl(flags, a_before[i], shift));
-      b_expected[i] = static_cast<int16_t>(definition::shl(flags, b_before[i], shift));
-    }
-    EXPECT_EQ(a, a_expected);
-    EXPECT_EQ(b, b_expected);
-    EXPECT_EQ(read_flags(), flags_of(copy, flags.overflow, flags.carry));
-  });
+  const auto define = [](Flags &f, Wide a, Wide b, Wide c, Wide d, Wide length, Wide headroom) {
+    Wide x[] = {a, b, c, d};
+    const Wide peak =
+        std::max(largest(f, x, length % 3), largest(f, std::span(x).last(2), length % 3));
+    const Wide shift = definition::sub(f, definition::norm_s(f, peak), headroom);
+    for (Wide i = 0; i < length % 3; ++i) x[i] = definition::shl(f, x[i], shift);
+    for (Wide i = 0; i < length % 3; ++i) x[i + 2] = definition::shl(f, x[i + 2], shift);
+    return folded<Wide>(x, shift);
+  };
+  expect_operator("block_norm2", PLAIN, two_normalised<block_norm2>, define);
+  expect_operator("block_norm2", NS, two_normalised<ns_cblock_norm2>, define);
 }
 
 TEST(BlockScaling, DenormaliseTruncatesTowardZero) {
-  for_each_case([](Copy copy, const Block &block, int16_t length, int16_t shift, Flags flags) {
-    Block got = block, expected = block;
-    (copy == NS ? ns_block_denorm : block_denorm_AL)(got.data(), length, shift);
-    for (int i = 0; i < length; ++i) {
-      const Wide magnitude = definition::shr(flags, definition::abs_s(flags, block[i]), shift);
-      expected[i] = static_cast<int16_t>(block[i] < 0 ? -magnitude : magnitude);
+  const auto define = [](Flags &f, Wide a, Wide b, Wide c, Wide length, Wide shift) {
+    Wide x[] = {a, b, c};
+    for (Wide i = 0; i < length % 4; ++i) {
+      const Wide magnitude = definition::shr(f, definition::abs_s(f, x[i]), shift);
+      x[i] = x[i] < 0 ? -magnitude : magnitude;
     }
-    EXPECT_EQ(got, expected);
-    EXPECT_EQ(read_flags(), flags_of(copy, flags.overflow, flags.carry));
-  });
-  Block odd{-3, 3};
-  block_denorm_AL(odd.data(), 2, 1);
-  EXPECT_EQ(odd, (Block{-1, 1}));
+    return folded<Wide>(x);
+  };
+  expect_operator("block_denorm", PLAIN, denormalised<block_denorm_AL>, define);
+  expect_operator("block_denorm", NS, denormalised<ns_block_denorm>, define);
 }
 
 }  // namespace
