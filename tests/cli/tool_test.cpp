@@ -11,6 +11,7 @@
 
 #include "tests/support/audio_file.h"
 #include "tests/support/child_process.h"
+#include "tests/support/recordings.h"
 #include "tests/support/temporary_folder.h"
 
 namespace orvalis::test {
@@ -124,8 +125,11 @@ TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
 }
 
 TEST_F(Tool, ChannelsAndRatesAreConverted) {
-  std::vector<float> stereo;  // left silent, right with speech
-  for (const float sample : read_audio(kWide)) stereo.insert(stereo.end(), {0.0F, sample});
+  Pcm stereo, tripled;  // left silent, right with speech; three samples for one
+  for (const short sample : load_recording(kWide)) {
+    stereo.insert(stereo.end(), {0, sample});
+    tripled.insert(tripled.end(), 3, sample);
+  }
   const std::string file = folder_ / "stereo.flac";
   write_audio(file, stereo, 16000, 2, SF_FORMAT_FLAC | SF_FORMAT_PCM_24);
   EXPECT_EQ(unnamed("--channel 2 " + file), unnamed(kWide));
@@ -133,9 +137,7 @@ TEST_F(Tool, ChannelsAndRatesAreConverted) {
   EXPECT_TRUE(epd("--channel 1 " + file).empty());
 
   // At another rate, the times are still those of the audio.
-  std::vector<float> tripled;
-  for (const float sample : read_audio(kWide)) tripled.insert(tripled.end(), 3, sample);
-  write_audio(folder_ / "48.wav", tripled, 48000, 1, SF_FORMAT_WAV | SF_FORMAT_FLOAT);
+  write_audio(folder_ / "48.wav", tripled, 48000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
   const auto found = epd(folder_ / "48.wav"), expected = epd(kWide);
   ASSERT_EQ(found.size(), expected.size());
   for (std::size_t i = 0; i < found.size(); ++i) {
@@ -161,9 +163,9 @@ TEST_F(Tool, OptionsReachTheDetector) {
   EXPECT_EQ(epd("--gain 1 " + kNarrow), plain);
 
   // A gain of 4 undoes what the audio lacks, and divides by 4 what it has too much.
-  std::vector<short> quiet, loud;
-  for (const float sample : read_audio(kNarrow)) {
-    quiet.push_back(static_cast<short>(sample * 32768 / 32));
+  Pcm quiet, loud;
+  for (const short sample : load_recording(kNarrow)) {
+    quiet.push_back(static_cast<short>(sample / 32));
     loud.push_back(static_cast<short>(quiet.back() * 4));
   }
   write_audio(folder_ / "quiet.wav", quiet, 8000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
@@ -212,7 +214,7 @@ TEST_F(Tool, SilenceAndNoAudioAreNoErrors) {
 
 TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
   const std::string wav = read_file(kWide);
-  const std::vector<float> samples = read_audio(kWide);
+  const Pcm samples = load_recording(kWide);
   write_audio(folder_ / "whole.flac", samples, 16000, 1, SF_FORMAT_FLAC | SF_FORMAT_PCM_16);
   write_audio(folder_ / "whole.caf", samples, 16000, 1, SF_FORMAT_CAF | SF_FORMAT_PCM_16);
   const std::string flac = read_file(folder_ / "whole.flac");
