@@ -181,14 +181,13 @@ Wide imag_part(Flags &f, Wide ar, Wide ai, Wide br, Wide bi) {
 }
 constexpr auto C2PREAL_SS = real_part<L_mult>, C2PIMAG_SS = imag_part<L_mult>;
 constexpr auto C2PREAL_LS = real_part<L_mpy_ls>, C2PIMAG_LS = imag_part<L_mpy_ls>;
-constexpr auto C3PREAL = [](Flags &f, Wide ar, Wide ai, Wide br, Wide bi, Wide cr, Wide ci) {
+template <auto part>
+Wide part_of_three(Flags &f, Wide ar, Wide ai, Wide br, Wide bi, Wide cr, Wide ci) {
   const Wide re = real_part<L_mpy_ll>(f, ar, ai, br, bi);
-  return real_part<L_mpy_ll>(f, re, imag_part<L_mpy_ll>(f, ar, ai, br, bi), cr, ci);
-};
-constexpr auto C3PIMAG = [](Flags &f, Wide ar, Wide ai, Wide br, Wide bi, Wide cr, Wide ci) {
-  const Wide re = real_part<L_mpy_ll>(f, ar, ai, br, bi);
-  return imag_part<L_mpy_ll>(f, re, imag_part<L_mpy_ll>(f, ar, ai, br, bi), cr, ci);
-};
+  return part(f, re, imag_part<L_mpy_ll>(f, ar, ai, br, bi), cr, ci);
+}
+constexpr auto C3PREAL = part_of_three<real_part<L_mpy_ll>>;
+constexpr auto C3PIMAG = part_of_three<imag_part<L_mpy_ll>>;
 
 // ---- Logarithm and exponential ----
 

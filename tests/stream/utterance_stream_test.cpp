@@ -307,8 +307,8 @@ TEST(UtteranceStream, AnswersDoNotDependOnTheCut) {
   }
 }
 
-TEST(UtteranceStream, RefusesBadArguments) {
-  UtteranceSettings good = UTTERANCE_SETTINGS_DEFAULT;
+TEST(UtteranceStream, RefusesBadArgumentsAndWantOfMemory) {
+  const UtteranceSettings good = UTTERANCE_SETTINGS_DEFAULT;
   for (int32_t UtteranceSettings::*field :
        {&UtteranceSettings::rate_hz, &UtteranceSettings::input_gain,
         &UtteranceSettings::hangover_ms, &UtteranceSettings::pad_before_ms,
@@ -317,14 +317,17 @@ TEST(UtteranceStream, RefusesBadArguments) {
     bad.*field = -1;
     EXPECT_EQ(OpenUtteranceStream(&bad), nullptr);
   }
-  good.rate_hz = 44100;
-  EXPECT_EQ(OpenUtteranceStream(&good), nullptr);
-  good.rate_hz = 8000;
-  good.input_gain = 3;
-  EXPECT_EQ(OpenUtteranceStream(&good), nullptr);
+  for (const UtteranceSettings &bad :
+       {UtteranceSettings{44100, 0, 0, 500, 0, 0}, {8000, 3, 0, 500, 0, 0}})
+    EXPECT_EQ(OpenUtteranceStream(&bad), nullptr);
   EXPECT_EQ(OpenUtteranceStream(nullptr), nullptr);
 
-  const Stream stream = open(settings_of(16000, 0, INT32_MAX, INT32_MAX, INT32_MAX));
+  const UtteranceSettings largest = settings_of(16000, 0, INT32_MAX, INT32_MAX, INT32_MAX);
+  for (int granted = 0; granted < 2; ++granted) {
+    const auto memory = orvalis::test::ScriptedMalloc::failing(granted);
+    EXPECT_EQ(OpenUtteranceStream(&largest), nullptr) << granted;
+  }
+  const Stream stream = open(largest);
   ASSERT_NE(stream, nullptr);
   const int16_t sample = 1;
   Utterance none;
@@ -337,15 +340,6 @@ TEST(UtteranceStream, RefusesBadArguments) {
   EXPECT_EQ(NextUtterance(stream.get(), &none), 0);
   EXPECT_EQ(FlushUtteranceStream(nullptr), -1);
   EXPECT_EQ(CloseUtteranceStream(nullptr), -1);
-}
-
-TEST(UtteranceStream, OpensOnlyWithAllItsMemory) {
-  const UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
-  for (int granted = 0; granted < 2; ++granted) {
-    const auto memory = orvalis::test::ScriptedMalloc::failing(granted);
-    EXPECT_EQ(OpenUtteranceStream(&settings), nullptr) << granted;
-  }
-  EXPECT_NE(open(settings), nullptr);
 }
 
 }  // namespace
