@@ -1,8 +1,11 @@
 // Where the utterances of real recordings lie, clean and in noise: against the recordings' own
-// energy.
+// energy and the number of words that their transcripts hold.
 #include <gtest/gtest.h>
 
+#include <fstream>
+#include <map>
 #include <string>
+#include <utility>
 
 #include "jni/orvalis.h"
 #include "stream/utterance_stream.h"
@@ -81,6 +84,18 @@ Pcm in_noise(const Pcm &speech, std::size_t margin, NoiseColour colour, double l
   return mixed;
 }
 
+/// Words of each recording by its name, from lines like "<s> ten of clubs </s> (001)".
+std::map<std::string, int> words_of(const std::string &transcript) {
+  std::ifstream file(std::string(ORVALIS_SPEECH_16K) + "/" + transcript);
+  std::map<std::string, int> words;
+  int count = 0;
+  for (std::string word; file >> word;) {
+    if (word.front() == '(') words[word.substr(1, word.size() - 2)] = std::exchange(count, 0);
+    if (word.front() != '<' && word.front() != '(') ++count;
+  }
+  return words;
+}
+
 struct Condition {
   const char *name;
   NoiseColour colour;
@@ -107,11 +122,11 @@ Span utterance_in_noise(const Pcm &speech, int32_t rate_hz, NoiseColour colour, 
 }
 
 TEST(Recordings, EachSentenceIsOneUtteranceWhereItsWordsAre) {
-  std::vector<std::string> names(std::begin(kSentences), std::end(kSentences));
-  for (const char digit : {'1', '2', '3', '4', '5'})
-    names.push_back(std::string("cards/00") + digit + ".wav");
-  for (const std::string &name : names) {
-    const Pcm speech = speech_16k(name);
+  auto words = words_of("librivox/transcription");
+  words.merge(words_of("cards/cards.transcription"));
+  ASSERT_EQ(words.size(), 10u);
+  for (const auto &[name, count] : words) {
+    const Pcm speech = speech_16k((name.size() == 3 ? "cards/" : "librivox/") + name + ".wav");
     const Span loud = energetic_range(speech, 16000, 0.005);
     const Span audible = active_range(speech, 16000, 40);
     for (const auto &[condition, colour, below_db, start_slack_s, end_slack_s] : kConditions) {
@@ -121,6 +136,8 @@ TEST(Recordings, EachSentenceIsOneUtteranceWhereItsWordsAre) {
       EXPECT_GT(span.end_s, loud.end_s - end_slack_s);
       EXPECT_GT(span.start_s, audible.start_s - 0.05);
       EXPECT_LT(span.end_s, audible.end_s + 0.05);
+      EXPECT_GT((span.end_s - span.start_s) / count, 0.18) << "seconds a word";
+      EXPECT_LT((span.end_s - span.start_s) / count, 0.60) << "seconds a word";
     }
   }
 }

@@ -280,6 +280,29 @@ TEST(UtteranceStream, StopsWhenTheQueueIsFullAndLosesNothing) {
   play("");
 }
 
+TEST(UtteranceStream, FlushHasRoomBesideAFullQueue) {
+  std::string runs = "50o";
+  for (int i = 0; i < 40; ++i) runs += " 30s 10o";
+  const std::string answers = frames(runs);
+  play(answers);
+  const Pcm pcm = audio_for(answers, 160);
+  // So much padding that an utterance waits for its neighbour: one more is open behind the full
+  // queue.
+  const Stream stream = open(settings_of(16000, 0, 0, 0, 100000));
+  std::size_t done = 0;
+  push_rest(stream, pcm, done);
+  ASSERT_LT(done, pcm.size());
+  FlushUtteranceStream(stream.get());
+  std::vector<Utterance> found;
+  take_all(stream, found);
+  ASSERT_EQ(found.size(), UTTERANCE_QUEUE_LENGTH + 1u);
+  for (std::size_t i = 0; i < found.size(); ++i) {
+    EXPECT_EQ(found[i].number, static_cast<int>(i) + 1);
+    EXPECT_EQ(found[i].began, static_cast<int64_t>(51 + 40 * i) * 160);
+  }
+  play("");
+}
+
 TEST(UtteranceStream, AnswersDoNotDependOnTheCut) {
   auto generator = orvalis::test::seeded_generator();
   Pcm pcm = orvalis::test::speech_16k(orvalis::test::kSentences[1]);
