@@ -3,6 +3,7 @@
 
 #include <sndfile.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -21,6 +22,9 @@ public:
   using std::runtime_error::runtime_error;
 };
 
+/// Tells standard error what is wrong with the input of that name.
+void print_audio_error(const std::string &name, const AudioError &error);
+
 struct AudioSettings {
   bool raw = false;  ///< No header: 16-bit little-endian samples
   int raw_rate_hz = 16000;
@@ -38,6 +42,23 @@ public:
 
   /// The next samples, about 10 ms, so that a live source is heard at once. Empty at the end.
   std::span<const std::int16_t> read();
+
+  /// Hands all that is left to `take` in blocks of exactly `length` samples; a remainder is
+  /// dropped.
+  template <class Take>
+  void for_each_block(std::size_t length, Take take) {
+    std::vector<std::int16_t> block;
+    for (auto piece = read(); !piece.empty(); piece = read()) {
+      while (!piece.empty()) {
+        const auto part = piece.first(std::min(piece.size(), length - block.size()));
+        block.insert(block.end(), part.begin(), part.end());
+        piece = piece.subspan(part.size());
+        if (block.size() < length) continue;
+        take(std::span<const std::int16_t>(block));
+        block.clear();
+      }
+    }
+  }
 
   /// Samples that read() has returned so far.
   std::int64_t samples_read() const { return samples_read_; }

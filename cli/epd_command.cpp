@@ -13,6 +13,7 @@
 #include <string>
 #include <vector>
 
+#include "cli/audio_options.h"
 #include "cli/audio_source.h"
 #include "cli/label_reports.h"
 #include "cli/report.h"
@@ -63,20 +64,12 @@ void report_frames(AudioSource &source, const UtteranceSettings &settings, Repor
   const std::unique_ptr<EpdInstance, EpdCloser> epd(InitializeEPD(mode, 0));
   if (!epd) throw std::bad_alloc();
 
-  std::vector<std::int16_t> frame;
   std::int64_t number = 0;
-  for (auto piece = source.read(); !piece.empty(); piece = source.read()) {
-    while (!piece.empty()) {
-      const auto part = piece.first(std::min(piece.size(), frame_length - frame.size()));
-      frame.insert(frame.end(), part.begin(), part.end());
-      piece = piece.subspan(part.size());
-      if (frame.size() < frame_length) continue;
-      report.frame(number++, ProcessEPDFrameByCnttype(epd.get(), frame.data(),
-                                                      static_cast<std::int32_t>(frame_length),
-                                                      settings.content_type));
-      frame.clear();
-    }
-  }
+  source.for_each_block(frame_length, [&](std::span<const std::int16_t> frame) {
+    const auto samples = static_cast<std::int32_t>(frame.size());
+    report.frame(number++,
+                 ProcessEPDFrameByCnttype(epd.get(), frame.data(), samples, settings.content_type));
+  });
 }
 
 void report_file(const std::string &name, const EpdOptions &options, Report &report) {
@@ -166,10 +159,7 @@ Examples:
 void add_epd_command(CLI::App &app, int &exit_status) {
   const auto options = std::make_shared<EpdOptions>();
   UtteranceSettings &detector = options->detector;
-  AudioSettings &audio = options->audio;
-  const auto from_to = [](int least, int most) { return CLI::Range(least, most).description(""); };
   const CLI::Validator milliseconds = from_to(0, 3600 * 1000);
-  const CLI::Validator channels = from_to(1, 1024);  // what libsndfile takes
 
   CLI::App *epd = app.add_subcommand("epd", "Find the utterances in audio files or live audio");
   epd->footer(kExamples);
@@ -206,21 +196,7 @@ void add_epd_command(CLI::App &app, int &exit_status) {
       ->excludes(after);
   epd->add_flag("--log", options->log, "Show the engine's log lines on standard error");
 
-  epd->add_option("--channel", audio.channel, "Channel to listen to, from 1 (default: the mean)")
-      ->check(channels)
-      ->type_name("N");
-  auto *raw = epd->add_flag("--raw", audio.raw, "Input is 16-bit little-endian without a header");
-  epd->add_option("--rate", audio.raw_rate_hz, "Rate of raw input")
-      ->check(from_to(1000, 1000000))
-      ->type_name("HZ")
-      ->capture_default_str()
-      ->needs(raw);
-  epd->add_option("--channels", audio.raw_channels, "Interleaved channels of raw input")
-      ->check(channels)
-      ->type_name("N")
-      ->capture_default_str()
-      ->needs(raw);
-
+  add_audio_options(*epd, options->audio);
   epd->callback([options, &exit_status] { exit_status = run_epd(*options); });
 }
 

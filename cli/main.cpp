@@ -9,6 +9,7 @@
 #include <system_error>
 
 #include "cli/epd_command.h"
+#include "cli/query_commands.h"
 #include "cli/report.h"
 
 namespace {
@@ -34,6 +35,7 @@ int run(int argc, char **argv) {
       "  orvalis epd meeting.wav      the utterances of a recording\n"
       "  orvalis epd --help           all about the command epd");
   orvalis::cli::add_epd_command(app, exit_status);
+  orvalis::cli::add_query_commands(app, exit_status);
   app.add_subcommand("version", "Print the versions of the tool and of the library")->callback([] {
     orvalis::cli::print_line(version());
   });

@@ -1,0 +1,27 @@
+#include "cli/audio_options.h"
+
+namespace orvalis::cli {
+
+CLI::Validator from_to(int least, int most) { return CLI::Range(least, most).description(""); }
+
+void add_audio_options(CLI::App &command, AudioSettings &settings) {
+  const CLI::Validator channels = from_to(1, 1024);  // what libsndfile takes
+  command
+      .add_option("--channel", settings.channel, "Channel to listen to, from 1 (default: the mean)")
+      ->check(channels)
+      ->type_name("N");
+  auto *raw =
+      command.add_flag("--raw", settings.raw, "Input is 16-bit little-endian without a header");
+  command.add_option("--rate", settings.raw_rate_hz, "Rate of raw input")
+      ->check(from_to(1000, 1000000))
+      ->type_name("HZ")
+      ->capture_default_str()
+      ->needs(raw);
+  command.add_option("--channels", settings.raw_channels, "Interleaved channels of raw input")
+      ->check(channels)
+      ->type_name("N")
+      ->capture_default_str()
+      ->needs(raw);
+}
+
+}  // namespace orvalis::cli

@@ -1,0 +1,136 @@
+#include "cli/query_commands.h"
+
+#include <fmt/format.h>
+#include <fmt/ranges.h>
+#include <orvalis.h>
+
+#include <array>
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <numeric>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "cli/audio_options.h"
+#include "cli/audio_source.h"
+#include "cli/report.h"
+
+namespace orvalis::cli {
+namespace {
+
+/// One query: how many blocks a second it is asked of, and what it answers to one.
+struct Query {
+  const char *name;
+  const char *summary;
+  const char *notes;
+  int blocks_per_second;
+  const char *json_field;
+  std::vector<std::int32_t> (*ask)(std::span<const std::int16_t> block, int rate_hz);
+  std::vector<std::string> (*columns)(int rate_hz);
+};
+
+std::vector<std::int32_t> energy_of(std::span<const std::int16_t> block, int) {
+  return {computeEnergy(block.data(), static_cast<std::int32_t>(block.size()))};
+}
+
+std::vector<std::int32_t> spectrum_of(std::span<const std::int16_t> block, int rate_hz) {
+  std::vector<std::int32_t> bins(rate_hz == 16000 ? 128 : 64);
+  getSpectrum(block.data(), bins.data(), rate_hz);
+  return bins;
+}
+
+std::vector<std::string> energy_columns(int) { return {"energy"}; }
+
+std::vector<std::string> spectrum_columns(int rate_hz) {
+  std::vector<std::string> names(rate_hz == 16000 ? 128 : 64);
+  for (std::size_t i = 0; i < names.size(); ++i) names[i] = fmt::format("bin{}", i);
+  return names;
+}
+
+constexpr Query kEnergy = {
+    "energy",
+    "Print the energy of every 20 ms of a file",
+    "A line for each whole block: where it starts in seconds, and its energy in whole dB\n"
+    "with its mean removed, 0 for silence and 90 for a square wave of full scale.\n\n"
+    "Examples:\n"
+    "  orvalis energy take.wav >take.csv\n"
+    "  orvalis energy --format json take.wav",
+    50,
+    "energy",
+    energy_of,
+    energy_columns};
+
+constexpr Query kSpectrum = {
+    "spectrum",
+    "Print the power spectrum of every 10 ms of a file",
+    "A line for each whole frame: where it starts in seconds, and the power of 128 bins at\n"
+    "16 kHz or 64 at 8 kHz. A bin is 2 re^2 + 2 im^2 of a transform over sample pairs, even\n"
+    "samples real and odd ones imaginary, without a window.\n\n"
+    "Examples:\n"
+    "  orvalis spectrum take.wav >take.csv\n"
+    "  orvalis spectrum --format json take.wav",
+    100,
+    "power",
+    spectrum_of,
+    spectrum_columns};
+
+struct QueryOptions {
+  std::string file;
+  std::string format = "csv";
+  AudioSettings audio;
+};
+
+void print_answers(const Query &query, const QueryOptions &options) {
+  AudioSource source(options.file, options.audio);
+  const int rate_hz = source.rate_hz();
+  const bool json = options.format == "json";
+  if (!json) print_line(fmt::format("start,{}", fmt::join(query.columns(rate_hz), ",")));
+  std::int64_t number = 0;
+  source.for_each_block(
+      static_cast<std::size_t>(rate_hz / query.blocks_per_second),
+      [&](std::span<const std::int16_t> block) {
+        const double start = static_cast<double>(number++) / query.blocks_per_second;
+        const auto answer = query.ask(block, rate_hz);
+        if (!json) {
+          print_line(fmt::format("{:.2f},{}", start, fmt::join(answer, ",")));
+        } else if (answer.size() == 1) {
+          print_line(
+              nlohmann::ordered_json{{"start", start}, {query.json_field, answer[0]}}.dump());
+        } else {
+          print_line(nlohmann::ordered_json{{"start", start}, {query.json_field, answer}}.dump());
+        }
+      });
+  source.check_complete();
+}
+
+void add_query(CLI::App &app, const Query &query, int &exit_status) {
+  const auto options = std::make_shared<QueryOptions>();
+  CLI::App *command = app.add_subcommand(query.name, query.summary);
+  command->footer(query.notes);
+  command->add_option("FILE", options->file, "Audio file; \"-\" is standard input")
+      ->required()
+      ->type_name("");
+  command->add_option("--format", options->format, "csv, or json (an object a line)")
+      ->check(CLI::IsMember({"csv", "json"}).description(""))
+      ->type_name("NAME")
+      ->capture_default_str();
+  add_audio_options(*command, options->audio);
+  command->callback([options, &query, &exit_status] {
+    try {
+      print_answers(query, *options);
+    } catch (const AudioError &error) {
+      print_audio_error(options->file, error);
+      exit_status = 1;
+    }
+  });
+}
+
+}  // namespace
+
+void add_query_commands(CLI::App &app, int &exit_status) {
+  add_query(app, kEnergy, exit_status);
+  add_query(app, kSpectrum, exit_status);
+}
+
+}  // namespace orvalis::cli
