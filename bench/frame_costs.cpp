@@ -1,0 +1,188 @@
+#include "bench/frame_costs.h"
+
+#include <benchmark/benchmark.h>
+
+#include <algorithm>
+#include <chrono>
+#include <limits>
+#include <vector>
+
+#include "Voice_Engine/epd/epd_instance.h"
+#include "Voice_Engine/epd/fixed_fft.h"
+#include "bench/table.h"
+#include "jni/orvalis.h"
+#include "tests/support/recordings.h"
+
+namespace orvalis::bench {
+namespace {
+
+using test::Pcm;
+
+/// Whole frames of speech, one rate.
+struct Speech {
+  Pcm pcm;
+  int frame_samples;
+
+  std::size_t frames() const { return pcm.size() / static_cast<std::size_t>(frame_samples); }
+  const Word16 *frame(std::size_t number) const {
+    return &pcm[number * static_cast<std::size_t>(frame_samples)];
+  }
+};
+
+Speech wide_speech() {
+  Speech speech{{}, 160};
+  for (const char *name : test::kSentences) {
+    const Pcm sentence = test::speech_16k(name);
+    speech.pcm.insert(speech.pcm.end(), sentence.begin(), sentence.end());
+  }
+  return speech;
+}
+
+Speech narrow_speech() {
+  Speech speech{test::speech_8k("raw/hts1a.raw"), 80};
+  const Pcm more = test::speech_8k("wav/vk5qi.wav");
+  speech.pcm.insert(speech.pcm.end(), more.begin(), more.end());
+  return speech;
+}
+
+// Each subject has start(), which makes it as new, and hear() for a frame.
+
+class Detection {
+public:
+  static constexpr std::size_t kBytes = sizeof(EpdInstance);
+
+  explicit Detection(Word32 mode) : mode_(mode) {}
+  Detection(const Detection &other) : mode_(other.mode_) {}
+  ~Detection() { FreeMemoryEPD(epd_); }
+  Detection &operator=(const Detection &) = delete;
+
+  void start() {
+    FreeMemoryEPD(epd_);
+    epd_ = InitializeEPD(mode_, 0);
+  }
+  void hear(const Word16 *frame, int samples) {
+    benchmark::DoNotOptimize(ProcessEPDFrame(epd_, frame, samples));
+  }
+
+private:
+  Word32 mode_;
+  EpdInstance *epd_ = nullptr;
+};
+
+class Suppression {
+public:
+  static constexpr std::size_t kBytes = sizeof(S1chnsState);
+
+  void start() {
+    state_ = {};
+    S1CHNSInit(&state_, 2);
+  }
+  void hear(const Word16 *frame, int samples) {
+    NsFlags flags;
+    std::copy_n(frame, samples, buffer_);
+    s1chns_C(flags, &state_, buffer_, buffer_);
+    benchmark::DoNotOptimize(buffer_);
+  }
+
+private:
+  S1chnsState state_{};
+  Word16 buffer_[kMostFrameSamples] = {};
+};
+
+class VoiceDetection {
+public:
+  static constexpr std::size_t kBytes = sizeof(VelmoraVadState);
+
+  explicit VoiceDetection(Word32 band) : band_(band) {}
+
+  void start() {
+    state_ = {};
+    VelmoraVadState *state = &state_;
+    VelmoraVADInit(&state, band_);
+  }
+  void hear(const Word16 *frame, int /*samples*/) {
+    PlainFlags flags;
+    VelmoraVadState *state = &state_;
+    benchmark::DoNotOptimize(VelmoraVAD(flags, &state, frame, band_));
+  }
+
+private:
+  Word32 band_;
+  VelmoraVadState state_{};
+};
+
+/// `Transform` runs in place over a frame followed by zeros.
+template <class Transform>
+class Transformation {
+public:
+  static constexpr std::size_t kBytes = 0;
+
+  explicit Transformation(Transform transform) : transform_(transform) {}
+
+  void start() {}
+  void hear(const Word16 *frame, int samples) {
+    std::fill(std::copy_n(frame, samples, buffer_), std::end(buffer_), Word16{0});
+    transform_(buffer_);
+    benchmark::DoNotOptimize(buffer_);
+  }
+
+private:
+  Transform transform_;
+  Word16 buffer_[kMostTransformSize] = {};
+};
+
+/// The slowest frame, each at the fastest of several passes: what the audio costs, not what else
+/// the machine was doing.
+template <class Subject>
+double worst_frame_ns(Subject &subject, const Speech &speech) {
+  using Clock = std::chrono::steady_clock;
+  constexpr int kPasses = 7;
+  std::vector<Clock::duration> fastest(speech.frames(), Clock::duration::max());
+  for (int pass = 0; pass < kPasses; ++pass) {
+    subject.start();
+    for (std::size_t i = 0; i < speech.frames(); ++i) {
+      const Clock::time_point before = Clock::now();
+      subject.hear(speech.frame(i), speech.frame_samples);
+      fastest[i] = std::min(fastest[i], Clock::now() - before);
+    }
+  }
+  return std::chrono::duration<double, std::nano>(*std::ranges::max_element(fastest)).count();
+}
+
+template <class Subject>
+void measure(const char *name, const Speech &speech, Subject subject) {
+  benchmark::RegisterBenchmark(name,
+                               [subject, &speech](benchmark::State &state) mutable {
+                                 state.counters[kFrames] = static_cast<double>(speech.frames());
+                                 state.counters[kInstanceBytes] =
+                                     static_cast<double>(Subject::kBytes);
+                                 state.counters[kWorstFrame] = worst_frame_ns(subject, speech);
+                                 for (auto _ : state) {
+                                   subject.start();
+                                   for (std::size_t i = 0; i < speech.frames(); ++i)
+                                     subject.hear(speech.frame(i), speech.frame_samples);
+                                 }
+                               })
+      ->Repetitions(9)
+      ->MinTime(0.2);
+}
+
+}  // namespace
+
+void register_frame_costs() {
+  static const Speech wide = wide_speech();
+  static const Speech narrow = narrow_speech();
+  measure("ProcessEPDFrame, 16 kHz", wide, Detection(0));
+  measure("ProcessEPDFrame, 8 kHz", narrow, Detection(1000));
+  measure("s1chns_C", wide, Suppression());
+  measure("VelmoraVAD, 16 kHz", wide, VoiceDetection(0));
+  measure("VelmoraVAD, 8 kHz", narrow, VoiceDetection(1));
+  measure("c_fft_epd, band 0", wide, Transformation([](Word16 *x) { c_fft_epd(x, 1, 0); }));
+  measure("c_fft_epd, band 1", narrow, Transformation([](Word16 *x) { c_fft_epd(x, 1, 1); }));
+  measure("r_fft_epd, band 0", wide, Transformation([](Word16 *x) { r_fft_epd(x, 1, 0); }));
+  measure("r_fft_epd, band 1", narrow, Transformation([](Word16 *x) { r_fft_epd(x, 1, 1); }));
+  measure("c_fft_ns", wide, Transformation([](Word16 *x) { c_fft_ns(x, 1); }));
+  measure("r_fft_ns", wide, Transformation([](Word16 *x) { r_fft_ns(x, 1); }));
+}
+
+}  // namespace orvalis::bench
