@@ -1,0 +1,146 @@
+#!/usr/bin/env python3
+"""Writes the seed corpus of every fuzz target into fuzz/corpus/. Run it after changing how a target
+reads its bytes."""
+import pathlib
+import struct
+
+LITERAL, CONSTANT, NOISE, PULSES = range(4)
+AUDIO = 7  # the byte before a piece of audio; both targets that take audio know it
+
+
+def word(value):
+    return struct.pack("<h", value)
+
+
+def number(value):
+    return bytes([value]) if 0 <= value < 255 else b"\xff" + struct.pack("<i", value)
+
+
+def literal(*samples):
+    return bytes([LITERAL, len(samples)]) + b"".join(map(word, samples))
+
+
+def grown(kind, samples, level, period=None):
+    """Audio of a multiple of 40 samples, up to 10240."""
+    tail = b"" if period is None else bytes([period - 1])
+    return bytes([kind, samples // 40 - 1]) + word(level) + tail
+
+
+def constant(samples, level):
+    return grown(CONSTANT, samples, level)
+
+
+def noise(samples, level=30):
+    return grown(NOISE, samples, level)
+
+
+def voice(samples, level=20000, period=120):
+    return grown(PULSES, samples, level, period)
+
+
+def frames(piece, content_type=0):
+    """Whole frames by ProcessEPDFrameByCnttype."""
+    return bytes([AUDIO]) + piece + bytes([3]) + number(content_type)
+
+
+def epd_frame():
+    speech = [noise(8000), voice(8000), noise(6400), voice(6400, period=80), noise(9600)]
+    reset, mute = bytes([0]), bytes([1, 0])
+    for name, mode in {"16k": 0, "8k": 1, "quarter_8k": 3, "fourfold": 4, "second": 6}.items():
+        yield name, bytes([mode]) + b"".join(map(frames, speech))
+    yield "negative_mode", b"\xff" + number(-1234) + b"".join(map(frames, speech))
+    yield "short_timing", bytes([0]) + b"".join(frames(piece, 2) for piece in speech)
+    yield "any_type", bytes([1]) + b"".join(frames(piece, -1 << 31) for piece in speech)
+    yield "resets", bytes([0]) + (mute + reset).join(map(frames, speech)) + reset
+    yield "full_scale", bytes([4]) + b"".join(
+        frames(piece) for piece in [constant(4000, -32768), voice(8000, 32767), noise(8000, 32767),
+                                    constant(4000, 0), literal(*[32767, -32768] * 80)])
+    # Partial frames, no samples, and a null pointer with and without a length.
+    yield "odd_sizes", bytes([0]) + b"".join(
+        bytes([AUDIO]) + piece + bytes([0]) for piece in
+        [literal(), literal(1, 2, 3), noise(200), voice(440)]) + b"".join(
+        bytes([2]) + number(n) for n in [0, 1, 160, -1, -1 << 31, (1 << 31) - 1])
+
+
+def settings(rate=0, gain=0, content_type=0, hangover=0, before=0, after=0):
+    """The times are in steps of 5 ms up to 1270 ms, else in ms."""
+    return bytes([rate]) + b"".join(map(number, [gain, content_type, hangover, before, after]))
+
+
+def script(*runs):
+    """Unvoiced and voiced frames in turn; the first 39 frames are not speech whatever is said."""
+    return bytes([len(runs), *runs])
+
+
+def utterance_stream():
+    detector, take = script(), bytes([0])
+    piece = lambda audio: bytes([AUDIO]) + audio
+    sound, null = (lambda n, v=v: piece(constant(80 * n, v)) for v in (100, 0))
+    speech = b"".join(map(piece, [noise(5000), voice(5000), noise(4000), voice(5000, period=80),
+                                  noise(4000), literal(1, 2, 3)]))
+    for rate in (0, 1):
+        for content_type in (0, 2):
+            yield f"speech_{rate}_{content_type}", (
+                detector + settings(rate, 0, content_type, 20, 40, 60) + speech)
+    # Null audio ends an utterance at once: the shortest that there are.
+    voiced, bursts = script(0, 63), sound(45) + (sound(1) + null(1)) * 50
+    yield "full_queue", voiced + settings(1) + bursts
+    yield "full_queue_padded", voiced + settings(1, 0, 0, 0, 1, 2) + bursts + take * 3
+    yield "late_takes", voiced + settings(1) + sound(45) + ((sound(1) + null(2)) * 9 + take * 5) * 5
+    widest = (1 << 31) - 1
+    yield "widest", voiced + settings(1, 1, -1, widest, widest, widest) + bursts
+    yield "open_end", voiced + settings(1, 2, 0, 4, 9, 9) + sound(120) + piece(literal(1))
+    sounds = sound(70) * 4
+    yield "refused", script(40, 6, 30, 30, 30, 5, 25) + settings(1, 0, 2, 4, 9, 9) + sounds
+    yield "interrupted", script(40, 9, 5, 9, 20) + settings(1, 0, 2, 4) + (sound(9) + null(2)) * 20
+    yield "joined", script(40, 10, 30) + settings(1, 0, 0, 200) + sounds
+    yield "apart", script(40, 10, 30) + settings(1, 0, 0, 0, 200, 200) + sounds
+    yield "refused_rate", detector + b"\xff" + number(44100) + settings()[1:] + speech
+    yield "refused_padding", detector + settings(before=-1) + speech
+
+
+def wav(data, code=1, channels=1, rate=16000, bits=16, promised=None):
+    block = channels * bits // 8
+    form = struct.pack("<HHIIHH", code, channels, rate, rate * block % (1 << 32), block, bits)
+    size = len(data) if promised is None else promised
+    body = b"WAVEfmt " + struct.pack("<I", 16) + form + b"data" + struct.pack("<I", size) + data
+    return b"RIFF" + struct.pack("<I", min(size + 36, 0xffffffff)) + body
+
+
+def audio_source():
+    ramp = b"".join(word(step * 100 % 30000) for step in range(400))
+    floats = struct.pack("<8f", 0, 0.5, -1, 1, 7, float("inf"), float("nan"), 1e-30)
+    mean, second, raw, absent = b"\x00", b"\x80", b"\x03", b"\xc0"
+    yield "wav16", mean + wav(ramp)
+    yield "wav8", mean + wav(ramp[:300], rate=8000, bits=8)
+    yield "wav24", mean + wav(ramp[:600], bits=24)
+    yield "wav_float", mean + wav(floats, code=3, bits=32)
+    yield "wav_alaw", mean + wav(ramp[:300], code=6, rate=8000, bits=8)
+    yield "stereo_mean", mean + wav(ramp, channels=2)
+    yield "stereo_second", second + wav(ramp, channels=2)
+    yield "channel_absent", absent + wav(ramp, channels=2)
+    yield "resampled", mean + wav(ramp, rate=44100)
+    yield "slowest", mean + wav(ramp[:40], rate=63)
+    yield "too_fast", mean + wav(ramp, rate=(1 << 31) - 1)
+    yield "many_channels", mean + wav(ramp, channels=1024, rate=4000000)
+    yield "cut_short", mean + wav(ramp, promised=9999)
+    yield "open_length", mean + wav(ramp, promised=0xffffffff)
+    yield "au", mean + b".snd" + struct.pack(">5I", 24, len(ramp), 3, 16000, 1) + ramp
+    # The rate as an 80-bit float: 16000 = 1.953125 * 2^13.
+    comm = struct.pack(">hIhHQ", 1, len(ramp) // 2, 16, 16383 + 13, 16000 << 50)
+    aiff = b"AIFFCOMM" + struct.pack(">I", len(comm)) + comm
+    aiff += b"SSND" + struct.pack(">3I", len(ramp) + 8, 0, 0) + ramp
+    yield "aiff", mean + b"FORM" + struct.pack(">I", len(aiff)) + aiff
+    yield "raw", raw + ramp
+    yield "raw_odd", b"\x3f" + ramp[:-1]
+    yield "empty", mean
+    yield "raw_empty", raw
+    yield "text", mean + b"no audio at all\n"
+
+
+corpus = pathlib.Path(__file__).parent / "corpus"
+for target in (epd_frame, utterance_stream, audio_source):
+    folder = corpus / target.__name__
+    folder.mkdir(parents=True, exist_ok=True)
+    for name, content in target():
+        (folder / name).write_bytes(content)
