@@ -143,7 +143,7 @@ private:
     is_interrupted_ = false;
     running_ = true;
     const int64_t frame_start = heard_ - frame_samples_;
-    piece_start_ = goes_on ? frame_start : std::max(frame_start - delay_.start, last_piece_end());
+    piece_start_ = goes_on ? frame_start : std::max(frame_start - delay_.start, last_piece_end_);
     if (!open_) {
       open_ = Utterance{};
       open_->start = piece_start_;
@@ -157,6 +157,7 @@ private:
     is_interrupted_ = is_null;
     const int64_t end = is_null ? open_->ended : open_->ended - delay_.end;
     if (end > piece_start_) open_->end = end;  // else all of it was the closing pause
+    last_piece_end_ = std::max(end, piece_start_);
   }
 
   /// Drops the pieces of an utterance that the detector refused, or has not accepted by now.
@@ -164,10 +165,6 @@ private:
     if (!is_undecided_) return;
     is_undecided_ = false;
     open_ = before_piece_;
-  }
-
-  int64_t last_piece_end() const {
-    return open_ ? open_->end : closed_ ? closed_->end : handed_out_end_;
   }
 
   void close_open(UtteranceQueue &queue) {
@@ -205,7 +202,8 @@ private:
   bool is_undecided_ = false;    // the detector may still refuse its utterance
   int32_t answers_ = 0;          // answers 1 of the detector's utterance
   int64_t piece_start_ = 0;
-  std::optional<Utterance> open_;          // may be joined by further pieces
+  int64_t last_piece_end_ = 0;     // also of a piece that held nothing but the closing pause
+  std::optional<Utterance> open_;  // may be joined by further pieces
   std::optional<Utterance> before_piece_;  // open_ as it was before the detector's utterance
   std::optional<Utterance> closed_;        // complete, but its neighbour may limit its padding
   int32_t handed_out_ = 0;

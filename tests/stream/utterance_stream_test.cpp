@@ -222,6 +222,13 @@ TEST(UtteranceStream, PadsUpToTheMiddleOfAGap) {
   EXPECT_EQ(found[1].end, 320 * 80 + 33) << "padding may use the samples that were not judged";
 }
 
+TEST(UtteranceStream, PaddingKeepsOffAPieceThatHeldNoSpeech) {
+  // The neighbour that limits the first one's padding turns out to be closing pause alone.
+  const auto found = utterances_of(settings_of(8000, 1, 5, 25, 15), frames("1s 2n 1s 1o 1s"));
+  ASSERT_EQ(found.size(), 2u);
+  EXPECT_LE(found[0].end, found[1].start);
+}
+
 TEST(UtteranceStream, FlushClosesWhatIsOpen) {
   const std::string answers = frames("50o 30s");
   for (const int32_t content_type : {0, 2}) {
