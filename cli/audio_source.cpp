@@ -97,8 +97,9 @@ AudioSource::AudioSource(const std::string &name, const AudioSettings &settings)
   }
   const bool single = info_.channels == 1 || channel_ > 0;
   untouched_ = (info_.format & SF_FORMAT_SUBMASK) == SF_FORMAT_PCM_16 && single && !resampler_;
-  const auto values = static_cast<std::size_t>(std::max(1, info_.samplerate / 100)) *
-                      static_cast<std::size_t>(info_.channels);
+  // A header may claim any number of channels; no claim is worth more than 64 K values at a time.
+  const int frames = std::clamp(info_.samplerate / 100, 1, std::max(1, 65536 / info_.channels));
+  const auto values = static_cast<std::size_t>(frames) * static_cast<std::size_t>(info_.channels);
   interleaved16_.resize(untouched_ ? values : 0);
   interleaved_.resize(untouched_ ? 0 : values);
 }

@@ -33,6 +33,7 @@ int run(int argc, char **argv) {
   app.footer(
       "Examples:\n"
       "  orvalis epd meeting.wav      the utterances of a recording\n"
+      "  orvalis energy meeting.wav   how loud every 20 ms of it are\n"
       "  orvalis epd --help           all about the command epd");
   orvalis::cli::add_epd_command(app, exit_status);
   orvalis::cli::add_query_commands(app, exit_status);
