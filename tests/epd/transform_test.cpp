@@ -218,6 +218,26 @@ TEST(FixedFft, ForwardIsTheScaledFourierTransformAndInverseUndoesIt) {
     }
 }
 
+TEST(FixedFft, FullScale) {
+  for (const Family &family : families) {
+    SCOPED_TRACE(family.name);
+    Buffer pulse(family.size, int16_t{0});
+    pulse[3] = INT16_MIN;
+    EXPECT_LT(largest_difference(family.transform(true, pulse, 1), real_spectrum(pulse)), 6);
+    // The first stage already saturates, at 16383 after its halving; the split doubles that.
+    const Buffer constant = family.transform(true, Buffer(family.size, int16_t{20000}), 1);
+    EXPECT_EQ(constant[0], 32766);
+    EXPECT_EQ(constant[1], 0);
+    // The inverse does not scale: a spectrum half full saturates at both ends.
+    Buffer tone(family.size, int16_t{0});
+    tone[0] = tone[1] = INT16_MAX;
+    for (int i = 2; i < family.size / 2; i += 2) tone[i] = INT16_MAX;
+    const Buffer wave = family.transform(true, tone, -1);
+    EXPECT_EQ(*std::max_element(wave.begin(), wave.end()), INT16_MAX);
+    EXPECT_EQ(*std::min_element(wave.begin(), wave.end()), INT16_MIN);
+  }
+}
+
 // ---- Tables ----
 
 TEST(FixedFft, Tables) {
