@@ -66,10 +66,6 @@ std::int16_t to_word16(float sample) {
 
 }  // namespace
 
-void print_audio_error(const std::string &name, const AudioError &error) {
-  fmt::print(stderr, "orvalis: {}: {}\n", name == "-" ? "standard input" : name, error.what());
-}
-
 AudioSource::AudioSource(const std::string &name, const AudioSettings &settings)
     : channel_(settings.channel) {
   const struct stat status = status_of(name);

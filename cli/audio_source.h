@@ -22,9 +22,6 @@ public:
   using std::runtime_error::runtime_error;
 };
 
-/// Tells standard error what is wrong with the input of that name.
-void print_audio_error(const std::string &name, const AudioError &error);
-
 struct AudioSettings {
   bool raw = false;  ///< No header: 16-bit little-endian samples
   int raw_rate_hz = 16000;

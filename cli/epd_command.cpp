@@ -1,6 +1,5 @@
 #include "cli/epd_command.h"
 
-#include <fmt/format.h>
 #include <orvalis.h>
 #include <utterance_stream.h>
 
@@ -117,7 +116,7 @@ int run_epd(EpdOptions &options) {
     try {
       report_file(name, options, *report);
     } catch (const AudioError &error) {
-      print_error(fmt::format("{}: {}", name == "-" ? "standard input" : name, error.what()));
+      print_input_error(name, error);
       status = 1;
     }
   }

@@ -4,10 +4,8 @@
 #include <fmt/ranges.h>
 #include <orvalis.h>
 
-#include <array>
 #include <memory>
 #include <nlohmann/json.hpp>
-#include <numeric>
 #include <span>
 #include <string>
 #include <vector>
@@ -120,7 +118,7 @@ void add_query(CLI::App &app, const Query &query, int &exit_status) {
     try {
       print_answers(query, *options);
     } catch (const AudioError &error) {
-      print_audio_error(options->file, error);
+      print_input_error(options->file, error);
       exit_status = 1;
     }
   });

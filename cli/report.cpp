@@ -113,4 +113,8 @@ void print_error(const std::string &message) {
   std::fputs(("orvalis: " + message + "\n").c_str(), stderr);
 }
 
+void print_input_error(const std::string &name, const std::exception &error) {
+  print_error(fmt::format("{}: {}", name == "-" ? "standard input" : name, error.what()));
+}
+
 }  // namespace orvalis::cli

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <exception>
 #include <memory>
 #include <string>
 
@@ -35,5 +36,8 @@ void print_line(const std::string &line);
 
 /// Writes "orvalis: ..." to standard error; there is nobody to tell if that fails.
 void print_error(const std::string &message);
+
+/// Tells standard error what is wrong with the input of that name.
+void print_input_error(const std::string &name, const std::exception &error);
 
 }  // namespace orvalis::cli
