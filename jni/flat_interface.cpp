@@ -1,9 +1,14 @@
 // The flat C interface: judges arguments, then forwards. The core behind it trusts them.
+#include <cstdint>
+
+#include "Voice_Engine/drc/dynamics_control.h"
 #include "Voice_Engine/epd/epd_instance.h"
 #include "Voice_Engine/epd/queries.h"
+#include "Voice_Engine/ns/ns_instance.h"
 #include "Voice_Engine/platform/dump_file.h"
 #include "Voice_Engine/platform/export.h"
 #include "Voice_Engine/platform/log.h"
+#include "Voice_Engine/platform/version.h"
 #include "jni/orvalis.h"
 
 namespace {
@@ -13,6 +18,14 @@ int32_t process_frames(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
                        int32_t contentType) {
   if (pcm == nullptr && numSample > 0) return -1;
   return orvalis::EPD_Proc_Frame(epd, pcm, numSample, contentType);
+}
+
+constexpr int64_t kNoDrc = -1;
+
+/// Null for what no creation returns as a handle.
+DrcInstance *drc_of(int64_t handle) {
+  return handle == kNoDrc ? nullptr
+                          : reinterpret_cast<DrcInstance *>(static_cast<intptr_t>(handle));
 }
 
 }  // namespace
@@ -50,6 +63,30 @@ ORVALIS_EXPORT int32_t setLogging(EpdInstance *epd, int32_t /*value*/) {
 }
 
 ORVALIS_EXPORT int32_t FreeMemoryEPD(EpdInstance *epd) { return orvalis::freeMemory_EPD(epd); }
+
+ORVALIS_EXPORT NsInstance *InitializeDoNS(int32_t mode, int32_t micCount, int32_t /*unused*/) {
+  return orvalis::DoNS_Create(mode, micCount);
+}
+
+ORVALIS_EXPORT int32_t ProcessDoNSFrame(NsInstance *ns, int16_t *in, int32_t numIn, int16_t *out,
+                                        int32_t numOut) {
+  if (numIn > 0 && (in == nullptr || out == nullptr)) return -1;
+  return orvalis::DO_NS_Proc_Frame(ns, in, numIn, out, numOut);
+}
+
+ORVALIS_EXPORT int32_t FreeMemoryNS(NsInstance *ns) { return orvalis::freeMemory_NS(ns); }
+
+ORVALIS_EXPORT int64_t InitializeDRC(int32_t samplingRate, int32_t pcmDumpEnabled) {
+  const DrcInstance *drc = orvalis::create_drc(samplingRate, pcmDumpEnabled);
+  return drc == nullptr ? kNoDrc : reinterpret_cast<intptr_t>(drc);
+}
+
+ORVALIS_EXPORT int32_t ProcessDRC(int64_t drc, int16_t *pcm, int32_t numSample) {
+  if (pcm == nullptr && numSample > 0) return -1;
+  return orvalis::process_drc(drc_of(drc), pcm, numSample);
+}
+
+ORVALIS_EXPORT int32_t FreeMemoryDRC(int64_t drc) { return orvalis::freeMemory_DRC(drc_of(drc)); }
 
 ORVALIS_EXPORT int32_t computeEnergy(const int16_t *pcm, int32_t n) {
   return pcm == nullptr ? 0 : orvalis::block_energy_db(pcm, n);

@@ -2,12 +2,18 @@
  * orvalis.h - the flat C interface of libOrvalis.so
  *
  * Orvalis is the front end that a voice application puts before its recogniser. It takes 16-bit
- * mono PCM in frames of 10 ms and tells whether the user is speaking and when an utterance begins
- * and ends (end-point detection, EPD), and it answers small questions about a block of samples:
- * how loud it is, what its spectrum looks like.
+ * PCM, mono or from two microphones, in frames of 10 ms and tells whether the user is speaking and
+ * when an utterance begins and ends (end-point detection, EPD), gives frames back with the noise
+ * suppressed (NS), levels recorded speech (dynamics control, DRC), and answers small questions
+ * about a block of samples: how loud it is, what its spectrum looks like.
  *
  * Audio is signed 16-bit, native byte order, passed as a pointer and a number of samples. A frame
- * is 160 samples at 16 kHz or 80 samples at 8 kHz; other rates must be converted first.
+ * is 160 samples at 16 kHz or 80 samples at 8 kHz; other rates must be converted first. Two
+ * microphones are interleaved, 160 pairs a frame.
+ *
+ * ONE TWO-MICROPHONE SUPPRESSOR A PROCESS: all instances created with micCount 2 share one state.
+ * Creating a second one starts the first one afresh, and their calls must not be interleaved or
+ * overlap. Every other instance is independent of all others.
  *
  *
  * A worked example: feed a recording frame by frame, print where the answer changes
@@ -40,10 +46,11 @@
  *
  * Threads
  * -------
- * The library starts no threads and takes no locks. Instances are independent: different threads
- * may use different instances at the same time. Calls on one instance must not overlap. The queries
- * have no state. The only words shared by all instances are the overflow and carry flags of the
- * fixed-point operators (basic_op.h); no answer depends on them.
+ * The library starts no threads and takes no locks. Instances are independent, those with two
+ * microphones excepted (above): different threads may use different instances at the same time.
+ * Calls on one instance must not overlap. The queries have no state. The only words shared by all
+ * instances are the overflow and carry flags of the fixed-point operators (basic_op.h); no answer
+ * depends on them.
  *
  * Real time
  * ---------
@@ -149,6 +156,87 @@ int32_t setLogging(EpdInstance *epd, int32_t value);
 
 /* Releases the detector and closes its dump files. Returns 0, or -1 if epd is NULL. */
 int32_t FreeMemoryEPD(EpdInstance *epd);
+
+/* ============================================================================================ */
+/* Noise suppression                                                                            */
+/* ============================================================================================ */
+
+/* One suppressor: opaque, owned by the caller from InitializeDoNS to FreeMemoryNS. */
+typedef struct NsInstance NsInstance;
+
+/*
+ * Creates a noise suppressor for 16 kHz.
+ *
+ *   micCount   mode                         samples a frame       suppresses    delay
+ *   1          0 (or rate digit 0)          160                   13 dB         48 samples
+ *   1          2                            160                   18.4 dB       48 samples
+ *   2          any                          320: 160 pairs        14 dB         160 samples
+ *   other      any                          as for 1              nothing       none
+ *
+ * With one microphone the thousands of the mode are its rate digit, as for InitializeEPD: 1 makes
+ * every frame call return -1 (there is no suppression at 8 kHz); 2 takes frames of 320 samples and
+ * any other but 0 frames of 80. Neither is of use, for the suppressor itself works on 160 samples
+ * of each frame: with frames of 80 it reads and writes 80 samples beyond the last one.
+ *
+ * `unused` is not used. Returns NULL if memory runs out.
+ */
+NsInstance *InitializeDoNS(int32_t mode, int32_t micCount, int32_t unused);
+
+/*
+ * Suppresses the noise of numIn samples, whole frames. numOut must be equal to numIn.
+ *
+ * Fill `out` before the call, as a rule with the input delayed as above: a frame that is not
+ * suppressed leaves its part of `out` as it is. These are frames with more than 60 zero samples in
+ * a row, and the first ones until the audio has settled: with the first frame if fewer than three
+ * quarters of its samples are of magnitude 1 to 4, else after three such frames, and after 3200
+ * samples in any case. The quiet samples of all frames of a call add up: pass one frame at a time.
+ * Two microphones also leave a frame alone if the mean magnitude of the first channel is below 10.
+ *
+ * With one microphone `in` IS OVERWRITTEN with the output too, and may be the same buffer as `out`.
+ * With two, `in` is not changed, both channels of `out` are the same, and samples beyond 16 bits
+ * wrap around. A partial last frame is read and written WHOLE, beyond the given count: pass whole
+ * frames.
+ *
+ * Returns the number of samples processed since creation, skipped frames included (it stays at
+ * 2^31 - 1 once there); or -1, with nothing done, if ns is NULL, the counts differ, a pointer is
+ * NULL though numIn > 0, or one microphone was given 8 kHz.
+ */
+int32_t ProcessDoNSFrame(NsInstance *ns, int16_t *in, int32_t numIn, int16_t *out, int32_t numOut);
+
+/* Releases the suppressor. Returns 0, or -1 if ns is NULL. */
+int32_t FreeMemoryNS(NsInstance *ns);
+
+/* ============================================================================================ */
+/* Dynamics control                                                                             */
+/* ============================================================================================ */
+
+/*
+ * Creates a dynamics control, which levels recorded speech: +12 dB for frames that peak below an
+ * eighth of full scale (-18 dBFS), 3:1 compression above, 0 dB at full scale. The gain rises with a
+ * time constant of 12.5 ms, from silence at the start, and falls with one of 0.2 s. There is no
+ * delay.
+ *
+ * samplingRate: 16000; any other is accepted, and its audio left as it is.
+ * pcmDumpEnabled: 1 appends raw 16-bit PCM to "/sdcard/<handle>_beforeDRC.pcm" and
+ * "..._afterDRC.pcm".
+ *
+ * Returns the handle, a number that is not a pointer to look into; -1 if memory runs out.
+ */
+int64_t InitializeDRC(int32_t samplingRate, int32_t pcmDumpEnabled);
+
+/*
+ * Levels numSample samples in place, whole frames of 160. A partial last frame is read and written
+ * WHOLE, beyond the given count.
+ *
+ *   1    the audio was loud: more than 100 samples of the last ten frames, the newest frame counted
+ *        twice, came in beyond 8192 (a quarter of full scale), after at least one frame of the call
+ *   0    it was not; or numSample < 1; or the rate is not 16000
+ *   -1   drc is 0 or -1, or pcm is NULL though numSample > 0
+ */
+int32_t ProcessDRC(int64_t drc, int16_t *pcm, int32_t numSample);
+
+/* Releases the dynamics control. Returns 0, or -1 if drc is 0 or -1. */
+int32_t FreeMemoryDRC(int64_t drc);
 
 /* ============================================================================================ */
 /* Queries                                                                                      */

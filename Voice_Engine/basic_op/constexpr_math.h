@@ -35,6 +35,85 @@ constexpr double cos_of_turn(double i, double n) {
 /// sin(2 pi i / n), exact at the multiples of a quarter turn.
 constexpr double sin_of_turn(double i, double n) { return cos_of_turn(i - n / 4, n); }
 
+/// The unevaluated sum of two doubles: twice the precision of one.
+/// Source: T. J. Dekker, "A floating-point technique for extending the available precision", 1971.
+struct DoubleDouble {
+  double hi = 0;
+  double lo = 0;
+
+  constexpr DoubleDouble operator-() const { return {-hi, -lo}; }
+};
+
+constexpr DoubleDouble two_sum(double a, double b) {
+  const double sum = a + b;
+  const double b_part = sum - a;
+  return {sum, (a - (sum - b_part)) + (b - b_part)};
+}
+
+constexpr DoubleDouble two_product(double a, double b) {
+  constexpr double kSplitter = 134217729;  // 2^27 + 1 cuts a double into halves
+  const double a_hi = kSplitter * a - (kSplitter * a - a);
+  const double b_hi = kSplitter * b - (kSplitter * b - b);
+  const double a_lo = a - a_hi;
+  const double b_lo = b - b_hi;
+  const double product = a * b;
+  return {product, ((a_hi * b_hi - product) + a_hi * b_lo + a_lo * b_hi) + a_lo * b_lo};
+}
+
+constexpr DoubleDouble operator+(DoubleDouble a, DoubleDouble b) {
+  const DoubleDouble sum = two_sum(a.hi, b.hi);
+  return two_sum(sum.hi, sum.lo + (a.lo + b.lo));
+}
+
+constexpr DoubleDouble operator*(DoubleDouble a, DoubleDouble b) {
+  const DoubleDouble product = two_product(a.hi, b.hi);
+  return two_sum(product.hi, product.lo + (a.hi * b.lo + a.lo * b.hi));
+}
+
+/// Taylor series of the sine for |x| <= pi/2, to about 30 digits.
+constexpr DoubleDouble sine_series(DoubleDouble x) {
+  const DoubleDouble square = -(x * x);
+  DoubleDouble sum = {1, 0};
+  for (int n = 31; n > 1; n -= 2) {  // Horner's scheme over 1 - x^2/(2*3) (1 - x^2/(4*5) ...)
+    const double divisor = n * (n - 1);
+    const double quotient = 1 / divisor;
+    const DoubleDouble reciprocal =
+        two_sum(quotient, -(two_product(quotient, divisor) + DoubleDouble{-1, 0}).hi / divisor);
+    sum = DoubleDouble{1, 0} + sum * square * reciprocal;
+  }
+  return x * sum;
+}
+
+/// pi/2 less `x`, for 0 <= x <= pi.
+constexpr DoubleDouble quarter_turn_less(double x) {
+  constexpr double kHalfPi[] = {1.5707963267948966, 6.123233995736766e-17, -1.4973849048591833e-33};
+  return two_sum(kHalfPi[0], -x) + DoubleDouble{kHalfPi[1], kHalfPi[2]};
+}
+
+/// Cosine of an angle of at most pi either way, rounded to the nearest double.
+constexpr double cos_of(double radians) {
+  return sine_series(quarter_turn_less(radians < 0 ? -radians : radians)).hi;
+}
+
+/// Sine of an angle of at most pi either way, rounded to the nearest double; keeps the sign of 0.
+constexpr double sin_of(double radians) {
+  if (radians < 0) return -sin_of(-radians);
+  if (radians <= kPi / 2) return radians == 0 ? radians : sine_series({radians, 0}).hi;
+  const DoubleDouble beyond = quarter_turn_less(radians);  // pi - x = pi/2 + (pi/2 - x)
+  return sine_series(quarter_turn_less(0) + beyond).hi;
+}
+
+/// Square root for x >= 0, by Newton's method from above, to within an ulp.
+constexpr double sqrt_of(double x) {
+  if (x == 0) return 0;
+  double root = x < 1 ? 1 : x;
+  for (;;) {
+    const double next = 0.5 * (root + x / root);
+    if (!(next < root)) return root;
+    root = next;
+  }
+}
+
 /// Base-2 logarithm for x in 1..2, by the series of artanh.
 constexpr double log2_of(double x) {
   constexpr double kLn2 = 0.693147180559945309417;

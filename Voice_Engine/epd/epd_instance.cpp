@@ -7,6 +7,7 @@
 #include "Voice_Engine/epd/frame_screening.h"
 #include "Voice_Engine/platform/dump_file.h"
 #include "Voice_Engine/platform/log.h"
+#include "Voice_Engine/platform/version.h"
 
 namespace orvalis {
 namespace {
@@ -20,34 +21,9 @@ constexpr SettlingTexts kSettlingTexts = {
         "TQE: Check Abnormal Audio ... wait few more frame ... dont do NS ... in EPD_Proc_Frame",
 };
 
-long handle_number(const EpdInstance *epd) {
-  return static_cast<long>(reinterpret_cast<std::intptr_t>(epd));
-}
-
 bool dumps(const EpdInstance &epd) { return epd.pcmDumpEnabled == 1; }
 
 Word32 frame_length(const EpdInstance &epd) { return epd.rateMode == 0 ? 160 : 80; }
-
-/// Opens both dump files for the time of one call, so that they exist after it. Nothing is written
-/// through these handles.
-class DumpFilesPresent {
-public:
-  explicit DumpFilesPresent(const EpdInstance &epd) {
-    if (!dumps(epd)) return;
-    input_ = open_dump(kDumpFolder, &epd, kInputSuffix);
-    result_ = open_dump(kDumpFolder, &epd, kResultSuffix);
-  }
-  ~DumpFilesPresent() {
-    close_dump(input_);
-    close_dump(result_);
-  }
-  DumpFilesPresent(const DumpFilesPresent &) = delete;
-  DumpFilesPresent &operator=(const DumpFilesPresent &) = delete;
-
-private:
-  std::FILE *input_ = nullptr;
-  std::FILE *result_ = nullptr;
-};
 
 /// Logs a buffer that does not hold whole frames, and the settings while nothing is processed yet.
 void log_format(const EpdInstance &epd, Word32 numSample) {
@@ -145,7 +121,7 @@ EpdInstance *EPD_Create(Word32 mode, Word32 pcmDumpEnabled) {
 Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Word32 contentType) {
   if (epd == nullptr) return -1;
   log_format(*epd, numSample);
-  const DumpFilesPresent dump_files(*epd);
+  const DumpFilesPresent dump_files(dumps(*epd), epd, kInputSuffix, kResultSuffix);
   PublishedFlags<PlainFlags> flags;
   PublishedFlags<NsFlags> ns_flags;
 

@@ -30,8 +30,6 @@ struct EpdInstance {
 
 namespace orvalis {
 
-inline constexpr char kVersion[] = "160705";
-
 /// Creates an instance; null if memory runs out. Modes: see orvalis.h.
 EpdInstance *EPD_Create(Word32 mode, Word32 pcmDumpEnabled);
 

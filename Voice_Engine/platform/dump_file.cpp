@@ -1,6 +1,5 @@
 #include "Voice_Engine/platform/dump_file.h"
 
-#include <cstdint>
 #include <cstring>
 
 namespace orvalis {
@@ -25,8 +24,7 @@ bool set_dump_root(const char *directory) {
 
 std::FILE *open_dump(const char *folder, const void *handle, const char *suffix) {
   char path[kPathSize];
-  const auto number = static_cast<long>(reinterpret_cast<std::intptr_t>(handle));
-  std::snprintf(path, sizeof path, "%s%s%ld%s", root, folder, number, suffix);
+  std::snprintf(path, sizeof path, "%s%s%ld%s", root, folder, handle_number(handle), suffix);
   return std::fopen(path, "ab");
 }
 

@@ -1,6 +1,7 @@
 // Dump files: raw 16-bit PCM appended under a fixed folder, one file for each handle and purpose.
 #pragma once
 
+#include <cstdint>
 #include <cstdio>
 
 #include "Voice_Engine/basic_op/word.h"
@@ -9,6 +10,9 @@ namespace orvalis {
 
 /// Folder of the end-point detector's and the noise suppressor's dump files.
 inline constexpr char kDumpFolder[] = "/sdcard/VRpreprocess/";
+
+/// Folder of dynamics control's dump files.
+inline constexpr char kDrcDumpFolder[] = "/sdcard/";
 
 /// Puts a directory in front of dump paths; null or "" restores none. False, changing nothing, if
 /// a path might then not fit its buffer.
@@ -23,5 +27,32 @@ void write_dump(std::FILE *file, const Word16 *samples, int count);
 
 /// Closes a file if there is one.
 void close_dump(std::FILE *file);
+
+/// Opens both dump files of a frame driver for the time of one call, so that they exist after it.
+/// Nothing is written through these handles.
+class DumpFilesPresent {
+public:
+  DumpFilesPresent(bool wanted, const void *handle, const char *input_suffix,
+                   const char *result_suffix) {
+    if (!wanted) return;
+    input_ = open_dump(kDumpFolder, handle, input_suffix);
+    result_ = open_dump(kDumpFolder, handle, result_suffix);
+  }
+  ~DumpFilesPresent() {
+    close_dump(input_);
+    close_dump(result_);
+  }
+  DumpFilesPresent(const DumpFilesPresent &) = delete;
+  DumpFilesPresent &operator=(const DumpFilesPresent &) = delete;
+
+private:
+  std::FILE *input_ = nullptr;
+  std::FILE *result_ = nullptr;
+};
+
+/// A handle as log lines and dump files name it.
+inline long handle_number(const void *handle) {
+  return static_cast<long>(reinterpret_cast<std::intptr_t>(handle));
+}
 
 }  // namespace orvalis

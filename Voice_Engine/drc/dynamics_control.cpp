@@ -1,0 +1,132 @@
+#include "Voice_Engine/drc/dynamics_control.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <iterator>
+#include <numeric>
+
+#include "Voice_Engine/basic_op/double_precision.h"
+#include "Voice_Engine/platform/dump_file.h"
+#include "Voice_Engine/platform/log.h"
+
+namespace orvalis {
+namespace {
+
+constexpr Word32 kRate = 16000;
+constexpr Word16 kLoudMagnitude = 8192;  // a quarter of full scale
+constexpr Word32 kMostLoudSamples = 100;
+
+/// Q11, by the peak in 63rds of full scale: 2048 (63 / i)^(2/3), which compresses 3:1, but +12 dB
+/// at most.
+constexpr Word16 kGainCurve[64] = {
+    8153, 8153, 8153, 8153, 8153, 8153, 8153, 8153, 8106, 7494, 6986, 6556, 6186, 5865, 5582, 5331,
+    5107, 4904, 4721, 4554, 4401, 4260, 4130, 4009, 3897, 3793, 3695, 3603, 3517, 3435, 3358, 3286,
+    3217, 3152, 3090, 3030, 2974, 2920, 2869, 2820, 2772, 2727, 2684, 2642, 2602, 2563, 2526, 2490,
+    2455, 2422, 2389, 2358, 2327, 2298, 2270, 2242, 2215, 2189, 2164, 2140, 2116, 2093, 2070, 2048};
+
+Word16 frame_length(Word32 samplingRate) { return samplingRate == kRate ? 160 : 80; }
+
+/// The gain for a peak, between two entries of the curve; its high half is Q11.
+Word32 target_gain(PlainFlags &flags, const Word16 *curve, Word16 peak) {
+  const DoubleWord at = L_Extract(flags, L_mult(flags, peak, 63));
+  const Word32 upper = L_mult(flags, at.lo, curve[at.hi + 1]);
+  return L_mac(flags, upper, sub(flags, MAX_16, at.lo), curve[at.hi]);
+}
+
+/// Moves the envelope towards the target sample by sample, and applies it.
+void follow(PlainFlags &flags, DrcInstance &drc, Word32 target, Word16 *frame) {
+  Word32 envelope = drc.gainEnvelope;
+  for (Word16 *sample = frame; sample != frame + drc.frameLength; ++sample) {
+    const Word32 difference = L_sub(flags, target, envelope);
+    const Word16 coefficient = difference < 1 ? drc.fallCoefficient : drc.riseCoefficient;
+    const Word32 step = Mpy_32_16(flags, L_Extract(flags, difference), coefficient);
+    envelope = L_add(flags, envelope, step);
+    const Word16 gain_q11 = mult_r(flags, drc.outputScale, extract_h(envelope));
+    *sample = round_BOP(flags, L_shl(flags, L_mult(flags, *sample, gain_q11), 4));
+  }
+  drc.gainEnvelope = envelope;
+}
+
+}  // namespace
+
+DrcInstance *create_drc(Word32 samplingRate, Word32 pcmDumpEnabled) {
+  const Word16 length = frame_length(samplingRate);
+  log_line(kLogDebug, kLogTag, "Create DRC, SamplingRate : %d, PCM_LEN : %d", samplingRate, length);
+  DrcInstance *drc = initRecDynamicsControlParameter(samplingRate, length, MAX_16, pcmDumpEnabled);
+  if (drc != nullptr) log_line(kLogDebug, kLogTag, "Create DRC end");
+  return drc;
+}
+
+DrcInstance *initRecDynamicsControlParameter(Word32 samplingRate, Word16 frameLength,
+                                             Word16 outputScale, Word32 pcmDumpEnabled) {
+  auto *drc = static_cast<DrcInstance *>(std::malloc(sizeof(DrcInstance)));
+  if (drc == nullptr) return nullptr;
+  *drc = {.firstCallLogged = 0,
+          .pcmDumpEnabled = pcmDumpEnabled,
+          .loudRingIndex = 0,
+          .loudRing = {},
+          .samplingRate = samplingRate,
+          .frameLength = frameLength,
+          .gainEnvelope = 0,
+          .outputScale = outputScale,
+          .riseCoefficient = 164,
+          .fallCoefficient = 10,
+          .gainCurve = kGainCurve};
+  return drc;
+}
+
+Word32 process_drc(DrcInstance *drc, Word16 *pcm, Word32 count) {
+  if (drc == nullptr) return -1;
+  PublishedFlags<PlainFlags> flags;
+  const Word32 length = frame_length(drc->samplingRate);
+  bool loud = false;
+  for (Word32 rest = count; rest > 0; rest -= length, pcm += length)
+    loud |= EnvBasedDynamicsControl(*flags, drc, pcm) == 1;
+  return loud;
+}
+
+Word32 EnvBasedDynamicsControl(PlainFlags &flags, DrcInstance *drc, Word16 *frame) {
+  if (drc == nullptr || drc->samplingRate != kRate) return -1;
+  if (drc->firstCallLogged == 0) {
+    log_line(kLogDebug, kLogTag, "TQE: with doDRC ... samplingRate = %d", drc->samplingRate);
+    drc->firstCallLogged = 1;
+  }
+  std::FILE *before = nullptr;
+  std::FILE *after = nullptr;
+  if (drc->pcmDumpEnabled == 1) {
+    before = open_dump(kDrcDumpFolder, drc, "_beforeDRC.pcm");
+    after = open_dump(kDrcDumpFolder, drc, "_afterDRC.pcm");
+  }
+  write_dump(before, frame, drc->frameLength);
+
+  Word16 loud = 0;
+  const Word16 peak = DetectPeakVal(frame, drc->frameLength, &loud);
+  drc->loudRingIndex = static_cast<Word16>((drc->loudRingIndex + 1) % 10);
+  drc->loudRing[drc->loudRingIndex] = loud;
+  follow(flags, *drc, target_gain(flags, drc->gainCurve, peak), frame);
+
+  close_dump(before);
+  write_dump(after, frame, drc->frameLength);
+  close_dump(after);
+  // The newest frame stands in the ring and counts once more.
+  const Word32 recent = std::accumulate(std::begin(drc->loudRing), std::end(drc->loudRing), loud);
+  return recent > kMostLoudSamples ? 1 : 0;
+}
+
+Word16 DetectPeakVal(const Word16 *samples, Word16 count, Word16 *loud) {
+  Word16 peak = 0;
+  for (Word16 i = 0; i < count; ++i) {
+    const Word16 magnitude = abs_s(samples[i]);
+    peak = std::max(peak, magnitude);
+    if (magnitude > kLoudMagnitude) ++*loud;
+  }
+  return peak;
+}
+
+Word32 freeMemory_DRC(DrcInstance *drc) {
+  if (drc == nullptr || handle_number(drc) == -1) return -1;
+  std::free(drc);
+  return 0;
+}
+
+}  // namespace orvalis

@@ -1,0 +1,36 @@
+// The NS instance: one record for each noise suppressor, and the driver that takes a caller's
+// buffer through screening and suppression, frame by frame.
+#pragma once
+
+#include <cstdio>
+
+#include "Voice_Engine/ns/s1chns.h"
+
+/// Everything that one noise suppressor knows; two microphones share one process-wide suppressor
+/// instead. Allocated uncleared: creation sets each field before it is read.
+struct NsInstance {
+  orvalis::Word32 pcmDumpEnabled;      ///< 0: no caller can ask for dump files
+  orvalis::Word32 rateMode;            ///< rate digit of the mode
+  orvalis::Word32 micCount;            ///< 1 or 2; others suppress nothing
+  std::FILE *inputDumpFile;            ///< what came in, or null
+  std::FILE *resultDumpFile;           ///< what was suppressed, or null
+  orvalis::Word32 reserved;            ///< 0
+  orvalis::Word32 processedSamples;    ///< since creation, skipped frames included; saturates
+  orvalis::Word16 abnormalCheckCount;  ///< settling counter, 0..3
+  orvalis::S1chnsState suppressor;     ///< for one microphone
+};
+
+namespace orvalis {
+
+/// Creates an instance; null if memory runs out. Modes: see orvalis.h.
+NsInstance *DoNS_Create(Word32 mode, Word32 micCount);
+
+/// Suppresses a buffer of whole frames; a partial last frame is read and written whole. Frames that
+/// are not suppressed leave `out` as it is. Returns the samples processed since creation, or -1 for
+/// a null instance, for counts that differ, and for one microphone at 8 kHz.
+Word32 DO_NS_Proc_Frame(NsInstance *ns, Word16 *in, Word32 numIn, Word16 *out, Word32 numOut);
+
+/// Releases an instance. Returns 0, or -1 for a null or an all-ones handle.
+Word32 freeMemory_NS(NsInstance *ns);
+
+}  // namespace orvalis

@@ -1,0 +1,309 @@
+#include "Voice_Engine/ns/s2chns.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstdlib>
+#include <cstring>
+
+#include "Voice_Engine/basic_op/constexpr_math.h"
+
+namespace orvalis {
+namespace {
+
+constexpr double cov_smoothing = 0.61;
+constexpr float pmwf_beta = 3.0;
+constexpr double snr_low_threshold = 5.2;
+constexpr double snr_high_threshold = 23.1;
+constexpr float output_gain = 0.2F;
+
+constexpr int kLeastMagnitudes = 1600;  // a mean magnitude of 10 in channel 0
+constexpr int kReach = 15;              // bins to either side in the local average
+constexpr double kLeastNoiseMemory = 0.92;
+constexpr double kAbsenceMemory = 0.6;
+constexpr Word32 kBadLength = -100;
+
+/// Square-root Hann window. Its index lags by one, so that the first two entries are the same.
+constexpr std::array<float, kWindow> make_sqrt_hann_window() {
+  constexpr double kPi = 3.1415926535;
+  std::array<float, kWindow> window{};
+  for (int k = 0; k < kWindow; ++k) {
+    const double sine = constexpr_math::sin_of((k - 0.5) * kPi / kWindow);
+    window[k] = static_cast<float>(constexpr_math::sqrt_of(static_cast<float>(sine * sine)));
+  }
+  return window;
+}
+
+constexpr auto sqrt_hann_window = make_sqrt_hann_window();
+
+/// keep * old + (1 - keep) * now.
+ORVALIS_KERNEL float smoothed(double keep, float old, float now) {
+  return static_cast<float>(keep * old + (1.0 - keep) * now);
+}
+
+ORVALIS_KERNEL void smooth(Matrices &covariance, const Matrices &now, int bin, double keep) {
+  for (int i = 4 * bin; i < 4 * bin + 4; ++i) {
+    covariance.re[i] = smoothed(keep, covariance.re[i], now.re[i]);
+    covariance.im[i] = smoothed(keep, covariance.im[i], now.im[i]);
+  }
+}
+
+ORVALIS_KERNEL void smooth(Matrices &covariance, const Matrices &now) {
+  for (int k = 0; k < kTransformBins; ++k) smooth(covariance, now, k, cov_smoothing);
+}
+
+/// The spectrum of a channel's previous and new frame under the window; the new frame becomes the
+/// previous one.
+ORVALIS_KERNEL Spectrum analyse(float *frame_history, const float *frame) {
+  float analysis_frame[kTransformSamples];
+  buffercopy(frame_history, analysis_frame, kHop);
+  buffercopy(frame, analysis_frame + kHop, kHop);
+  bufferreset(analysis_frame + kWindow, kTransformSamples - kWindow);
+  buffercopy(frame, frame_history, kHop);
+  for (int i = 0; i < kWindow; ++i) analysis_frame[i] *= sqrt_hann_window[i];
+  Spectrum spectrum;
+  std::memcpy(spectrum.data(), analysis_frame, sizeof spectrum);
+  real_transform(spectrum, true);
+  return spectrum;
+}
+
+/// 16 bits of a sample: truncated toward zero to 32 bits, of which the low half is kept.
+Word16 to_word16(float sample) {
+  constexpr float kBeyond = 2147483648.0F;
+  if (std::isnan(sample)) return 0;
+  if (sample >= kBeyond) return static_cast<Word16>(MAX_32);
+  return static_cast<Word16>(sample < -kBeyond ? MIN_32 : static_cast<Word32>(sample));
+}
+
+/// Overlaps and adds the inverse transform of a spectrum; every sample goes to both channels.
+ORVALIS_KERNEL void synthesise(Spectrum &spectrum, float *overlap_tail, Word16 *out) {
+  real_transform(spectrum, false);
+  float synthesis_buffer[kTransformSamples];
+  std::memcpy(synthesis_buffer, spectrum.data(), sizeof synthesis_buffer);
+  for (int i = 0; i < kWindow; ++i) synthesis_buffer[i] *= sqrt_hann_window[i];
+  for (int i = 0; i < kHop; ++i)
+    out[2 * i] = out[2 * i + 1] = to_word16(synthesis_buffer[i] + overlap_tail[i]);
+  buffercopy(synthesis_buffer + kHop, overlap_tail, kHop);
+}
+
+/// The phase of y with another magnitude.
+ORVALIS_KERNEL Bin with_magnitude(Bin y, float magnitude) {
+  const Complex<double> wide = widened(y);
+  const double own = std::sqrt(wide.re * wide.re + wide.im * wide.im);
+  if (own == 0) return {0, 0};
+  return rounded({magnitude * wide.re / own, magnitude * wide.im / own});
+}
+
+/// The first frames take all audio as noise, and put out the first channel, lowered.
+ORVALIS_KERNEL Spectrum warm_up(S2chnsState &state) {
+  const S2chnsWork &work = state.work;
+  if (state.frame_count == 0) {
+    state.Phi_yy = state.Phi_vv = work.YY;
+  } else {
+    smooth(state.Phi_yy, work.YY);
+    smooth(state.Phi_vv, work.YY);
+  }
+  bufferreset(state.spp_smoothed, kTransformBins);
+  bufferreset(state.spp_prev, kTransformBins);
+
+  Spectrum output;
+  for (int k = 0; k < kTransformBins; ++k) {
+    const Bin Y0 = work.Y.load(k).first;
+    output[k] = with_magnitude(Y0, output_gain * std::sqrt(power(Y0)));
+  }
+  return output;
+}
+
+/// Forms the ratios that tell speech from noise, for the noise covariance as it stands.
+ORVALIS_KERNEL void form_ratios(S2chnsState &state) {
+  S2chnsWork &work = state.work;
+  inv_matrix(state.Phi_vv, work.Phi_vv_inv);
+
+  mul_1by2_2by2_matrix(work.Y_conj, work.Phi_vv_inv, work.row);
+  mul_1by2_2by1_matrix(work.row, work.Y, work.scalar);
+  buffercopy(work.scalar.re, work.gamma, kTransformBins);
+
+  mul_2by2_matrix(work.Phi_vv_inv, state.Phi_yy, work.M);
+  for (int k = 0; k < kTransformBins; ++k) {
+    const Matrix M = work.M.load(k);
+    work.r[k] = M.m11.re + M.m22.re;
+    work.Phi_xx.store(k, state.Phi_yy.load(k) - state.Phi_vv.load(k));
+  }
+
+  mul_2by2_matrix(work.Phi_vv_inv, work.Phi_xx, work.M);
+  mul_2by2_matrix(work.M, work.Phi_vv_inv, work.N);
+  mul_1by2_2by2_matrix(work.Y_conj, work.N, work.row);
+  mul_1by2_2by1_matrix(work.row, work.Y, work.scalar);
+  buffercopy(work.scalar.re, work.beta, kTransformBins);
+}
+
+/// How much a bin by itself looks like noise: 1 is noise alone.
+ORVALIS_KERNEL float local_soft_decision(float r, float gamma) {
+  constexpr double kNoSpeech = 2.0;  // the trace of the identity
+  if (!(gamma < snr_low_threshold)) return 0;
+  if (r < kNoSpeech) return 1;
+  if (!(r < snr_high_threshold)) return 0;  // not-a-numbers too
+  return static_cast<float>((snr_high_threshold - r) / (snr_high_threshold - kNoSpeech));
+}
+
+/// 1 if the neighbourhood of a bin looks like noise. Bins beyond the last one count as 0.
+ORVALIS_KERNEL float local_averaged_decision(const float *gamma, int bin) {
+  const int first = std::max(0, bin - kReach);
+  const int beyond = bin + kReach + 1;
+  float sum = 0;
+  for (int k = first; k < std::min(beyond, kTransformBins); ++k) sum += gamma[k];
+  return sum / static_cast<float>(beyond - first) < snr_low_threshold ? 1.0F : 0.0F;
+}
+
+/// 1 if the whole frame looks like noise.
+ORVALIS_KERNEL float global_decision(const float *gamma) {
+  float sum = 0;
+  for (int k = 0; k < kTransformBins; ++k) sum += gamma[k];
+  return sum * 0.00390625F < snr_low_threshold ? 1.0F : 0.0F;
+}
+
+/// Probability of speech in a bin whose prior probability of noise alone is q.
+ORVALIS_KERNEL float presence_probability(float q, float r, float beta) {
+  const double xi = r - 2.0F;
+  if (1.0 + xi == 0) return 1;
+  const float e = SAFE_EXP(static_cast<float>(-beta / (1.0 + xi)));
+  const auto odds = static_cast<float>(q / (1.0 - q) * (1.0 + xi) * e);
+  const auto p = static_cast<float>(1.0 / (1.0 + odds));
+  return std::isnan(p) ? 0 : SAFE_SAP(p);
+}
+
+ORVALIS_KERNEL void find_presence(const S2chnsWork &work, float *p) {
+  constexpr float kLeastPrior = 0.01F;
+  constexpr float kMostPrior = 0.99F;
+  const float global = global_decision(work.gamma);
+  for (int k = 0; k < kTransformBins; ++k) {
+    const float q = global * local_soft_decision(work.r[k], work.gamma[k]) *
+                    local_averaged_decision(work.gamma, k);
+    p[k] = presence_probability(std::clamp(q, kLeastPrior, kMostPrior), work.r[k], work.beta[k]);
+  }
+}
+
+/// The less speech a bin holds, the faster its noise is learnt.
+ORVALIS_KERNEL void update_noise(S2chnsState &state) {
+  for (int k = 0; k < kTransformBins; ++k) {
+    const double keep = kLeastNoiseMemory + (1.0 - kLeastNoiseMemory) * state.spp_smoothed[k];
+    smooth(state.Phi_vv, state.work.YY, k, keep);
+  }
+}
+
+/// Estimates presence and noise twice: smoothed over time, then with the noise just learnt.
+ORVALIS_KERNEL void track(S2chnsState &state) {
+  smooth(state.Phi_yy, state.work.YY);
+
+  float p[kTransformBins];
+  form_ratios(state);
+  find_presence(state.work, p);
+  for (int k = 0; k < kTransformBins; ++k)
+    state.spp_smoothed[k] = smoothed(kAbsenceMemory, state.spp_prev[k], p[k]);
+  update_noise(state);
+
+  form_ratios(state);
+  find_presence(state.work, p);
+  buffercopy(p, state.spp_smoothed, kTransformBins);
+  buffercopy(p, state.spp_prev, kTransformBins);
+  update_noise(state);
+}
+
+/// Filters both channels; the output has the first channel's phase and 0.2 to 1 of its magnitude.
+ORVALIS_KERNEL Spectrum filter(S2chnsState &state) {
+  S2chnsWork &work = state.work;
+  inv_matrix(state.Phi_vv, work.Phi_vv_inv);
+  mul_2by2_matrix(work.Phi_vv_inv, state.Phi_yy, work.M);
+  compute_PMWF_coeff(work.M, work.N, pmwf_beta);
+
+  Spectrum output{};  // DC, Nyquist and bin 1 stay silent
+  for (int k = 2; k < kTransformBins; ++k) {
+    const Pair Y = work.Y.load(k);
+    const Matrix W = work.N.load(k);
+    const Bin Z = conj(W.m11) * Y.first + conj(W.m21) * Y.second;
+    const float most = std::sqrt(power(Y.first));
+    const float filtered = std::sqrt(power(Z));
+    const float magnitude = filtered <= most ? filtered : most;  // not-a-numbers too
+    output[k] = with_magnitude(Y.first, std::max(magnitude, output_gain * most));
+  }
+  return output;
+}
+
+ORVALIS_KERNEL void process_frame(S2chnsState &state, const Word16 *in, Word16 *out) {
+  float frame[2][kHop];
+  int magnitudes = 0;
+  for (int i = 0; i < kHop; ++i) {
+    frame[0][i] = in[2 * i];
+    frame[1][i] = in[2 * i + 1];
+    magnitudes += std::abs(in[2 * i]);
+  }
+  if (magnitudes < kLeastMagnitudes) return;
+
+  S2chnsWork &work = state.work;
+  const Spectrum Y0 = analyse(state.frame_history[0], frame[0]);
+  const Spectrum Y1 = analyse(state.frame_history[1], frame[1]);
+  for (int k = 0; k < kTransformBins; ++k) {
+    work.Y.store(k, {Y0[k], Y1[k]});
+    work.Y_conj.store(k, {conj(Y0[k]), conj(Y1[k])});
+  }
+  mul_2by1_1by2_matrix(work.Y, work.Y_conj, work.YY);
+
+  Spectrum output;
+  if (state.frame_count < kWarmUpFrames) {
+    output = warm_up(state);
+  } else {
+    track(state);
+    output = filter(state);
+  }
+  synthesise(output, state.overlap_tail, out);
+  count_up(state.frame_count);
+}
+
+constinit S2chnsState process_wide_suppressor{};
+
+}  // namespace
+
+void s2chns_frame_portable(S2chnsState &state, const Word16 *in, Word16 *out) {
+  process_frame(state, in, out);
+}
+
+ORVALIS_WITH_FMA void s2chns_frame_fused(S2chnsState &state, const Word16 *in, Word16 *out) {
+  process_frame(state, in, out);
+}
+
+void reset_s2chns(S2chnsState &state) { std::memset(&state, 0, sizeof state); }
+
+Word32 process_s2chns(S2chnsState &state, const Word16 *in, Word16 *out, Word16 n) {
+  if (n % kHop != 0) return kBadLength;
+  const auto frame = has_fma() ? s2chns_frame_fused : s2chns_frame_portable;
+  for (int at = 0; at < n; at += kHop) frame(state, in + 2 * at, out + at);
+  return 0;
+}
+
+void S2CHNSInit(NsInstance *) { reset_s2chns(process_wide_suppressor); }
+
+Word32 S2CHNSProcessNSFrame(NsInstance *, const Word16 *in, Word16 *out, Word16 n) {
+  return process_s2chns(process_wide_suppressor, in, out, n);
+}
+
+Word32 S2CHNSFree() { return 0; }
+
+float SAFE_EXP(float x) {
+  if (x < -10) return 4.539993e-5F;
+  if (x > 10) return 22026.465F;
+  return static_cast<float>(std::exp(static_cast<double>(x)));
+}
+
+float SAFE_SAP(float x) {
+  if (x > 1) return 1;
+  return x < 0 ? 0 : x;
+}
+
+void buffercopy(const float *src, float *dst, Word16 count) {
+  if (count > 0) std::copy_n(src, count, dst);
+}
+
+void bufferreset(float *buf, Word16 count) {
+  if (count > 0) std::fill_n(buf, count, 0.0F);
+}
+
+}  // namespace orvalis

@@ -1,0 +1,86 @@
+// Two-microphone noise suppressor: 16 kHz, frames of 160 samples a channel.
+//
+// Each frequency bin keeps 2x2 spatial covariances of input and noise and a speech-presence
+// probability; a parametric multichannel Wiener filter makes one output of the two channels. The
+// output is delayed by 160 samples.
+//
+// Source: M. Souden, J. Chen, J. Benesty, S. Affes, "Gaussian model-based multichannel speech
+// presence probability", 2010, and "An integrated solution for online multichannel noise tracking
+// and reduction", 2011.
+//
+// Whatever comes in, no covariance becomes infinite or not a number: a dead microphone, or the same
+// signal on both, makes the noise covariance singular, and the suppressor recovers when the
+// microphone does.
+#pragma once
+
+#include "Voice_Engine/basic_op/word.h"
+#include "Voice_Engine/ns/pmwf.h"
+
+struct NsInstance;
+
+namespace orvalis {
+
+inline constexpr int kHop = 160;          ///< samples a channel and frame
+inline constexpr int kWindow = 2 * kHop;  ///< samples under the window
+inline constexpr int kWarmUpFrames = 11;  ///< frames that only learn the noise
+
+/// What a frame needs between its steps and the next frame does not.
+struct S2chnsWork {
+  Pairs Y;          ///< both channels' spectra
+  Pairs Y_conj;     ///< and their conjugates, as a row
+  Matrices YY;      ///< Y Y^H
+  Matrices Phi_xx;  ///< covariance of the speech
+  Matrices Phi_vv_inv;
+  Matrices M, N;  ///< products
+  Pairs row;
+  Scalars scalar;
+  float gamma[kTransformBins];  ///< a posteriori ratio
+  float r[kTransformBins];      ///< trace of Phi_vv^-1 Phi_yy; r - 2 is the a priori ratio
+  float beta[kTransformBins];   ///< power of the speech behind the noise's inverse
+};
+
+/// State of one suppressor, all zero before the first frame.
+struct S2chnsState {
+  float frame_history[2][kHop];        ///< the previous frame of each channel
+  float overlap_tail[kHop];            ///< second half of the previous windowed output
+  Matrices Phi_yy;                     ///< covariance of the input
+  Matrices Phi_vv;                     ///< covariance of the noise
+  float spp_smoothed[kTransformBins];  ///< speech-presence probability of this frame
+  float spp_prev[kTransformBins];      ///< and the one that the next frame is smoothed with
+  Word32 frame_count;                  ///< frames processed; saturates
+  S2chnsWork work;
+};
+
+/// Forgets everything: the next 11 frames learn the noise again.
+void reset_s2chns(S2chnsState &state);
+
+/// Suppresses n samples a channel, n a multiple of 160: interleaved pairs in and out, both channels
+/// of the output the same. Output frame j begins at element 160 j and is 320 long, so that of
+/// several frames each but the last keeps only its first half. A frame whose mean magnitude in
+/// channel 0 is below 10 leaves output and state as they are. Output beyond 16 bits wraps around.
+/// Returns 0, or -100 for any other n; nothing happens for n < 1.
+Word32 process_s2chns(S2chnsState &state, const Word16 *in, Word16 *out, Word16 n);
+
+/// The two bodies behind process_s2chns, for one frame; the second needs has_fma().
+void s2chns_frame_portable(S2chnsState &state, const Word16 *in, Word16 *out);
+void s2chns_frame_fused(S2chnsState &state, const Word16 *in, Word16 *out);
+
+/// The same over the one suppressor that all callers in the process share; the instance is not
+/// used.
+void S2CHNSInit(NsInstance *instance);
+Word32 S2CHNSProcessNSFrame(NsInstance *instance, const Word16 *in, Word16 *out, Word16 n);
+
+/// Releases nothing, for the suppressor owns nothing. Returns 0.
+Word32 S2CHNSFree();
+
+/// exp(x), held between exp(-10) and exp(10).
+float SAFE_EXP(float x);
+
+/// A probability held between 0 and 1.
+float SAFE_SAP(float x);
+
+/// Copies, or clears, `count` floats; nothing for count < 1.
+void buffercopy(const float *src, float *dst, Word16 count);
+void bufferreset(float *buf, Word16 count);
+
+}  // namespace orvalis
