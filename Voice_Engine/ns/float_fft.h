@@ -11,7 +11,7 @@
  *
  * Direction 1 is forward, any other value inverse. Forward, a bin is the discrete Fourier transform
  * divided by 256; inverse, a packed spectrum gives the samples again. Each way the root mean square
- * error is below 1e-7 of the signal's. Complex products are formed in double precision with fused
+ * error is below 2e-7 of the signal's. Complex products are formed in double precision with fused
  * multiply-adds and rounded to float: the same bits on every processor.
  *
  * Any thread may call; the buffer must hold 512 floats, nothing is checked.
