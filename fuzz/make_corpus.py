@@ -5,7 +5,7 @@ import pathlib
 import struct
 
 LITERAL, CONSTANT, NOISE, PULSES = range(4)
-AUDIO = 7  # the byte before a piece of audio; both targets that take audio know it
+AUDIO = 7  # the byte before a piece of audio; all targets that take audio know it
 
 
 def word(value):
@@ -60,6 +60,28 @@ def epd_frame():
         bytes([AUDIO]) + piece + bytes([0]) for piece in
         [literal(), literal(1, 2, 3), noise(200), voice(440)]) + b"".join(
         bytes([2]) + number(n) for n in [0, 1, 160, -1, -1 << 31, (1 << 31) - 1])
+
+
+def ns_frame():
+    whole, any_cut, null = bytes([2]), bytes([1]), bytes([0])
+    speech = [noise(8000), voice(8000), noise(3200), voice(6400, period=80)]
+    rate_16k = bytes([1])
+    start = lambda mode, mics: bytes([mode, mics - 1, 0]) + rate_16k
+    for name, head in {"one_mic": start(0, 1), "strong": start(1, 1), "narrow": start(2, 1),
+                       "long_frames": start(3, 1), "short_frames": start(5, 1),
+                       "two_mics": start(0, 2), "two_mics_narrow": start(2, 2)}.items():
+        yield name, head + b"".join(whole + piece for piece in speech)
+        yield name + "_odd", head + any_cut + any_cut.join(
+            [literal(1, 2, 3), noise(440), voice(4040), literal()])
+    yield "no_mics", bytes([200]) + number(0) + bytes([0]) + number(-7) + bytes([0]) + rate_16k + (
+        whole + noise(3200))
+    yield "other_rate", bytes([0, 0, 0, 0]) + number(8000) + whole + voice(3200)
+    yield "extremes", start(0, 2) + whole + whole.join(
+        [constant(8000, 20), constant(3200, -32768), voice(6400, 32767), noise(6400, 32767),
+         constant(1600, 0), literal(*[32767, -32768] * 120), noise(8000)])
+    yield "hesitant", start(0, 1) + (whole + constant(160, 3)) * 3 + (whole + constant(160, 9)) * 6
+    yield "nothing", start(0, 1) + b"".join(
+        null + number(n) for n in [0, 1, 160, -1, -1 << 31, (1 << 31) - 1])
 
 
 def settings(rate=0, gain=0, content_type=0, hangover=0, before=0, after=0):
@@ -139,7 +161,7 @@ def audio_source():
 
 
 corpus = pathlib.Path(__file__).parent / "corpus"
-for target in (epd_frame, utterance_stream, audio_source):
+for target in (epd_frame, ns_frame, utterance_stream, audio_source):
     folder = corpus / target.__name__
     folder.mkdir(parents=True, exist_ok=True)
     for name, content in target():
