@@ -5,10 +5,14 @@
 #include <algorithm>
 #include <array>
 #include <chrono>
+#include <memory>
 #include <vector>
 
+#include "Voice_Engine/drc/dynamics_control.h"
 #include "Voice_Engine/epd/epd_instance.h"
 #include "Voice_Engine/epd/fixed_fft.h"
+#include "Voice_Engine/ns/float_fft.h"
+#include "Voice_Engine/ns/s2chns.h"
 #include "bench/table.h"
 #include "jni/orvalis.h"
 #include "tests/support/recordings.h"
@@ -111,8 +115,43 @@ private:
   VelmoraVadState state_{};
 };
 
+/// Two microphones: the second hears the speech three samples later, and noise of its own.
+class TwoMicrophones {
+public:
+  static constexpr std::size_t kBytes = sizeof(S2chnsState);
+
+  void start() { reset_s2chns(*state_); }
+  void hear(const Word16 *frame, int samples) {
+    for (int i = 0; i < samples; ++i) {
+      pairs_[2 * i] = frame[i];
+      pairs_[2 * i + 1] = static_cast<Word16>(frame[std::max(0, i - 3)] / 2 + (i * 7919 % 41 - 20));
+    }
+    process_s2chns(*state_, pairs_, pairs_, kHop);
+    benchmark::DoNotOptimize(pairs_);
+  }
+
+private:
+  std::shared_ptr<S2chnsState> state_ = std::make_shared<S2chnsState>();
+  Word16 pairs_[2 * kHop] = {};
+};
+
+class Leveling {
+public:
+  static constexpr std::size_t kBytes = sizeof(DrcInstance);
+
+  void start() { drc_.reset(create_drc(16000, 0), freeMemory_DRC); }
+  void hear(const Word16 *frame, int samples) {
+    std::copy_n(frame, samples, buffer_);
+    benchmark::DoNotOptimize(process_drc(drc_.get(), buffer_, samples));
+  }
+
+private:
+  std::shared_ptr<DrcInstance> drc_;
+  Word16 buffer_[kMostFrameSamples] = {};
+};
+
 /// `Transform` runs in place over a frame followed by zeros.
-template <class Transform>
+template <class Transform, class Sample = Word16, std::size_t kSize = kMostTransformSize>
 class Transformation {
 public:
   static constexpr std::size_t kBytes = 0;
@@ -121,14 +160,14 @@ public:
 
   void start() {}
   void hear(const Word16 *frame, int samples) {
-    std::fill(std::copy_n(frame, samples, buffer_), std::end(buffer_), Word16{0});
+    std::fill(std::copy_n(frame, samples, buffer_), std::end(buffer_), Sample{0});
     transform_(buffer_);
     benchmark::DoNotOptimize(buffer_);
   }
 
 private:
   Transform transform_;
-  Word16 buffer_[kMostTransformSize] = {};
+  Sample buffer_[kSize] = {};
 };
 
 /// The slowest frame by the median of several passes: what the audio costs, without the moments at
@@ -180,6 +219,8 @@ void register_frame_costs() {
   measure("ProcessEPDFrame, 16 kHz", wide, Detection(0));
   measure("ProcessEPDFrame, 8 kHz", narrow, Detection(1000));
   measure("s1chns_C", wide, Suppression());
+  measure("process_s2chns", wide, TwoMicrophones());
+  measure("process_drc", wide, Leveling());
   measure("VelmoraVAD, 16 kHz", wide, VoiceDetection(0));
   measure("VelmoraVAD, 8 kHz", narrow, VoiceDetection(1));
   measure("c_fft_epd, band 0", wide, Transformation([](Word16 *x) { c_fft_epd(x, 1, 0); }));
@@ -188,6 +229,8 @@ void register_frame_costs() {
   measure("r_fft_epd, band 1", narrow, Transformation([](Word16 *x) { r_fft_epd(x, 1, 1); }));
   measure("c_fft_ns", wide, Transformation([](Word16 *x) { c_fft_ns(x, 1); }));
   measure("r_fft_ns", wide, Transformation([](Word16 *x) { r_fft_ns(x, 1); }));
+  const auto float_fft = [](float *x) { r_fft(x, 1); };
+  measure("r_fft", wide, Transformation<decltype(float_fft), float, 512>(float_fft));
 }
 
 }  // namespace orvalis::bench
