@@ -66,6 +66,9 @@ public:
   const std::vector<Utterance> &found() const { return found_; }
 
   bool take() {
+    const std::int64_t earliest = EarliestUtteranceStart(stream_);
+    require(earliest >= earliest_start_, "the earliest start never goes back");
+    earliest_start_ = earliest;
     Utterance next;
     const std::int32_t taken = NextUtterance(stream_, &next);
     require(taken == 0 || taken == 1, "taking answers 0 or 1");
@@ -110,6 +113,7 @@ private:
     const std::int64_t previous_end = found_.empty() ? 0 : found_.back().end;
     require(next.number == static_cast<std::int32_t>(found_.size()) + 1, "numbers ascend by one");
     require(next.start >= previous_end, "padded neighbours do not overlap");
+    require(next.start >= earliest_start_, "no utterance starts before the earliest start");
     require(next.start < next.end, "an utterance holds samples");
     require(next.end <= pushed_, "an utterance lies within the audio");
     require(next.began > 0 && next.began <= next.ended, "answers begin before they end");
@@ -121,6 +125,7 @@ private:
   std::int32_t frame_samples_;
   UtteranceStream *stream_;
   std::int64_t pushed_ = 0;
+  std::int64_t earliest_start_ = 0;
   std::vector<Utterance> found_;
 };
 
@@ -131,7 +136,7 @@ std::int32_t read_ms(Input &input) {
 
 UtteranceSettings read_settings(Input &input) {
   constexpr std::int32_t kRates[] = {16000, 8000};
-  UtteranceSettings settings;
+  UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   const std::uint8_t rate = input.byte();
   settings.rate_hz = rate < 254 ? kRates[rate % 2] : input.number();
   settings.input_gain = input.number();

@@ -54,6 +54,9 @@ public:
     ++count_;
   }
 
+  /// The oldest; null if there is none.
+  const Utterance *front() const { return count_ == 0 ? nullptr : &slots_[first_]; }
+
   bool pop(Utterance &utterance) {
     if (count_ == 0) return false;
     utterance = slots_[first_];
@@ -101,6 +104,13 @@ public:
     }
     close_open(queue);
     if (closed_) hand_out(input_end - closed_->end, queue);
+  }
+
+  /// No utterance that is still to be decided starts before this.
+  int64_t earliest_start() const {
+    const int64_t next_piece = std::max(heard_ - delay_.start, last_piece_end_);
+    const int64_t start = closed_ ? closed_->start : open_ ? open_->start : next_piece;
+    return std::max(start - pad_before_, handed_out_end_);
   }
 
 private:
@@ -246,7 +256,7 @@ ORVALIS_EXPORT UtteranceStream *OpenUtteranceStream(const UtteranceSettings *set
   if (settings == nullptr || !is_valid(*settings)) return nullptr;
   void *memory = std::malloc(sizeof(UtteranceStream));
   if (memory == nullptr) return nullptr;
-  EpdInstance *epd = InitializeEPD(engine_mode(*settings), 0);
+  EpdInstance *epd = InitializeEPD(engine_mode(*settings), settings->pcm_dump);
   if (epd == nullptr) {
     std::free(memory);
     return nullptr;
@@ -275,6 +285,12 @@ ORVALIS_EXPORT int32_t PushUtteranceAudio(UtteranceStream *stream, const int16_t
 ORVALIS_EXPORT int32_t NextUtterance(UtteranceStream *stream, Utterance *utterance) {
   if (stream == nullptr || utterance == nullptr) return -1;
   return stream->queue.pop(*utterance) ? 1 : 0;
+}
+
+ORVALIS_EXPORT int64_t EarliestUtteranceStart(const UtteranceStream *stream) {
+  if (stream == nullptr) return -1;
+  const Utterance *decided = stream->queue.front();
+  return decided != nullptr ? decided->start : stream->finder.earliest_start();
 }
 
 ORVALIS_EXPORT int32_t FlushUtteranceStream(UtteranceStream *stream) {

@@ -73,11 +73,12 @@ typedef struct UtteranceSettings {
   int32_t hangover_ms;   /* longest time between answers 1 that joins pieces; 0 joins none */
   int32_t pad_before_ms; /* 0 or more, added before an utterance */
   int32_t pad_after_ms;  /* 0 or more, added after it */
+  int32_t pcm_dump;      /* 1 writes the detector's dump files; see InitializeEPD in orvalis.h */
 } UtteranceSettings;
 
-/* 16 kHz, no gain, content type 0, half a second of hangover, no padding. */
+/* 16 kHz, no gain, content type 0, half a second of hangover, no padding, no dump. */
 #define UTTERANCE_SETTINGS_DEFAULT \
-  { 16000, 0, 0, 500, 0, 0 }
+  { 16000, 0, 0, 500, 0, 0, 0 }
 
 /* Times are counts of samples since the stream was opened. */
 typedef struct Utterance {
@@ -104,6 +105,12 @@ int32_t PushUtteranceAudio(UtteranceStream *stream, const int16_t *pcm, int32_t 
 
 /* Takes the oldest decided utterance: 1 if there was one, 0 if not, -1 if a pointer is NULL. */
 int32_t NextUtterance(UtteranceStream *stream, Utterance *utterance);
+
+/*
+ * The first sample that an utterance still to be taken may hold: a caller that keeps audio to cut
+ * utterances from it can forget what is before. It never goes back. -1 if stream is NULL.
+ */
+int64_t EarliestUtteranceStart(const UtteranceStream *stream);
 
 /*
  * Ends the audio and closes what is open; there is always room for it in the queue. Returns the

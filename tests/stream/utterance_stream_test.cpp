@@ -64,7 +64,7 @@ Stream open(const UtteranceSettings &settings) { return Stream(OpenUtteranceStre
 
 UtteranceSettings settings_of(int32_t rate, int32_t content_type, int32_t hangover_ms,
                               int32_t pad_before_ms = 0, int32_t pad_after_ms = 0) {
-  return {rate, 0, content_type, hangover_ms, pad_before_ms, pad_after_ms};
+  return {rate, 0, content_type, hangover_ms, pad_before_ms, pad_after_ms, 0};
 }
 
 /// The script of runs like "50o 60s 2n": frames without speech, with speech, of null audio.
@@ -79,7 +79,13 @@ std::string frames(const std::string &runs) {
 
 /// Takes what was decided to the end of a list.
 void take_all(const Stream &stream, std::vector<Utterance> &found) {
-  for (Utterance next; NextUtterance(stream.get(), &next) == 1;) found.push_back(next);
+  int64_t earliest = EarliestUtteranceStart(stream.get());
+  for (Utterance next; NextUtterance(stream.get(), &next) == 1;) {
+    EXPECT_GE(next.start, earliest);
+    EXPECT_GE(EarliestUtteranceStart(stream.get()), earliest) << "never goes back";
+    earliest = EarliestUtteranceStart(stream.get());
+    found.push_back(next);
+  }
 }
 
 /// Pushes what is left of the audio, as far as it is taken.
@@ -229,6 +235,32 @@ TEST(UtteranceStream, PaddingKeepsOffAPieceThatHeldNoSpeech) {
   EXPECT_LE(found[0].end, found[1].start);
 }
 
+TEST(UtteranceStream, TellsWhatAudioMayBeForgotten) {
+  // 45-85 is handed out when its padding's room is known, 155-195 alike, 255 is still open.
+  const std::string answers = frames("50o 60s 50o 60s 40o 60s");
+  const int32_t frame = 160, pad_frames = 10;
+  play(answers);
+  const Pcm pcm = audio_for(answers, frame);
+  const Stream stream = open(settings_of(16000, 0, 0, pad_frames * 10, pad_frames * 10));
+  std::vector<Utterance> found;
+  std::vector<std::pair<int64_t, std::size_t>> told;  // earliest start, utterances taken by then
+  for (std::size_t done = 0; done < pcm.size(); take_all(stream, found)) {
+    push_rest(stream, pcm, done, static_cast<std::size_t>(frame));
+    told.emplace_back(EarliestUtteranceStart(stream.get()), found.size());
+  }
+  FlushUtteranceStream(stream.get());
+  take_all(stream, found);
+  play("");
+  ASSERT_EQ(found.size(), 3u);
+  for (const auto &[earliest, taken] : told)
+    for (std::size_t i = taken; i < found.size(); ++i) EXPECT_LE(earliest, found[i].start);
+  // In silence it keeps up but for the delay and the padding; in speech it waits at the start.
+  EXPECT_EQ(told[39].first, (40 - 5 - pad_frames) * frame);
+  EXPECT_EQ(told[100].first, found[0].start);
+  EXPECT_EQ(told[150].first, (151 - 5 - pad_frames) * frame);
+  EXPECT_EQ(told.back().first, found[2].start);
+}
+
 TEST(UtteranceStream, FlushClosesWhatIsOpen) {
   const std::string answers = frames("50o 30s");
   for (const int32_t content_type : {0, 2}) {
@@ -348,7 +380,7 @@ TEST(UtteranceStream, RefusesBadArgumentsAndWantOfMemory) {
     EXPECT_EQ(OpenUtteranceStream(&bad), nullptr);
   }
   for (const UtteranceSettings &bad :
-       {UtteranceSettings{44100, 0, 0, 500, 0, 0}, {8000, 3, 0, 500, 0, 0}})
+       {UtteranceSettings{44100, 0, 0, 500, 0, 0, 0}, {8000, 3, 0, 500, 0, 0, 0}})
     EXPECT_EQ(OpenUtteranceStream(&bad), nullptr);
   EXPECT_EQ(OpenUtteranceStream(nullptr), nullptr);
 
@@ -368,6 +400,7 @@ TEST(UtteranceStream, RefusesBadArgumentsAndWantOfMemory) {
   EXPECT_EQ(NextUtterance(nullptr, &none), -1);
   EXPECT_EQ(NextUtterance(stream.get(), nullptr), -1);
   EXPECT_EQ(NextUtterance(stream.get(), &none), 0);
+  EXPECT_EQ(EarliestUtteranceStart(nullptr), -1);
   EXPECT_EQ(FlushUtteranceStream(nullptr), -1);
   EXPECT_EQ(CloseUtteranceStream(nullptr), -1);
 }
