@@ -1,33 +1,17 @@
 // Any audio file, or standard input, as the 16-bit mono samples that the engine takes.
 #pragma once
 
-#include <sndfile.h>
-
 #include <algorithm>
 #include <cstdint>
-#include <memory>
 #include <optional>
 #include <span>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
+#include "cli/open_audio.h"
 #include "cli/resampler.h"
 
 namespace orvalis::cli {
-
-/// What is wrong with one input; the others can still be done.
-class AudioError : public std::runtime_error {
-public:
-  using std::runtime_error::runtime_error;
-};
-
-struct AudioSettings {
-  bool raw = false;  ///< No header: 16-bit little-endian samples
-  int raw_rate_hz = 16000;
-  int raw_channels = 1;
-  int channel = 0;  ///< The one to listen to, from 1; 0 takes the mean of all
-};
 
 class AudioSource {
 public:
@@ -35,7 +19,7 @@ public:
   AudioSource(const std::string &name, const AudioSettings &settings);
 
   /// Rate of the samples that read() returns: 8000 or 16000.
-  int rate_hz() const { return resampler_ ? 16000 : info_.samplerate; }
+  int rate_hz() const { return resampler_ ? 16000 : audio_.info.samplerate; }
 
   /// The next samples, about 10 ms, so that a live source is heard at once. Empty at the end.
   std::span<const std::int16_t> read();
@@ -60,21 +44,24 @@ public:
   /// Samples that read() has returned so far.
   std::int64_t samples_read() const { return samples_read_; }
 
+  /// Whether the source can be read only once.
+  bool is_piped() const { return audio_.piped; }
+
+  /// How much audio there is, unless that cannot be known.
+  std::optional<double> length_seconds() const {
+    if (audio_.piped) return std::nullopt;
+    return static_cast<double>(audio_.info.frames) / audio_.info.samplerate;
+  }
+
   /// After the end: throws if that was a read error, or came before the end that the header names.
   void check_complete() const;
 
 private:
-  struct Closer {
-    void operator()(SNDFILE *file) const { sf_close(file); }
-  };
-
   bool read_untouched();
   bool read_converted();
   bool read_mono();
 
-  std::unique_ptr<SNDFILE, Closer> file_;
-  SF_INFO info_{};
-  bool piped_ = false;
+  OpenAudio audio_;
   bool ended_ = false;
   bool untouched_ = false;  ///< 16-bit samples go to the engine as they are
   int channel_ = 0;
