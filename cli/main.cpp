@@ -54,6 +54,8 @@ int run(int argc, char **argv) {
 int main(int argc, char **argv) {
   // A reader that leaves is met where the write fails, not by the end of the process.
   std::signal(SIGPIPE, SIG_IGN);
+  // So is a limit on the size of files.
+  std::signal(SIGXFSZ, SIG_IGN);
   try {
     return run(argc, argv);
   } catch (const std::system_error &error) {

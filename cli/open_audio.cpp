@@ -6,7 +6,6 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <mutex>
 #include <system_error>
 
 namespace orvalis::cli {
@@ -48,6 +47,11 @@ int open_pipe(const std::string &name) {
 
 }  // namespace
 
+std::unique_lock<std::mutex> lock_opening() {
+  static std::mutex opening;
+  return std::unique_lock(opening);
+}
+
 OpenAudio open_audio(const std::string &name, const AudioSettings &settings) {
   OpenAudio audio;
   const struct stat status = status_of(name);
@@ -64,9 +68,7 @@ OpenAudio open_audio(const std::string &name, const AudioSettings &settings) {
   const bool by_name = name != "-" && !audio.piped;
   const int descriptor = by_name ? -1 : audio.piped ? open_pipe(name) : STDIN_FILENO;
 
-  // libsndfile keeps the reason why a file did not open in one place for all threads.
-  static std::mutex opening;
-  const std::lock_guard lock(opening);
+  const auto lock = lock_opening();
   audio.file.reset(by_name
                        ? sf_open(name.c_str(), SFM_READ, &audio.info)
                        : sf_open_fd(descriptor, SFM_READ, &audio.info, descriptor != STDIN_FILENO));

@@ -4,6 +4,7 @@
 #include <sndfile.h>
 
 #include <memory>
+#include <mutex>
 #include <stdexcept>
 #include <string>
 
@@ -32,6 +33,10 @@ struct OpenAudio {
   SF_INFO info{};
   bool piped = false;  ///< Can be read only once, and its length is not known
 };
+
+/// libsndfile keeps the reason why a file did not open in one place for all threads. Who opens one,
+/// to read or to write, holds this until the reason is known.
+std::unique_lock<std::mutex> lock_opening();
 
 /// Opens a file, or standard input for "-". Several threads may do so at once. Throws AudioError.
 OpenAudio open_audio(const std::string &name, const AudioSettings &settings);

@@ -7,6 +7,8 @@
 #include <nlohmann/json.hpp>
 #include <system_error>
 
+#include "cli/progress.h"
+
 namespace orvalis::cli {
 namespace {
 
@@ -105,11 +107,13 @@ std::unique_ptr<Report> make_table_report(bool headings) {
 std::unique_ptr<Report> make_json_report() { return std::make_unique<JsonReport>(); }
 
 void print_line(const std::string &line) {
+  wipe_progress();
   if (std::fputs((line + "\n").c_str(), stdout) == EOF || std::fflush(stdout) == EOF)
     throw std::system_error(errno, std::generic_category(), "standard output");
 }
 
 void print_error(const std::string &message) {
+  wipe_progress();
   std::fputs(("orvalis: " + message + "\n").c_str(), stderr);
 }
 
