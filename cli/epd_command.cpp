@@ -1,86 +1,64 @@
 #include "cli/epd_command.h"
 
+#include <fmt/format.h>
 #include <orvalis.h>
-#include <utterance_stream.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <csignal>
+#include <filesystem>
 #include <limits>
 #include <memory>
-#include <new>
-#include <span>
+#include <stdexcept>
 #include <string>
+#include <system_error>
 #include <vector>
 
 #include "cli/audio_options.h"
-#include "cli/audio_source.h"
+#include "cli/detection.h"
 #include "cli/label_reports.h"
+#include "cli/output_file.h"
+#include "cli/progress.h"
 #include "cli/report.h"
+#include "cli/split_names.h"
+#include "cli/turns.h"
 
 namespace orvalis::cli {
 namespace {
 
 struct EpdOptions {
   std::vector<std::string> files;
-  AudioSettings audio;
-  UtteranceSettings detector = UTTERANCE_SETTINGS_DEFAULT;
+  DetectionSettings detection;
   std::string gain = "1";
   std::string format = "table";
-  bool frames = false;
+  std::string dump_folder;
+  std::size_t jobs = 1;
   bool log = false;
 };
 
-struct StreamCloser {
-  void operator()(UtteranceStream *stream) const { CloseUtteranceStream(stream); }
-};
+/// Reports when it is a job's turn.
+class ReportInTurn : public Report {
+public:
+  ReportInTurn(Report &report, Turn &turn) : report_(report), turn_(turn) {}
 
-struct EpdCloser {
-  void operator()(EpdInstance *epd) const { FreeMemoryEPD(epd); }
-};
-
-void report_utterances(AudioSource &source, const UtteranceSettings &settings, Report &report) {
-  const std::unique_ptr<UtteranceStream, StreamCloser> stream(OpenUtteranceStream(&settings));
-  if (!stream) throw std::bad_alloc();
-  const auto report_decided = [&] {
-    for (Utterance found; NextUtterance(stream.get(), &found) == 1;) report.utterance(found);
-  };
-  for (auto piece = source.read(); !piece.empty(); piece = source.read()) {
-    while (!piece.empty()) {
-      const auto taken =
-          PushUtteranceAudio(stream.get(), piece.data(), static_cast<std::int32_t>(piece.size()));
-      piece = piece.subspan(static_cast<std::size_t>(taken));
-      report_decided();
-    }
+  void begin_file(const std::string &name, int rate_hz) override {
+    turn_.act([name, rate_hz, &report = report_] { report.begin_file(name, rate_hz); });
   }
-  FlushUtteranceStream(stream.get());
-  report_decided();
-}
+  void utterance(const Utterance &found) override {
+    turn_.act([found, &report = report_] { report.utterance(found); });
+  }
+  void frame(std::int64_t number, int answer) override {
+    turn_.act([number, answer, &report = report_] { report.frame(number, answer); });
+  }
+  void end_file(std::int64_t samples) override {
+    turn_.act([samples, &report = report_] { report.end_file(samples); });
+  }
 
-void report_frames(AudioSource &source, const UtteranceSettings &settings, Report &report) {
-  const bool narrow_band = settings.rate_hz == 8000;
-  const std::size_t frame_length = narrow_band ? 80 : 160;
-  const std::int32_t mode = settings.input_gain * 10000 + (narrow_band ? 1000 : 0);
-  const std::unique_ptr<EpdInstance, EpdCloser> epd(InitializeEPD(mode, 0));
-  if (!epd) throw std::bad_alloc();
-
-  std::int64_t number = 0;
-  source.for_each_block(frame_length, [&](std::span<const std::int16_t> frame) {
-    const auto samples = static_cast<std::int32_t>(frame.size());
-    report.frame(number++,
-                 ProcessEPDFrameByCnttype(epd.get(), frame.data(), samples, settings.content_type));
-  });
-}
-
-void report_file(const std::string &name, const EpdOptions &options, Report &report) {
-  AudioSource source(name, options.audio);
-  UtteranceSettings settings = options.detector;
-  settings.rate_hz = source.rate_hz();
-  report.begin_file(name, settings.rate_hz);
-  (options.frames ? report_frames : report_utterances)(source, settings, report);
-  report.end_file(source.samples_read());
-  // Last, so that a damaged file still gives what could be decided.
-  source.check_complete();
-}
+private:
+  Report &report_;
+  Turn &turn_;
+};
 
 /// Ctrl-C ends whoever writes into the pipe as well: what was said last is then still reported, at
 /// the end of the input. A second Ctrl-C ends the tool.
@@ -93,7 +71,7 @@ std::unique_ptr<Report> make_report(const EpdOptions &options) {
   const std::string &format = options.format;
   if (format == "json") return make_json_report();
   if (format == "csv") return make_csv_report();
-  if (options.frames && format != "table")
+  if (options.detection.frames && format != "table")
     throw CLI::ValidationError("--frames", "the format " + format + " knows utterances only");
   if (format == "rttm") return make_rttm_report();
   if (several && format != "table")
@@ -103,23 +81,62 @@ std::unique_ptr<Report> make_report(const EpdOptions &options) {
   return make_table_report(several);
 }
 
+/// Folders are made before the work begins.
+void make_folder(const char *option, const std::filesystem::path &folder) {
+  std::error_code error;
+  std::filesystem::create_directories(folder, error);
+  if (!error && access(folder.c_str(), W_OK) != 0) error = {errno, std::generic_category()};
+  if (error)
+    throw std::runtime_error(fmt::format("{} {}: {}", option, folder.string(), error.message()));
+}
+
+void prepare_split(const EpdOptions &options) {
+  if (const std::string pair = same_parts(options.files); !pair.empty())
+    throw CLI::ValidationError("--split", pair + " would give files of the same names");
+  make_folder("--split", options.detection.split_folder);
+}
+
+void prepare_dump(EpdOptions &options) {
+  if (options.files.size() > 1)
+    throw CLI::ValidationError("--dump", "several files are given, but only one can be dumped");
+  if (SetDumpRoot(options.dump_folder.c_str()) != 0)
+    throw CLI::ValidationError("--dump", "the folder's name is too long");
+  make_folder("--dump", std::filesystem::path(options.dump_folder) / "sdcard/VRpreprocess");
+  options.detection.detector.pcm_dump = 1;
+}
+
 int run_epd(EpdOptions &options) {
   const auto inputs = std::ranges::count(options.files, "-");
   if (inputs > 1) throw CLI::ValidationError("FILE", "standard input can be read only once");
+  options.detection.detector.input_gain = options.gain == "0.25" ? 1 : options.gain == "4" ? 2 : 0;
+  const std::unique_ptr<Report> report = make_report(options);
+  if (!options.detection.split_folder.empty()) prepare_split(options);
+  if (!options.dump_folder.empty()) prepare_dump(options);
   if (inputs == 1) outlive_one_interrupt();
-  options.detector.input_gain = options.gain == "0.25" ? 1 : options.gain == "4" ? 2 : 0;
   if (!options.log) SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
 
-  const std::unique_ptr<Report> report = make_report(options);
   int status = 0;
-  for (const std::string &name : options.files) {
+  Progress progress;
+  run_in_turn(options.files.size(), options.jobs, [&](std::size_t job, Turn &turn) {
+    const std::string &name = options.files[job];
+    ReportInTurn in_turn(*report, turn);
+    const auto show = [&](const Advance &advance) {
+      if (turn.has_come() && !options.log) progress.update(advance);
+    };
+    const auto fail = [&](const std::exception &error) {
+      turn.act([&name, &status, message = std::runtime_error(error.what())] {
+        print_input_error(name, message);
+        status = 1;
+      });
+    };
     try {
-      report_file(name, options, *report);
+      detect(name, options.detection, in_turn, show);
     } catch (const AudioError &error) {
-      print_input_error(name, error);
-      status = 1;
+      fail(error);
+    } catch (const OutputError &error) {
+      fail(error);
     }
-  }
+  });
   return status;
 }
 
@@ -130,6 +147,11 @@ constexpr const char *kExamples = R"(Input:
   Several channels are averaged unless --channel picks one.
   "-" reads standard input: WAV (or AIFF, AU, Ogg), or with --raw samples alone.
   Each utterance is printed the moment it is decided.
+
+Files of utterances:
+  --split clips writes take.wav's utterances to clips/take-001.wav, clips/take-002.wav
+  and so on: the samples of the input with its rate, channels and sample format.
+  Standard input gives what the engine heard, as clips/stdin-001.wav and so on.
 
 Output:
   Times are seconds of the input. "start" and "end" are the borders of the
@@ -143,13 +165,16 @@ Output:
     rttm      SPEAKER lines for diarisation tools
 
 Exit status:
-  0 all files done; 1 a file could not be read (the others are done); 2 wrong usage.
+  0 all files done; 1 a file could not be read or split (the others are done); 2 wrong
+  usage.
 
 Examples:
   orvalis epd meeting.wav
   orvalis epd --format json --hangover 800 a.flac b.mp3
   orvalis epd --pad-before 200 --pad-after 300 --channel 2 call.wav
   orvalis epd --raw --rate 8000 line.raw
+  orvalis epd --split clips --pad-before 100 --pad-after 100 meeting.wav
+  orvalis epd --jobs 4 --format csv *.flac >all.csv
   orvalis epd --format labels take.wav >take.txt
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis epd --raw -)";
 
@@ -157,7 +182,7 @@ Examples:
 
 void add_epd_command(CLI::App &app, int &exit_status) {
   const auto options = std::make_shared<EpdOptions>();
-  UtteranceSettings &detector = options->detector;
+  UtteranceSettings &detector = options->detection.detector;
   const CLI::Validator milliseconds = from_to(0, 3600 * 1000);
 
   CLI::App *epd = app.add_subcommand("epd", "Find the utterances in audio files or live audio");
@@ -188,14 +213,33 @@ void add_epd_command(CLI::App &app, int &exit_status) {
       ->check(CLI::IsMember({"0.25", "1", "4"}).description(""))
       ->type_name("G")
       ->capture_default_str();
-  epd->add_flag("--frames", options->frames,
+  const CLI::Validator not_empty(
+      [](const std::string &text) { return std::string(text.empty() ? "the name is empty" : ""); },
+      "");
+  auto *split = epd->add_option("--split", options->detection.split_folder,
+                                "Write each utterance to a WAV file of its\nown in this folder")
+                    ->check(not_empty)
+                    ->type_name("DIR");
+  epd->add_flag("--force", options->detection.replace, "Replace files that are there already")
+      ->needs(split);
+  epd->add_flag("--frames", options->detection.frames,
                 "Print the answer to every frame of 10 ms\ninstead of utterances")
       ->excludes(hangover)
       ->excludes(before)
-      ->excludes(after);
-  epd->add_flag("--log", options->log, "Show the engine's log lines on standard error");
+      ->excludes(after)
+      ->excludes(split);
+  auto *jobs = epd->add_option("--jobs", options->jobs, "Files to work on at once")
+                   ->check(from_to(1, 256))
+                   ->type_name("N")
+                   ->capture_default_str();
+  epd->add_flag("--log", options->log, "Show the engine's log lines on standard error")
+      ->excludes(jobs);
+  epd->add_option("--dump", options->dump_folder,
+                  "Let the engine write its dump files below\nthis folder (of one file)")
+      ->check(not_empty)
+      ->type_name("DIR");
 
-  add_audio_options(*epd, options->audio);
+  add_audio_options(*epd, options->detection.audio);
   epd->callback([options, &exit_status] { exit_status = run_epd(*options); });
 }
 
