@@ -40,7 +40,8 @@ int exact_subtype(int format) {
   }
 }
 
-/// Reads a file a second time.
+/// Reads a file a second time, from excerpt to excerpt: where a seek leads to in a file that is
+/// compressed with losses is not certain to the sample.
 class FileExcerpts : public Excerpts {
 public:
   FileExcerpts(const std::string &name, const AudioSettings &settings, int engine_rate_hz)
@@ -53,16 +54,12 @@ public:
     const SF_INFO &info = source_.info;
     const int subtype = exact_subtype(info.format);
     OutputFile file(path, {info.samplerate, info.channels, SF_FORMAT_WAV | subtype}, replace);
-    const sf_count_t first = source_frame(start);
-    if (sf_seek(source_.file.get(), first, SEEK_SET) != first)
-      throw AudioError("the file cannot be read a second time");
-    const sf_count_t frames = source_frame(end) - first;
     if (subtype == SF_FORMAT_FLOAT)
-      copy<float>(frames, sf_readf_float, file);
+      copy<float>(source_frame(start), source_frame(end), sf_readf_float, file);
     else if (subtype == SF_FORMAT_DOUBLE)
-      copy<double>(frames, sf_readf_double, file);
+      copy<double>(source_frame(start), source_frame(end), sf_readf_double, file);
     else
-      copy<int>(frames, sf_readf_int, file);
+      copy<int>(source_frame(start), source_frame(end), sf_readf_int, file);
     file.commit();
   }
 
@@ -73,21 +70,25 @@ private:
   }
 
   template <class Sample>
-  void copy(sf_count_t frames, sf_count_t (*read)(SNDFILE *, Sample *, sf_count_t),
+  void copy(sf_count_t first, sf_count_t end, sf_count_t (*read)(SNDFILE *, Sample *, sf_count_t),
             OutputFile &file) {
     const auto channels = static_cast<std::size_t>(source_.info.channels);
     std::vector<Sample> samples(std::max<std::size_t>(1, 65536 / channels) * channels);
     const auto room = static_cast<sf_count_t>(samples.size() / channels);
-    while (frames > 0) {
-      const sf_count_t got = read(source_.file.get(), samples.data(), std::min(frames, room));
+    while (position_ < end) {
+      const bool inside = position_ >= first;
+      const sf_count_t left = (inside ? end : first) - position_;
+      const sf_count_t got = read(source_.file.get(), samples.data(), std::min(left, room));
       if (got <= 0) return;  // resampling may round the end of the input up
-      file.write(std::span<const Sample>(samples.data(), static_cast<std::size_t>(got) * channels));
-      frames -= got;
+      const auto values = static_cast<std::size_t>(got) * channels;
+      if (inside) file.write(std::span<const Sample>(samples.data(), values));
+      position_ += got;
     }
   }
 
   OpenAudio source_;
   int engine_rate_hz_;
+  sf_count_t position_ = 0;
 };
 
 /// Keeps what may still be asked for.

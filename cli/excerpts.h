@@ -19,7 +19,7 @@ public:
   /// No excerpt from now on starts before `sample`.
   virtual void forget_before(std::int64_t sample) = 0;
   /// Writes the audio from `start` to before `end`, in samples of what the engine heard, as WAV.
-  /// Throws OutputError, or AudioError if the input cannot be read again.
+  /// Excerpts come in order and do not overlap. Throws OutputError.
   virtual void write(std::int64_t start, std::int64_t end, const std::string &path,
                      bool replace) = 0;
 };

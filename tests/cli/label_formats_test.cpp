@@ -2,39 +2,32 @@
 #include <gtest/gtest.h>
 
 #include <filesystem>
-#include <nlohmann/json.hpp>
 #include <sstream>
 #include <string>
 #include <vector>
 
-#include "tests/support/child_process.h"
-#include "tests/support/temporary_folder.h"
+#include "tests/cli/tool.h"
 
 namespace orvalis::test {
 namespace {
 
-const std::string kRecording = ORVALIS_SPEECH_8K "/wav/all.wav";  // six utterances
 constexpr double kSeconds = 456912 / 8000.0;
 
 struct Span {
   double start, end;
 };
 
-class LabelFormats : public testing::Test {
+class LabelFormats : public Tool {
 protected:
-  std::string run(const std::string &arguments, int expected_status = 0) const {
-    ChildProcess child(ORVALIS_TOOL_PATH " epd " + arguments, folder_.path());
-    EXPECT_EQ(child.finish(), expected_status) << arguments << child.errors();
-    return child.output();
+  std::string labels(const std::string &arguments) const {
+    const Result result = run("epd " + arguments);
+    EXPECT_EQ(result.status, 0) << arguments << result.err;
+    return result.out;
   }
 
   std::vector<Span> utterances() const {
-    std::istringstream lines(run("--format json " + kRecording));
     std::vector<Span> found;
-    for (std::string line; std::getline(lines, line);) {
-      const auto fields = nlohmann::json::parse(line);
-      found.push_back({fields["start"], fields["end"]});
-    }
+    for (const Json &line : epd(kNarrow)) found.push_back({line["start"], line["end"]});
     EXPECT_EQ(found.size(), 6u);
     return found;
   }
@@ -47,8 +40,6 @@ protected:
       EXPECT_NEAR(found[i].end, expected[i].end, tolerance);
     }
   }
-
-  TemporaryFolder folder_;
 };
 
 /// Fields of a CSV line; quoted ones may hold commas and doubled quotes.
@@ -71,8 +62,8 @@ std::vector<std::string> csv_fields(const std::string &line) {
 
 TEST_F(LabelFormats, CsvHoldsEveryFieldAndAnyFileName) {
   const std::string name = folder_ / "two, \"three\".wav";
-  std::filesystem::copy(kRecording, name);
-  std::istringstream lines(run("--format csv '" + name + "'"));
+  std::filesystem::copy(kNarrow, name);
+  std::istringstream lines(labels("--format csv '" + name + "'"));
   std::string line;
   std::getline(lines, line);
   EXPECT_EQ(line, "file,number,start,end,duration,began,ended,open");
@@ -85,11 +76,11 @@ TEST_F(LabelFormats, CsvHoldsEveryFieldAndAnyFileName) {
     EXPECT_NEAR(std::stod(fields[4]), found.back().end - found.back().start, 1e-6);
   }
   expect_same(found, utterances());
-  EXPECT_EQ(run("--format csv --frames " + kRecording).find("file,frame,start,answer\n"), 0u);
+  EXPECT_EQ(labels("--format csv --frames " + kNarrow).find("file,frame,start,answer\n"), 0u);
 }
 
 TEST_F(LabelFormats, LabelsAreTabSeparated) {
-  std::istringstream lines(run("--format labels " + kRecording));
+  std::istringstream lines(labels("--format labels " + kNarrow));
   std::vector<Span> found;
   std::string label;
   for (Span span; lines >> span.start >> span.end && std::getline(lines, label);) {
@@ -100,7 +91,7 @@ TEST_F(LabelFormats, LabelsAreTabSeparated) {
 }
 
 TEST_F(LabelFormats, RttmNamesTheFileAndGivesDurations) {
-  std::istringstream lines(run("--format rttm " + kRecording));
+  std::istringstream lines(labels("--format rttm " + kNarrow));
   std::vector<Span> found;
   std::string type, file, na, speaker;
   int channel;
@@ -113,7 +104,7 @@ TEST_F(LabelFormats, RttmNamesTheFileAndGivesDurations) {
 }
 
 TEST_F(LabelFormats, TextGridCoversTheFileWithoutHoles) {
-  const std::string text = run("--format textgrid " + kRecording);
+  const std::string text = labels("--format textgrid " + kNarrow);
   EXPECT_EQ(text.find("File type = \"ooTextFile\"\nObject class = \"TextGrid\"\n"), 0u);
   // As Praat reads: the values in their order, whatever stands before them.
   std::vector<std::string> values;
@@ -141,9 +132,9 @@ TEST_F(LabelFormats, TextGridCoversTheFileWithoutHoles) {
 
 TEST_F(LabelFormats, OneFileFormatsRefuseSeveral) {
   for (const std::string format : {"labels", "textgrid"})
-    run("--format " + format + " " + kRecording + " " + kRecording, 2);
+    EXPECT_EQ(run("epd --format " + format + " " + kNarrow + " " + kNarrow).status, 2);
   for (const std::string format : {"labels", "textgrid", "rttm"})
-    run("--frames --format " + format + " " + kRecording, 2);
+    EXPECT_EQ(run("epd --frames --format " + format + " " + kNarrow).status, 2);
 }
 
 }  // namespace

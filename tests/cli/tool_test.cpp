@@ -1,76 +1,18 @@
-// The built tool as its users run it: command line in, text and exit status out.
+// What `orvalis epd` makes of its inputs and options.
 #include <gtest/gtest.h>
 
 #include <algorithm>
 #include <array>
-#include <fstream>
-#include <nlohmann/json.hpp>
 #include <sstream>
 #include <string>
 #include <vector>
 
+#include "tests/cli/tool.h"
 #include "tests/support/audio_file.h"
-#include "tests/support/child_process.h"
 #include "tests/support/recordings.h"
-#include "tests/support/temporary_folder.h"
 
 namespace orvalis::test {
 namespace {
-
-using Json = nlohmann::json;
-
-const std::string kWide = ORVALIS_SPEECH_16K "/cards/005.wav";
-const std::string kWideOpen = ORVALIS_SPEECH_16K "/cards/001.wav";  // ends in speech
-const std::string kNarrow = ORVALIS_SPEECH_8K "/wav/all.wav";       // six utterances
-constexpr std::size_t kWavHeader = 44;
-
-std::vector<Json> json_lines(const std::string &text) {
-  std::vector<Json> lines;
-  std::istringstream stream(text);
-  for (std::string line; std::getline(stream, line);) lines.push_back(Json::parse(line));
-  return lines;
-}
-
-class Tool : public testing::Test {
-protected:
-  struct Result {
-    int status;
-    std::string out, err;
-  };
-
-  static std::string command(const std::string &arguments) {
-    return ORVALIS_TOOL_PATH " " + arguments;
-  }
-
-  Result run(const std::string &arguments, const std::string &input = {}) const {
-    ChildProcess child(command(arguments), folder_.path());
-    child.write(input);
-    const int status = child.finish();
-    return {status, child.output(), child.errors()};
-  }
-
-  /// The utterances, of a run that must go well and quietly.
-  std::vector<Json> epd(const std::string &arguments, const std::string &input = {}) const {
-    const Result result = run("epd --format json " + arguments, input);
-    EXPECT_EQ(result.status, 0) << arguments;
-    EXPECT_EQ(result.err, "") << arguments;
-    return json_lines(result.out);
-  }
-
-  /// The same without the file's name.
-  std::vector<Json> unnamed(const std::string &arguments, const std::string &input = {}) const {
-    std::vector<Json> lines = epd(arguments, input);
-    for (Json &line : lines) line.erase("file");
-    return lines;
-  }
-
-  std::string write(const std::string &name, const std::string &bytes) const {
-    std::ofstream(folder_ / name, std::ios::binary) << bytes;
-    return folder_ / name;
-  }
-
-  TemporaryFolder folder_;
-};
 
 TEST_F(Tool, TableAndJsonTellTheSame) {
   const std::string files = kWide + " " + kNarrow + " " + kWideOpen;
@@ -122,6 +64,45 @@ TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
       doubled += samples.substr(i, 2) + samples.substr(i, 2);
     EXPECT_EQ(unnamed(raw + "--channels 2 -", doubled), expected);
   }
+}
+
+TEST_F(Tool, PiecesOnAPipeDoNotMatter) {
+  const auto expected = unnamed(kWide);
+  const std::string samples = read_file(kWide).substr(kWavHeader);
+  for (const std::size_t piece : {1, 7, 160, 1000}) {
+    ChildProcess child(command("epd --format json --raw -"), folder_.path());
+    for (std::size_t at = 0; at < samples.size(); at += 2 * piece)
+      child.write(samples.substr(at, 2 * piece));
+    EXPECT_EQ(child.finish(), 0);
+    auto found = json_lines(child.output());
+    for (Json &line : found) line.erase("file");
+    EXPECT_EQ(found, expected) << piece;
+  }
+}
+
+TEST_F(Tool, FormatsAreHeardAlike) {
+  const auto expected = epd(kWide);
+  Pcm clipped;
+  std::vector<float> plain, loud;
+  for (const short sample : load_recording(kWide)) {
+    plain.push_back(static_cast<float>(sample) / 32768);
+    loud.push_back(plain.back() * 64);
+    clipped.push_back(static_cast<short>(std::clamp(sample * 64, -32768, 32767)));
+  }
+  for (const int format : {SF_FORMAT_WAV | SF_FORMAT_FLOAT, SF_FORMAT_WAV | SF_FORMAT_PCM_24,
+                           SF_FORMAT_WAV | SF_FORMAT_PCM_U8, SF_FORMAT_FLAC | SF_FORMAT_PCM_16,
+                           SF_FORMAT_OGG | SF_FORMAT_VORBIS}) {
+    const std::string file = folder_ / "take";
+    write_audio(file, plain, 16000, 1, format);
+    const auto found = epd(file);
+    ASSERT_EQ(found.size(), expected.size()) << std::hex << format;
+    EXPECT_NEAR(found[0]["start"], expected[0]["start"], 0.1) << std::hex << format;
+    EXPECT_NEAR(found[0]["end"], expected[0]["end"], 0.3) << std::hex << format;
+  }
+  // Above full scale audio clips and does not wrap, just as if it had been clipped before.
+  write_audio(folder_ / "loud.wav", loud, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_FLOAT);
+  write_audio(folder_ / "clipped.wav", clipped, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
+  EXPECT_EQ(unnamed(folder_ / "loud.wav"), unnamed(folder_ / "clipped.wav"));
 }
 
 TEST_F(Tool, ChannelsAndRatesAreConverted) {
@@ -254,16 +235,36 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
 }
 
 TEST_F(Tool, WrongUsageEndsWith2) {
-  for (const std::string arguments :
-       {"", "unknown", "epd", "epd --unknown x", "epd --format xml x", "epd --gain 2 x",
-        "epd --hangover -1 x", "epd --pad-after 1.5 x", "epd --channel 0 x", "epd --rate 16000 x",
-        "epd --raw --rate 0 x", "epd --raw --rate fast x", "epd --raw --channels 0 x",
-        "epd --content-type -1 x", "epd --frames --hangover 9 x", "epd - -"}) {
+  for (const std::string arguments : {"",
+                                      "unknown",
+                                      "epd",
+                                      "epd --unknown x",
+                                      "epd --format xml x",
+                                      "epd --gain 2 x",
+                                      "epd --hangover -1 x",
+                                      "epd --pad-after 1.5 x",
+                                      "epd --channel 0 x",
+                                      "epd --rate 16000 x",
+                                      "epd --raw --rate 0 x",
+                                      "epd --raw --rate fast x",
+                                      "epd --raw --channels 0 x",
+                                      "epd --content-type -1 x",
+                                      "epd --frames --hangover 9 x",
+                                      "epd - -",
+                                      "epd --jobs 0 x",
+                                      "epd --jobs 2 --log x",
+                                      "epd --force x",
+                                      "epd --split '' x",
+                                      "epd --split d --frames x",
+                                      "epd --split d a/x.wav b/x.flac",
+                                      "epd --split d - stdin.wav",
+                                      "epd --dump d x y"}) {
     const Result result = run(arguments);
     EXPECT_EQ(result.status, 2) << arguments;
     EXPECT_EQ(result.out, "") << arguments;
     EXPECT_EQ(result.err.find("orvalis: "), 0U) << result.err;
   }
+  EXPECT_FALSE(std::filesystem::exists("d")) << "wrong usage is met before anything is made";
   const Result help = run("epd --help");
   EXPECT_EQ(help.status, 0);
   for (const char *word : {"--hangover", "--raw", "--channel", "arecord", "Exit status"})

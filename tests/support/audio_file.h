@@ -1,4 +1,4 @@
-// Audio files written whole, for tests.
+// Audio files written and read whole, for tests.
 #pragma once
 
 #include <sndfile.h>
@@ -30,6 +30,22 @@ void write_audio(const std::string &path, const std::vector<T> &samples, int rat
   else
     sf_write_short(file, samples.data(), count);
   sf_close(file);
+}
+
+struct Audio {
+  SF_INFO info{};
+  std::vector<double> samples;  // interleaved; of every sample format the exact values
+};
+
+inline Audio read_audio(const std::string &path) {
+  Audio audio;
+  SNDFILE *file = sf_open(path.c_str(), SFM_READ, &audio.info);
+  if (!file) throw std::runtime_error(path + ": " + sf_strerror(nullptr));
+  audio.samples.resize(static_cast<std::size_t>(audio.info.frames * audio.info.channels));
+  const auto read = sf_readf_double(file, audio.samples.data(), audio.info.frames);
+  sf_close(file);
+  if (read != audio.info.frames) throw std::runtime_error(path + ": cut short");
+  return audio;
 }
 
 }  // namespace orvalis::test

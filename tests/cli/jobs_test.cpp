@@ -1,0 +1,101 @@
+// `orvalis epd` on several files at once, and what a terminal sees of long work.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <regex>
+#include <string>
+
+#include "tests/cli/tool.h"
+
+namespace orvalis::test {
+namespace {
+
+using Jobs = Tool;
+
+TEST_F(Jobs, OrderIsThatOfTheFiles) {
+  // The long ones first, so that the others have to wait for them.
+  const std::string files = kNarrow + " missing.wav - " + kWide + " " + write("empty.wav", "") +
+                            " " + kNarrow + " " + kWideOpen + " 2>&1";
+  const std::string input = read_file(kWide);
+  for (const std::string options : {"", "--frames ", "--format json ", "--format csv "}) {
+    const Result one = run("epd " + options + files, input);
+    EXPECT_EQ(one.status, 1);
+    for (const std::string jobs : {"1", "2", "4", "99"}) {
+      const Result several = run("epd --jobs " + jobs + " " + options + files, input);
+      EXPECT_EQ(several.status, 1);
+      EXPECT_EQ(several.out, one.out) << jobs << options;
+    }
+  }
+}
+
+TEST_F(Jobs, WhoseTurnItIsPrintsLive) {
+  const std::string samples = read_file(kNarrow).substr(kWavHeader);
+  const std::string files = " " + kWide + " - " + kWideOpen;
+  ChildProcess child(command("epd --jobs 3 --raw --rate 8000" + files), folder_.path());
+  child.write(samples.substr(0, 2 * 8000 * 33 / 10));
+  EXPECT_TRUE(child.prints("\n-\nutterance     start       end  duration\n        1 "));
+  EXPECT_EQ(child.output().find(kWideOpen), std::string::npos);
+  EXPECT_EQ(child.finish(), 0);
+  EXPECT_NE(child.output().find("\n" + kWideOpen + "\n"), std::string::npos);
+}
+
+TEST_F(Jobs, OutputThatFailsEndsThemAll) {
+  const std::string files = kNarrow + " " + kWide + " " + kNarrow + " >/dev/full";
+  const Result full = run("epd --jobs 3 " + files);
+  EXPECT_EQ(full.status, 1);
+  EXPECT_EQ(full.err, "orvalis: standard output: No space left on device\n");
+}
+
+/// A terminal that only shows.
+class Terminal {
+public:
+  Terminal() : screen_(posix_openpt(O_RDWR | O_NOCTTY | O_NONBLOCK)) {
+    EXPECT_EQ(grantpt(screen_) + unlockpt(screen_), 0);
+    name_ = ptsname(screen_);
+    line_ = open(name_.c_str(), O_RDWR | O_NOCTTY);  // keeps what is shown until it is read
+  }
+  ~Terminal() {
+    close(line_);
+    close(screen_);
+  }
+  Terminal(const Terminal &) = delete;
+  Terminal &operator=(const Terminal &) = delete;
+
+  const std::string &name() const { return name_; }
+
+  std::string shown() const {
+    std::string text(4096, '\0');
+    text.resize(
+        static_cast<std::size_t>(std::max<ssize_t>(0, read(screen_, &text[0], text.size()))));
+    return text;
+  }
+
+private:
+  int screen_, line_;
+  std::string name_;
+};
+
+TEST_F(Jobs, LongWorkIsShownOnATerminalAndWiped) {
+  const Terminal terminal;
+  // A reader who pauses keeps the tool waiting, however quick it is.
+  const std::string slow = " | { sleep 1.2; cat; }";
+  const std::string frames = "epd --frames " + kNarrow;
+  ChildProcess shown(command(frames) + " 2>" + terminal.name() + slow, folder_.path());
+  EXPECT_EQ(shown.finish(), 0);
+  const std::string seen = terminal.shown();
+  EXPECT_TRUE(std::regex_search(
+      seen, std::regex("^\r\x1b\\[K *[0-9]+ %  0:00:[0-9]+  [0-9.]+ x real time  all.wav")))
+      << seen;
+  EXPECT_TRUE(seen.ends_with("all.wav\r\x1b[K")) << seen;
+
+  ChildProcess unseen(command(frames) + slow, folder_.path());
+  EXPECT_EQ(unseen.finish(), 0);
+  EXPECT_EQ(unseen.errors(), "");
+  run("epd " + kWide + " 2>" + terminal.name());
+  EXPECT_EQ(terminal.shown(), "") << "short work needs no line";
+}
+
+}  // namespace
+}  // namespace orvalis::test

@@ -1,0 +1,151 @@
+// The files that `orvalis epd` writes: utterances of their own, and the engine's dump files.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "tests/cli/tool.h"
+#include "tests/support/audio_file.h"
+#include "tests/support/recordings.h"
+
+namespace orvalis::test {
+namespace {
+
+namespace fs = std::filesystem;
+
+class Split : public Tool {
+protected:
+  static std::vector<std::string> names_in(const fs::path &folder) {
+    std::vector<std::string> names;
+    for (const auto &entry : fs::directory_iterator(folder))
+      names.push_back(entry.path().filename());
+    std::ranges::sort(names);
+    return names;
+  }
+
+  /// Splits an input and holds every part to its samples. `frames_per_s` counts them in `source`.
+  void expect_parts(const std::string &input, const std::string &stem, const Audio &source,
+                    int subtype, const std::string &bytes = {}) const {
+    SCOPED_TRACE(input);
+    const fs::path parts = folder_ / "new/parts";
+    const auto found = epd("--pad-before 33 --split " + parts.string() + " " + input, bytes);
+    ASSERT_GE(found.size(), 2u);
+    EXPECT_EQ(names_in(parts).size(), found.size());
+    for (std::size_t i = 0; i < found.size(); ++i) {
+      const Audio part = read_audio(parts / (stem + "-00" + std::to_string(i + 1) + ".wav"));
+      EXPECT_EQ(part.info.format, SF_FORMAT_WAV | subtype);
+      EXPECT_EQ(part.info.samplerate, source.info.samplerate);
+      ASSERT_EQ(part.info.channels, source.info.channels);
+      const auto value_at = [&](const char *moment) {
+        const double frame = found[i][moment].get<double>() * source.info.samplerate;
+        return source.samples.begin() + std::lround(frame) * source.info.channels;
+      };
+      EXPECT_EQ(part.samples, std::vector(value_at("start"), value_at("end")));
+    }
+    fs::remove_all(parts);
+  }
+};
+
+TEST_F(Split, PartsAreTheSourcesOwnSamples) {
+  const struct {
+    const char *name;
+    int rate_hz, channels, format, subtype_of_parts;
+  } kCases[] = {
+      {"mono.wav", 8000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16, SF_FORMAT_PCM_16},
+      {"stereo.wav", 44100, 2, SF_FORMAT_WAV | SF_FORMAT_PCM_16, SF_FORMAT_PCM_16},
+      {"fine.flac", 16000, 3, SF_FORMAT_FLAC | SF_FORMAT_PCM_24, SF_FORMAT_PCM_24},
+      {"coarse.au", 11025, 1, SF_FORMAT_AU | SF_FORMAT_PCM_S8, SF_FORMAT_PCM_U8},
+      {"companded.wav", 8000, 1, SF_FORMAT_WAV | SF_FORMAT_ULAW, SF_FORMAT_ULAW},
+      {"exact.wav", 48000, 1, SF_FORMAT_WAV | SF_FORMAT_DOUBLE, SF_FORMAT_DOUBLE},
+      {"lossy.ogg", 16000, 1, SF_FORMAT_OGG | SF_FORMAT_VORBIS, SF_FORMAT_FLOAT},
+  };
+  const Pcm speech = load_recording(kNarrow);
+  for (const auto &[name, rate_hz, channels, format, subtype] : kCases) {
+    std::vector<int> samples;
+    for (int frame = 0; frame < 12 * rate_hz; ++frame) {
+      const int sample = speech[static_cast<std::size_t>(frame * 8000LL / rate_hz)];
+      // What 16 bits do not hold differs from channel to channel.
+      for (int c = 0; c < channels; ++c)
+        samples.push_back(sample * 65536 + (frame + c) % 256 * 256);
+    }
+    const std::string file = folder_ / name;
+    write_audio(file, samples, rate_hz, channels, format);
+    expect_parts(file, fs::path(name).stem(), read_audio(file), subtype);
+  }
+}
+
+TEST_F(Split, PipesGiveWhatTheEngineHeard) {
+  // All of it, so that much can be forgotten on the way; and 8 kHz in two channels, of which one.
+  const std::string wav = read_file(kNarrow);
+  expect_parts("-", "stdin", read_audio(kNarrow), SF_FORMAT_PCM_16, wav);
+  expect_parts("- <" + kNarrow, "stdin", read_audio(kNarrow), SF_FORMAT_PCM_16);
+  std::string stereo;
+  for (std::size_t i = kWavHeader; i + 1 < wav.size(); i += 2)
+    stereo += std::string(2, '\0') + wav.substr(i, 2);
+  expect_parts("--raw --rate 8000 --channels 2 --channel 2 -", "stdin", read_audio(kNarrow),
+               SF_FORMAT_PCM_16, stereo);
+}
+
+TEST_F(Split, RawFilesAreCopiedAsTheyAre) {
+  const std::string file = write("all.raw", read_file(kNarrow).substr(kWavHeader));
+  expect_parts("--raw --rate 8000 " + file, "all", read_audio(kNarrow), SF_FORMAT_PCM_16);
+}
+
+TEST_F(Split, FilesThatAreThereAreReplacedOnlyByForce) {
+  const std::string parts = folder_ / "parts";
+  fs::create_directory(parts);
+  const std::string there = write("parts/all-002.wav", "a letter");
+  const Result refused = run("epd --split " + parts + " " + kNarrow + " " + kWide);
+  EXPECT_EQ(refused.status, 1);
+  EXPECT_EQ(refused.err,
+            "orvalis: " + kNarrow + ": " + there + ": the file exists; --force replaces it\n");
+  EXPECT_EQ(read_file(there), "a letter");
+  const std::vector<std::string> kept = {"005-001.wav", "all-001.wav", "all-002.wav"};
+  EXPECT_EQ(names_in(parts), kept) << "the other input is done";
+  EXPECT_EQ(refused.out.find("\n        2 "), std::string::npos) << "no part, no report";
+
+  EXPECT_EQ(epd("--force --split " + parts + " " + kNarrow).size(), 6u);
+  EXPECT_EQ(read_audio(there).info.samplerate, 8000);
+}
+
+TEST_F(Split, NothingHalfWrittenIsLeft) {
+  const std::string parts = folder_ / "parts";
+  // A part of 33484 bytes fits; the second has 98604.
+  ChildProcess child("(ulimit -f 128; " + command("epd --split " + parts + " " + kNarrow) + ")",
+                     folder_.path());
+  EXPECT_EQ(child.finish(), 1);
+  EXPECT_EQ(child.errors(),
+            "orvalis: " + kNarrow + ": " + parts + "/all-002.wav: File too large\n");
+  EXPECT_EQ(names_in(parts), std::vector<std::string>{"all-001.wav"});
+
+  for (const std::string option : {"--split", "--dump"}) {
+    const Result result = run("epd " + option + " " + kNarrow + " " + kWide);
+    EXPECT_EQ(result.status, 1) << "a file is no folder";
+    EXPECT_EQ(result.err.find("orvalis: " + option + " " + kNarrow), 0u) << result.err;
+    EXPECT_EQ(result.out, "");
+  }
+}
+
+TEST_F(Split, DumpsHoldWhatWasJudgedAndAnswered) {
+  for (const std::string frames : {"--frames ", ""}) {
+    const std::string root = folder_ / ("dump" + frames);
+    epd(frames + "--dump '" + root + "' " + kWide);
+    Pcm heard, answered;
+    for (const auto &name : names_in(root + "/sdcard/VRpreprocess")) {
+      const std::string file = root + "/sdcard/VRpreprocess/" + name;
+      (name.ends_with("_inputEPD.pcm") ? heard : answered) = load_recording(file);
+    }
+    Pcm expected = load_recording(kWide);
+    expected.resize(expected.size() / 160 * 160);
+    EXPECT_EQ(heard, expected);
+    const auto answers = epd("--frames " + kWide);
+    ASSERT_EQ(answered.size(), 160 * answers.size());
+    for (std::size_t i = 0; i < answered.size(); ++i)
+      ASSERT_EQ(answered[i] >= 1000, answers[i / 160]["answer"] == 1) << i;
+  }
+}
+
+}  // namespace
+}  // namespace orvalis::test
