@@ -1,6 +1,7 @@
 #!/bin/sh
-# Installs a build, moves the installation, and lets an outside program find it there with CMake and
-# with pkg-config. CMAKE and CC name the programs to use.
+# Installs a build, and makes its Debian package; lets an outside program find either with CMake and
+# with pkg-config where it was not made for: the one moved, the other unpacked below a root of its
+# own. CMAKE and CC name the programs to use.
 #   install_test.sh BUILD_FOLDER CONSUMER_FOLDER RECORDING    (raw 16-bit PCM, 16 kHz)
 set -eu
 build=$1
@@ -8,7 +9,6 @@ consumer=$2
 recording=$3
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
-installed=$work/moved
 
 # check WHAT WANTED GOT
 check() {
@@ -17,36 +17,51 @@ check() {
   exit 1
 }
 
-"$CMAKE" --install "$build" --prefix "$work/first" >"$work/log" || { cat "$work/log"; exit 1; }
-mv "$work/first" "$installed"
+# quietly COMMAND...
+quietly() {
+  "$@" >"$work/log" 2>&1 || { cat "$work/log"; exit 1; }
+}
 
-{
-  "$CMAKE" -S "$consumer" -B "$work/build" -DCMAKE_C_COMPILER="$CC" \
-    -DCMAKE_PREFIX_PATH="$installed" &&
-    "$CMAKE" --build "$work/build"
-} >"$work/log" 2>&1 || { cat "$work/log"; exit 1; }
+# check_installation NAME PREFIX
+check_installation() {
+  made=$work/made/$1
+  mkdir -p "$made"
+  quietly "$CMAKE" -S "$consumer" -B "$made" -DCMAKE_C_COMPILER="$CC" -DCMAKE_PREFIX_PATH="$2"
+  quietly "$CMAKE" --build "$made"
 
-pc=$(find "$installed" -name orvalis.pc)
-PKG_CONFIG_LIBDIR=$(dirname "$pc")
-export PKG_CONFIG_LIBDIR
-# Unquoted: flags are words.
-"$CC" "$consumer/consumer.c" $(pkg-config --cflags --libs orvalis) -o "$work/by_pkg_config"
+  pc=$(find "$2" -name orvalis.pc)
+  PKG_CONFIG_LIBDIR=$(dirname "$pc")
+  export PKG_CONFIG_LIBDIR
+  # Unquoted: flags are words.
+  "$CC" "$consumer/consumer.c" $(pkg-config --cflags --libs orvalis) -o "$made/by_pkg_config"
+  libraries=$(pkg-config --variable=libdir orvalis)
 
-answer='library 160705
+  answer='library 160705
 0.51 s to 2.25 s'
-LD_LIBRARY_PATH=$(pkg-config --variable=libdir orvalis)
-export LD_LIBRARY_PATH
-check "the consumer built by pkg-config" "$answer" "$("$work/by_pkg_config" <"$recording")"
-unset LD_LIBRARY_PATH
-check "the consumer built by CMake" "$answer" "$("$work/build/consumer" <"$recording")"
+  check "$1: the consumer built by pkg-config" "$answer" \
+    "$(LD_LIBRARY_PATH=$libraries "$made/by_pkg_config" <"$recording")"
+  check "$1: the consumer built by CMake" "$answer" "$("$made/consumer" <"$recording")"
+  check "$1: the tool" '1 0.510 2.250 1.740' \
+    "$("$2/bin/orvalis" epd --raw - <"$recording" | tail -n 1 | xargs)"
+}
 
-tool=$installed/bin/orvalis
-check "the tool" '1 0.510 2.250 1.740' \
-  "$("$tool" epd --raw - <"$recording" | tail -n 1 | xargs)"
+quietly "$CMAKE" --install "$build" --prefix "$work/first"
+mv "$work/first" "$work/moved"
+check_installation installed "$work/moved"
+
+quietly "$(dirname "$CMAKE")/cpack" -G DEB --config "$build/CPackConfig.cmake" -B "$work/package"
+package=$(find "$work/package" -maxdepth 1 -name '*.deb')
+quietly dpkg-deb -x "$package" "$work/root"
+check_installation packaged "$work/root/usr"
+# The C library and the tool's own libraries, found by dpkg-shlibdeps.
+for library in libc6 libsndfile1 libsamplerate0 libfmt; do
+  dpkg-deb -f "$package" Depends | grep -q "$library" ||
+    check "the package's dependency $library" present missing
+done
 
 # The manual page knows every option of the help.
-options=$("$tool" epd --help | grep -o -e '--[a-z][a-z-]*')
+options=$("$work/moved/bin/orvalis" epd --help | grep -o -e '--[a-z][a-z-]*')
 for option in $options; do
-  grep -qw -e "Fl ${option#-}" "$installed/share/man/man1/orvalis.1" ||
+  grep -qw -e "Fl ${option#-}" "$work/moved/share/man/man1/orvalis.1" ||
     check "$option in the manual page" described missing
 done
