@@ -2,7 +2,10 @@
 // energy and the number of words that their transcripts hold.
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <cstdio>
 #include <fstream>
+#include <iterator>
 #include <map>
 #include <string>
 #include <utility>
@@ -121,15 +124,33 @@ Span utterance_in_noise(const Pcm &speech, int32_t rate_hz, NoiseColour colour, 
   return found.size() == 1 ? Span{found[0].start_s - 1.5, found[0].end_s - 1.5} : Span{};
 }
 
+/// How far the utterances of a condition reach beyond the loud part of their recordings.
+struct Margins {
+  int recordings = 0;
+  std::vector<double> before_ms, after_ms;
+};
+
+void print(const char *condition, Margins &margins) {
+  std::printf("%-15s %2zu of %2d", condition, margins.before_ms.size(), margins.recordings);
+  for (auto *ms : {&margins.before_ms, &margins.after_ms}) {
+    std::ranges::sort(*ms);
+    if (ms->empty()) continue;
+    std::printf("  %6.0f %6.0f %6.0f", ms->front(), (*ms)[ms->size() / 2], ms->back());
+  }
+  std::printf("\n");
+}
+
 TEST(Recordings, EachSentenceIsOneUtteranceWhereItsWordsAre) {
   auto words = words_of("librivox/transcription");
   words.merge(words_of("cards/cards.transcription"));
   ASSERT_EQ(words.size(), 10u);
+  Margins margins[std::size(kConditions)];
   for (const auto &[name, count] : words) {
     const Pcm speech = speech_16k((name.size() == 3 ? "cards/" : "librivox/") + name + ".wav");
     const Span loud = energetic_range(speech, 16000, 0.005);
     const Span audible = active_range(speech, 16000, 40);
-    for (const auto &[condition, colour, below_db, start_slack_s, end_slack_s] : kConditions) {
+    for (std::size_t i = 0; i < std::size(kConditions); ++i) {
+      const auto &[condition, colour, below_db, start_slack_s, end_slack_s] = kConditions[i];
       SCOPED_TRACE(name + ", " + condition);
       const Span span = utterance_in_noise(speech, 16000, colour, below_db);
       EXPECT_LT(span.start_s, loud.start_s + start_slack_s);
@@ -138,8 +159,16 @@ TEST(Recordings, EachSentenceIsOneUtteranceWhereItsWordsAre) {
       EXPECT_LT(span.end_s, audible.end_s + 0.05);
       EXPECT_GT((span.end_s - span.start_s) / count, 0.18) << "seconds a word";
       EXPECT_LT((span.end_s - span.start_s) / count, 0.60) << "seconds a word";
+      ++margins[i].recordings;
+      if (span.end_s == span.start_s) continue;
+      margins[i].before_ms.push_back(1000 * (loud.start_s - span.start_s));
+      margins[i].after_ms.push_back(1000 * (span.end_s - loud.end_s));
     }
   }
+  std::printf(
+      "noise              found   before the words [ms]    after the words [ms]\n"
+      "                           least median   most    least median   most\n");
+  for (std::size_t i = 0; i < std::size(kConditions); ++i) print(kConditions[i].name, margins[i]);
 }
 
 TEST(Recordings, CommandsAndNumbersAreFoundAtBothRates) {
