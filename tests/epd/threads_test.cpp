@@ -21,6 +21,18 @@ std::vector<int64_t> answers_of(const Pcm &pcm) {
   }
   FreeMemoryEPD(epd);
 
+  // One microphone: two share a state in the process.
+  NsInstance *ns = InitializeDoNS(2, 1, 0);
+  const int64_t drc = InitializeDRC(16000, 0);
+  Pcm suppressed = pcm, scratch = pcm;
+  for (std::size_t at = 0; at + 160 <= pcm.size(); at += 160) {
+    answers.push_back(ProcessDoNSFrame(ns, &scratch[at], 160, &suppressed[at], 160));
+    answers.push_back(ProcessDRC(drc, &suppressed[at], 160));
+  }
+  FreeMemoryNS(ns);
+  FreeMemoryDRC(drc);
+  answers.insert(answers.end(), suppressed.begin(), suppressed.end());
+
   const UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   UtteranceStream *stream = OpenUtteranceStream(&settings);
   PushUtteranceAudio(stream, pcm.data(), static_cast<int32_t>(pcm.size()));
