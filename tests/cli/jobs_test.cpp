@@ -1,12 +1,14 @@
 // `orvalis epd` on several files at once, and what a terminal sees of long work.
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <unistd.h>
 
-#include <algorithm>
+#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <string>
+#include <thread>
 
 #include "tests/cli/tool.h"
 
@@ -52,7 +54,7 @@ TEST_F(Jobs, OutputThatFailsEndsThemAll) {
 /// A terminal that only shows.
 class Terminal {
 public:
-  Terminal() : screen_(posix_openpt(O_RDWR | O_NOCTTY | O_NONBLOCK)) {
+  Terminal() : screen_(posix_openpt(O_RDWR | O_NOCTTY)) {
     EXPECT_EQ(grantpt(screen_) + unlockpt(screen_), 0);
     name_ = ptsname(screen_);
     line_ = open(name_.c_str(), O_RDWR | O_NOCTTY);  // keeps what is shown until it is read
@@ -66,10 +68,15 @@ public:
 
   const std::string &name() const { return name_; }
 
+  /// What was shown since the last call; the system may need a moment to bring it here.
   std::string shown() const {
-    std::string text(4096, '\0');
-    text.resize(
-        static_cast<std::size_t>(std::max<ssize_t>(0, read(screen_, &text[0], text.size()))));
+    std::string text;
+    char piece[4096];
+    for (pollfd screen{screen_, POLLIN, 0}; poll(&screen, 1, 300) > 0;) {
+      const ssize_t got = read(screen_, piece, sizeof piece);
+      if (got <= 0) break;
+      text.append(piece, static_cast<std::size_t>(got));
+    }
     return text;
   }
 
@@ -102,6 +109,17 @@ TEST_F(Jobs, LongWorkIsShownOnATerminalAndWiped) {
   EXPECT_EQ(unseen.errors(), "");
   run("epd " + kWide + " 2>" + terminal.name());
   EXPECT_EQ(terminal.shown(), "") << "short work needs no line";
+
+  // The line gives way to what is printed on the same terminal.
+  ChildProcess live(command("epd --raw --rate 8000 - >") + terminal.name() + " 2>&1",
+                    folder_.path());
+  const std::string samples = read_file(kNarrow).substr(kWavHeader);
+  live.write(samples.substr(0, 16000));
+  std::this_thread::sleep_for(std::chrono::milliseconds(1200));
+  live.write(samples.substr(16000, 2 * 8000 * 23 / 10));
+  EXPECT_EQ(live.finish(), 0);
+  const std::string mixed = terminal.shown();
+  EXPECT_NE(mixed.find("  standard input\r\x1b[Kutterance     start"), std::string::npos) << mixed;
 }
 
 }  // namespace
