@@ -1,5 +1,5 @@
-// Elementary functions for tables that are made at compile time. Accurate to about 1e-16, so that
-// no rounding to 16 bits is ever in doubt.
+// Elementary functions for tables that are made at compile time. Accurate to about 1e-16 (exp_of
+// and exp2_of relative to their value), so that no rounding of a table is in doubt.
 #pragma once
 
 #include <array>
@@ -10,6 +10,7 @@
 namespace orvalis::constexpr_math {
 
 inline constexpr double kPi = 3.14159265358979323846;
+inline constexpr double kLn2 = 0.693147180559945309417;
 
 /// Taylor series of sine (first = 1) or cosine (first = 0) for |x| <= pi/4.
 constexpr double sine_series(double x, int first) {
@@ -116,7 +117,6 @@ constexpr double sqrt_of(double x) {
 
 /// Base-2 logarithm for x in 1..2, by the series of artanh.
 constexpr double log2_of(double x) {
-  constexpr double kLn2 = 0.693147180559945309417;
   const double z = (x - 1) / (x + 1);
   double power = z;
   double sum = 0;
@@ -126,6 +126,21 @@ constexpr double log2_of(double x) {
   }
   return 2 * sum / kLn2;
 }
+
+/// e^x for |x| <= 8, by its series for the magnitude: all terms are positive, nothing cancels.
+constexpr double exp_of(double x) {
+  if (x < 0) return 1 / exp_of(-x);
+  double term = 1;
+  double sum = 1;
+  for (int n = 1; n < 60; ++n) {
+    term *= x / n;
+    sum += term;
+  }
+  return sum;
+}
+
+/// 2^x for |x| <= 8.
+constexpr double exp2_of(double x) { return exp_of(x * kLn2); }
 
 /// Rounds half away from zero and clips to 16 bits.
 constexpr Word16 rounded_word16(double x) {
