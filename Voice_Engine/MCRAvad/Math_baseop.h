@@ -12,6 +12,11 @@
  *   ZOLT_L_pow2_plus    any Q           any Q    0.00017 of the value, and the rounding
  *   ZOLT_L_pow          Q15, Q31        Q15      0.00045 of the value above 1
  *   ZOLT_expintFix      Q12             Q32      0.0013
+ *   ZOLT_L_sin, _cos    Q22             Q31      0.0040
+ *   ZOLT_L_atan         Q11             Q22      0.00175
+ *   ZOLT_L_atan2        any             Q22      0.00186
+ *   ZOLT_L_cuberoot     Q31             Q31      63 units (3e-8)
+ *   ZOLT_L_root15       Q31             Q31      4 units (2e-9)
  *
  * Results saturate. No function here touches a flag. Three conditions print a line on standard
  * output and END THE PROCESS with exit status -1 (255 to a shell): a division by 0 in ZOLT_L64_div,
@@ -74,8 +79,51 @@ int64_t ZOLT_POLYVALFix(const int64_t *coefficients, int32_t x, int32_t n);
 
 /* a / b in Q10, truncated toward zero. Ends the process if b is 0. */
 int64_t ZOLT_L64_div(int64_t a, int64_t b);
+/* a * b in Q32, within |a| + |b| + 1 units as numbers in Q32, mostly too small: bit 0 of neither
+ * counts. Saturates, but where the upper halves alone leave the range and both factors are negative
+ * the result falls short of it. */
+int64_t ZOLT_L64_mult(int64_t a, int64_t b);
+/* a * b / 2^32, rounded down. */
+int64_t ZOLT_LL_mult_64a32(int64_t a, int32_t b);
+/* Root of an integer, rounded up where x is not below r * r + r with r the root rounded down, so 1
+ * for 0; at most INT32_MAX. Ends the process if x is negative. */
+int32_t ZOLT_L64_sqrt_Q0(int64_t x);
 /* |x|, INT64_MAX for INT64_MIN. */
 int64_t ZOLT_L64_abs(int64_t x);
+double ZOLT_abs_double(double x);
+/* Greatest common divisor of |a| and |b|, at most INT32_MAX; |a| if b is 0. */
+int32_t ZOLT_get_gcd(int32_t a, int32_t b);
+
+/* ---- Angles --------------------------------------------------------------------------------- */
+
+/* Sine and cosine in Q31 of any angle in Q22 radians, by table without interpolation. */
+int32_t ZOLT_L_sin(int32_t angle);
+int32_t ZOLT_L_cos(int32_t angle);
+/* Angle in Q22 radians of a tangent in Q11: the last tenth of a degree that is not above it. */
+int32_t ZOLT_L_atan(int32_t tangent);
+/* Angle of the point (x, y) in Q22 radians, -pi to pi; 0 for (0, 0). */
+int32_t ZOLT_L_atan2(int32_t y, int32_t x);
+
+/* Tangent of every tenth of a degree in Q11, the last that of 89.9999 degrees. */
+extern const int32_t ZOLT_atanList[901];
+/* sin(i / 256) in Q31. */
+extern const int32_t ZOLT_sinList[403];
+
+/* ---- Roots ---------------------------------------------------------------------------------- */
+
+/* x^(1/3), Q31 to Q31, with the sign of x. */
+int32_t ZOLT_L_cuberoot(int32_t x);
+/* The y of y^1.5 = x, which is x^(2/3), Q31 to Q31; with the sign of x below 0. */
+int32_t ZOLT_L_root15(int32_t x);
+
+/* Polynomials in t = const1 * m + const2 = 4 m - 3, in Q31 from t^0 on, for the cube root and the
+ * 1.5th root of a mantissa m in 1/2..1; and the roots of 1/2 and 1/4 in Q31. */
+extern const int32_t ZOLT_cuberoot_coeffs[8];
+extern const int32_t ZOLT_cuberoot_fraction[2];
+extern const int32_t ZOLT_root15_fraction[14];
+extern const int32_t ZOLT_root15_coeffs[2];
+extern const int32_t ZOLT_root15_const1;
+extern const int32_t ZOLT_root15_const2;
 
 /* ---- Windows: n values weighted in place ---------------------------------------------------- */
 

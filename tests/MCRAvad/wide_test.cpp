@@ -2,6 +2,7 @@
 // arithmetic gives, and by its size in double precision.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cmath>
 #include <vector>
 
@@ -55,6 +56,78 @@ TEST(Wide, QuotientInQ10) {
   EXPECT_EQ(ZOLT_L64_div(-1, 3), -341);
 }
 
+TEST(Wide, ProductInQ32) {
+  const std::vector<int64_t> values = operands(1500);
+  for (const int64_t a : values)
+    for (const int64_t b : values) {
+      const int64_t got = ZOLT_L64_mult(a, b);
+      const double truth = std::clamp(real(a) * (real(b) / 0x1p32), -range64, range64);
+      if ((a >> 32) * (b >> 32) < int64_t{1} << 31) {
+        const double unread = std::abs(real(a) / 0x1p32) + std::abs(real(b) / 0x1p32) + 1;
+        ASSERT_NEAR(real(got), truth, unread + std::abs(truth) * 1e-12) << a << " * " << b;
+      } else if (a > 0) {
+        ASSERT_EQ(got, INT64_MAX) << a << " * " << b;
+      }
+    }
+  constexpr int64_t one = int64_t{1} << 32;
+  EXPECT_EQ(ZOLT_L64_mult(3 * one / 2, -5 * one / 2), -15 * one / 4);
+  EXPECT_EQ(ZOLT_L64_mult(3, one), 2);  // bit 0 does not count
+  EXPECT_EQ(ZOLT_L64_mult(32768 * one, 65536 * one), INT64_MAX);
+  EXPECT_EQ(ZOLT_L64_mult(32768 * one, -65536 * one), INT64_MIN);
+  EXPECT_EQ(ZOLT_L64_mult(32768 * one, -65537 * one), INT64_MIN);
+  // Upper halves -46341 and -46341 leave the range: their product counts as its end, and the lower
+  // halves, twice a half, still take 2 * 46341 * 0.5 from it, each way.
+  const int64_t x = -46341 * one + one / 2;
+  EXPECT_EQ(ZOLT_L64_mult(x, x), INT64_MAX - 46341 * one + one / 4);
+}
+
+TEST(Wide, ProductWith32Bits) {
+  const std::vector<int64_t> values = operands(800);
+  for (const int64_t a : values)
+    for (const int64_t b : values) {
+      const auto factor = static_cast<int32_t>(b);
+      expect_floor(ZOLT_LL_mult_64a32(a, factor), bits(a) * bits(factor), real(a) * factor, 32);
+    }
+}
+
+TEST(Wide, Root) {
+  for (const int64_t operand : operands(200000)) {
+    if (operand < 0) continue;
+    const int64_t root = ZOLT_L64_sqrt_Q0(operand);
+    // Rounding up begins at r * r + r.
+    ASSERT_GE(operand, root * (root - 1));
+    if (root < INT32_MAX) {
+      ASSERT_LT(operand, std::max<int64_t>(root * (root + 1), 1));
+    }
+  }
+  const int64_t largest = INT32_MAX;
+  EXPECT_EQ(ZOLT_L64_sqrt_Q0(0), 1);
+  EXPECT_EQ(ZOLT_L64_sqrt_Q0(1), 1);
+  EXPECT_EQ(ZOLT_L64_sqrt_Q0(2), 2);
+  EXPECT_EQ(ZOLT_L64_sqrt_Q0(10 * 10 + 9), 10);
+  EXPECT_EQ(ZOLT_L64_sqrt_Q0(10 * 10 + 10), 11);
+  EXPECT_EQ(ZOLT_L64_sqrt_Q0(largest * largest), INT32_MAX);
+  EXPECT_EQ(ZOLT_L64_sqrt_Q0(INT64_MAX), INT32_MAX);
+}
+
+TEST(Wide, GreatestCommonDivisor) {
+  for (int32_t a = -60; a <= 60; ++a)
+    for (int32_t b = -60; b <= 60; ++b) {
+      int32_t divisor = 0;
+      for (int32_t d = 1; d <= 60; ++d)
+        if (a % d == 0 && b % d == 0) divisor = d;
+      EXPECT_EQ(ZOLT_get_gcd(a, b), a == 0 && b == 0 ? 0 : divisor) << a << ", " << b;
+    }
+  EXPECT_EQ(ZOLT_get_gcd(INT32_MIN, 3 << 20), 1 << 20);
+  EXPECT_EQ(ZOLT_get_gcd(INT32_MIN, INT32_MIN), INT32_MAX);
+  EXPECT_EQ(ZOLT_get_gcd(0, INT32_MIN), INT32_MAX);
+}
+
+TEST(WideDeathTest, RootOfNegative) {
+  EXPECT_FATAL(ZOLT_L64_sqrt_Q0(-1), 255,
+               "<Voice_Engine/MCRAvad/Math_baseop::1910s> sqrt error with negative input\n");
+}
+
 TEST(WideDeathTest, DivisionByZero) {
   EXPECT_FATAL(ZOLT_L64_div(1, 0), 255,
                "<Voice_Engine/MCRAvad/Math_baseop::1954>--Error with Division by 0\n");
@@ -63,6 +136,8 @@ TEST(WideDeathTest, DivisionByZero) {
 TEST(Wide, AbsoluteValue) {
   for (const int64_t x : operands(1000))
     EXPECT_EQ(ZOLT_L64_abs(x), x == INT64_MIN ? INT64_MAX : std::abs(x));
+  EXPECT_EQ(ZOLT_abs_double(-2.5), 2.5);
+  EXPECT_FALSE(std::signbit(ZOLT_abs_double(-0.0)));
 }
 
 TEST(Windows, Products) {
