@@ -8,6 +8,8 @@
 #include <memory>
 #include <vector>
 
+#include "Voice_Engine/MCRAvad/Math_baseop.h"
+#include "Voice_Engine/MCRAvad/noscale_fft_512p.h"
 #include "Voice_Engine/drc/dynamics_control.h"
 #include "Voice_Engine/epd/epd_instance.h"
 #include "Voice_Engine/epd/fixed_fft.h"
@@ -170,6 +172,25 @@ private:
   Sample buffer_[kSize] = {};
 };
 
+/// `function` of as many samples as a spectrum has bins.
+template <class Function>
+auto of_every_bin(Function function) {
+  return [function](const Word16 *x) {
+    for (int bin = 0; bin < 128; ++bin) benchmark::DoNotOptimize(function(x[bin]));
+  };
+}
+
+template <int kPoints, class FrameSpectrum>
+auto spectrum_by(FrameSpectrum frame_spectrum) {
+  return [frame_spectrum](const Word16 *x) {
+    Word32 re[kPoints];
+    Word32 im[kPoints];
+    frame_spectrum(x, 160, re, im);
+    benchmark::DoNotOptimize(re);
+    benchmark::DoNotOptimize(im);
+  };
+}
+
 /// The slowest frame by the median of several passes: what the audio costs, without the moments at
 /// which the machine turned to something else.
 template <class Subject>
@@ -231,6 +252,18 @@ void register_frame_costs() {
   measure("r_fft_ns", wide, Transformation([](Word16 *x) { r_fft_ns(x, 1); }));
   const auto float_fft = [](float *x) { r_fft(x, 1); };
   measure("r_fft", wide, Transformation<decltype(float_fft), float, 512>(float_fft));
+  measure("Noscale_FFT, 256 points", wide,
+          Transformation(spectrum_by<256>(Noscale_FFT_256p_Frame_64bit)));
+  measure("Noscale_FFT, 512 points", wide,
+          Transformation(spectrum_by<512>(Noscale_FFT_512p_Frame)));
+  measure("ZOLT_L_log, 128 times", wide,
+          Transformation(of_every_bin([](Word16 x) { return ZOLT_L_log(x & 0xFFFF); })));
+  measure("ZOLT_L_exp, 128 times", wide,
+          Transformation(of_every_bin([](Word16 x) { return ZOLT_L_exp(-0x8000 * x); })));
+  measure("ZOLT_L64_div, 128 times", wide, Transformation(of_every_bin([](Word16 x) {
+            return ZOLT_L64_div(int64_t{x} << 40, 0x12345678);
+          })));
+  measure("ZOLT_expintFix, 128 times", wide, Transformation(of_every_bin(ZOLT_expintFix)));
 }
 
 }  // namespace orvalis::bench

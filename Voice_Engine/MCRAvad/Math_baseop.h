@@ -10,7 +10,7 @@
  *   ZOLT_S_log          Q16 (unsigned)  Q11      0.00094
  *   ZOLT_L_exp          Q26             Q32      0.00017 of the value and 1 unit, always too small
  *   ZOLT_L_pow2_plus    any Q           any Q    0.00017 of the value, and the rounding
- *   ZOLT_L_pow          Q15, Q31        Q15      0.00045 of the value above 1
+ *   ZOLT_L_pow          Q15, Q31        Q15      0.00065 of the value and 1 unit
  *   ZOLT_expintFix      Q12             Q32      0.0013
  *   ZOLT_L_sin, _cos    Q22             Q31      0.0040
  *   ZOLT_L_atan         Q11             Q22      0.00175
@@ -72,7 +72,8 @@ extern const int32_t exp_coef_minus[19];
 /* E1(|x|) in Q32 of x in Q12: the integral of e^-t / t from |x| on. 0 counts as 1/4096. */
 int64_t ZOLT_expintFix(int32_t x);
 /* Horner's scheme: the value in Q32 after the first n of nine coefficients in Q32, highest power
- * first, at x in Q12. n counts as 1 below 1 and as 9 above 9. A product saturates, a sum wraps. */
+ * first, at x in Q12. All nine are read. n counts as 1 below 1 and as 9 above 9. A product
+ * saturates, a sum wraps. */
 int64_t ZOLT_POLYVALFix(const int64_t *coefficients, int32_t x, int32_t n);
 
 /* ---- 64 bits -------------------------------------------------------------------------------- */
