@@ -143,7 +143,7 @@ Word32 pow2(Word32 x, Word16 q, Word16 out_q, Lookup lookup) {
   const Word64 right = 30 - out_q - whole;
   if (right < 0) return MAX_32;  // the power is at least 2^30
   if (right == 0) return static_cast<Word32>(power);
-  return right > 32 ? 0 : static_cast<Word32>((power + (Word64{1} << (right - 1))) >> right);
+  return right > 31 ? 0 : static_cast<Word32>((power + (Word64{1} << (right - 1))) >> right);
 }
 
 Word64 exp_q32(Word32 x) {

@@ -73,6 +73,7 @@ TEST(Wide, Products) {
   EXPECT_EQ(ZOLT_L64_mult(3 * one_q32 / 2, -5 * one_q32 / 2), -15 * one_q32 / 4);
   EXPECT_EQ(ZOLT_L64_mult(3, one_q32), 2);  // bit 0 does not count
   EXPECT_EQ(ZOLT_L64_mult(32768 * one_q32, -65537 * one_q32), INT64_MIN);
+  EXPECT_EQ(ZOLT_L64_mult(32768 * one_q32, -65536 * one_q32 + 2), INT64_MIN + 65536);
   // Upper halves -46341 and -46341 leave the range: their product counts as its end, and the lower
   // halves, each a half, still take 46341 from it.
   const int64_t x = -46341 * one_q32 + one_q32 / 2;
