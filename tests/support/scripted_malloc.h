@@ -18,7 +18,7 @@ public:
   ScriptedMalloc &operator=(const ScriptedMalloc &) = delete;
 
   /// Whether this call gets memory.
-  bool grants() { return granted_ == kWithoutEnd || granted_-- > 0; }
+  bool grants() { return granted_ == kWithoutEnd || (granted_ > 0 && granted_-- > 0); }
 
   const int fill;
   static inline ScriptedMalloc *current = nullptr;
