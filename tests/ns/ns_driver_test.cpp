@@ -130,7 +130,7 @@ TEST_F(NsDriver, FollowsItsSteps) {
   const auto one_in = [&](int cases) { return random() % cases == 0; };
   const auto both = std::make_unique<S2chnsState>();
   std::array<int, 2> changed{};
-  for (int sequence = 0; sequence < 500; ++sequence) {
+  for (int sequence = 0; sequence < 150; ++sequence) {
     SCOPED_TRACE(sequence);
     const Mode &mode = one_of(kModes);
     const Word32 mics = one_in(3) ? one_of(kMicCounts) : 1 + static_cast<Word32>(random() % 2);
