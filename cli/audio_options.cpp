@@ -4,12 +4,12 @@ namespace orvalis::cli {
 
 CLI::Validator from_to(int least, int most) { return CLI::Range(least, most).description(""); }
 
-void add_audio_options(CLI::App &command, AudioSettings &settings) {
+CLI::Option *add_audio_options(CLI::App &command, AudioSettings &settings,
+                               const std::string &channel_text) {
   const CLI::Validator channels = from_to(1, 1024);  // what libsndfile takes
-  command
-      .add_option("--channel", settings.channel, "Channel to listen to, from 1 (default: the mean)")
-      ->check(channels)
-      ->type_name("N");
+  auto *channel = command.add_option("--channel", settings.channel, channel_text)
+                      ->check(channels)
+                      ->type_name("N");
   auto *raw =
       command.add_flag("--raw", settings.raw, "Input is 16-bit little-endian without a header");
   command.add_option("--rate", settings.raw_rate_hz, "Rate of raw input")
@@ -22,6 +22,7 @@ void add_audio_options(CLI::App &command, AudioSettings &settings) {
       ->type_name("N")
       ->capture_default_str()
       ->needs(raw);
+  return channel;
 }
 
 }  // namespace orvalis::cli

@@ -5,10 +5,11 @@
 
 #include <algorithm>
 #include <array>
-#include <cmath>
 #include <cstdio>
 #include <numeric>
 #include <sstream>
+
+#include "cli/word16.h"
 
 namespace orvalis::cli {
 namespace {
@@ -32,26 +33,25 @@ bool chunk_cut_short(SNDFILE *file) {
   return false;
 }
 
-/// Floating point to 16 bits: full scale is 32768, rounded to nearest, clipped.
-std::int16_t to_word16(float sample) {
-  if (std::isnan(sample)) return 0;
-  return static_cast<std::int16_t>(std::lrint(std::clamp(sample * 32768.0, -32768.0, 32767.0)));
-}
-
 }  // namespace
 
 AudioSource::AudioSource(const std::string &name, const AudioSettings &settings)
-    : audio_(open_audio(name, settings)), channel_(settings.channel) {
+    : audio_(open_audio(name, settings)),
+      channel_(settings.channel),
+      channels_(settings.pair ? 2 : 1) {
   const SF_INFO &info = audio_.info;
   if (channel_ > info.channels)
     throw AudioError(fmt::format("there is no channel {}, only {}", channel_, info.channels));
-  if (info.samplerate != 8000 && info.samplerate != 16000) {
+  if (settings.pair && info.channels != 2)
+    throw AudioError(fmt::format("two microphones are two channels, but there {} {}",
+                                 info.channels == 1 ? "is" : "are", info.channels));
+  if (info.samplerate != 16000 && (info.samplerate != 8000 || settings.wide_only)) {
     if (info.samplerate <= 0 || !src_is_valid_ratio(16000.0 / info.samplerate))
       throw AudioError(fmt::format("a rate of {} Hz cannot be converted", info.samplerate));
-    resampler_.emplace(info.samplerate, 16000);
+    resampler_.emplace(info.samplerate, 16000, static_cast<int>(channels_));
   }
-  const bool single = info.channels == 1 || channel_ > 0;
-  untouched_ = (info.format & SF_FORMAT_SUBMASK) == SF_FORMAT_PCM_16 && single && !resampler_;
+  const bool unmixed = info.channels == 1 || channel_ > 0 || settings.pair;
+  untouched_ = (info.format & SF_FORMAT_SUBMASK) == SF_FORMAT_PCM_16 && unmixed && !resampler_;
   // A header may claim any number of channels; no claim is worth more than 64 K values at a time.
   const int frames = std::clamp(info.samplerate / 100, 1, std::max(1, 65536 / info.channels));
   const auto values = static_cast<std::size_t>(frames) * static_cast<std::size_t>(info.channels);
@@ -63,22 +63,23 @@ std::span<const std::int16_t> AudioSource::read() {
   samples_.clear();
   // The resampler gives nothing until it has heard half the length of its filter.
   while (samples_.empty() && !ended_) ended_ = !(untouched_ ? read_untouched() : read_converted());
-  samples_read_ += static_cast<std::int64_t>(samples_.size());
+  samples_read_ += static_cast<std::int64_t>(samples_.size() / channels_);
   return samples_;
 }
 
 /// Reads into samples_ by way of the resampler and rounding; false at the end.
 bool AudioSource::read_converted() {
-  const bool more = read_mono();
+  const bool more = read_float();
   if (resampler_) {
     resampled_.clear();
-    resampler_->process(mono_, !more, resampled_);
+    resampler_->process(picked_, !more, resampled_);
   }
-  std::ranges::transform(resampler_ ? resampled_ : mono_, std::back_inserter(samples_), to_word16);
+  std::ranges::transform(resampler_ ? resampled_ : picked_, std::back_inserter(samples_),
+                         to_word16);
   return more;
 }
 
-/// Reads 16-bit samples of one channel into samples_; false at the end.
+/// Reads 16-bit samples of one channel, or a pair, into samples_; false at the end.
 bool AudioSource::read_untouched() {
   const auto channels = static_cast<std::size_t>(audio_.info.channels);
   const auto first = static_cast<std::size_t>(std::max(channel_, 1) - 1);
@@ -87,23 +88,28 @@ bool AudioSource::read_untouched() {
                      static_cast<sf_count_t>(interleaved16_.size() / channels));
   frames_read_ += frames;
   for (std::size_t i = 0; i < static_cast<std::size_t>(frames); ++i)
-    samples_.push_back(interleaved16_[i * channels + first]);
+    for (std::size_t c = 0; c < channels_; ++c)
+      samples_.push_back(interleaved16_[i * channels + first + c]);
   return frames > 0;
 }
 
-/// Reads into mono_; false at the end. Through float, which holds 24 bits exactly: libsndfile's own
-/// way to 16 bits truncates and does not scale float files.
-bool AudioSource::read_mono() {
+/// Reads into picked_; false at the end. Through float, which holds 24 bits exactly: libsndfile's
+/// own way to 16 bits truncates and does not scale float files.
+bool AudioSource::read_float() {
   const auto channels = static_cast<std::size_t>(audio_.info.channels);
   const sf_count_t frames = sf_readf_float(audio_.file.get(), interleaved_.data(),
                                            static_cast<sf_count_t>(interleaved_.size() / channels));
   frames_read_ += frames;
-  mono_.resize(static_cast<std::size_t>(frames));
-  for (std::size_t i = 0; i < mono_.size(); ++i) {
+  if (channels_ == 2) {
+    picked_.assign(interleaved_.begin(), interleaved_.begin() + 2 * frames);
+    return frames > 0;
+  }
+  picked_.resize(static_cast<std::size_t>(frames));
+  for (std::size_t i = 0; i < picked_.size(); ++i) {
     const float *frame = &interleaved_[i * channels];
-    mono_[i] = channel_ > 0
-                   ? frame[channel_ - 1]
-                   : std::accumulate(frame, frame + channels, 0.0F) / static_cast<float>(channels);
+    picked_[i] = channel_ > 0 ? frame[channel_ - 1]
+                              : std::accumulate(frame, frame + channels, 0.0F) /
+                                    static_cast<float>(channels);
   }
   return frames > 0;
 }

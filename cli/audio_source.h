@@ -1,4 +1,5 @@
-// Any audio file, or standard input, as the 16-bit mono samples that the engine takes.
+// Any audio file, or standard input, as the 16-bit samples that the engine takes: mono, or a pair
+// of microphones.
 #pragma once
 
 #include <algorithm>
@@ -21,7 +22,12 @@ public:
   /// Rate of the samples that read() returns: 8000 or 16000.
   int rate_hz() const { return resampler_ ? 16000 : audio_.info.samplerate; }
 
-  /// The next samples, about 10 ms, so that a live source is heard at once. Empty at the end.
+  /// The audio's own, before any conversion.
+  int source_rate_hz() const { return audio_.info.samplerate; }
+  int source_channels() const { return audio_.info.channels; }
+
+  /// The next samples, about 10 ms, so that a live source is heard at once. Empty at the end. Those
+  /// of a pair are interleaved.
   std::span<const std::int16_t> read();
 
   /// Hands all that is left to `take` in blocks of exactly `length` samples; a remainder is
@@ -41,7 +47,10 @@ public:
     }
   }
 
-  /// Samples that read() has returned so far.
+  /// Samples of the audio, of each channel, that were read so far.
+  std::int64_t source_frames_read() const { return frames_read_; }
+
+  /// Samples of each channel that read() has returned so far.
   std::int64_t samples_read() const { return samples_read_; }
 
   /// Whether the source can be read only once.
@@ -59,16 +68,17 @@ public:
 private:
   bool read_untouched();
   bool read_converted();
-  bool read_mono();
+  bool read_float();
 
   OpenAudio audio_;
   bool ended_ = false;
   bool untouched_ = false;  ///< 16-bit samples go to the engine as they are
   int channel_ = 0;
+  std::size_t channels_ = 1;  ///< That read() returns
   sf_count_t frames_read_ = 0;
   std::int64_t samples_read_ = 0;
   std::optional<Resampler> resampler_;
-  std::vector<float> interleaved_, mono_, resampled_;
+  std::vector<float> interleaved_, picked_, resampled_;
   std::vector<std::int16_t> interleaved16_, samples_;
 };
 

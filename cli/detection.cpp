@@ -6,17 +6,14 @@
 #include <memory>
 #include <new>
 #include <span>
+#include <utility>
+#include <vector>
 
 #include "cli/audio_source.h"
 #include "cli/excerpts.h"
-#include "cli/split_names.h"
 
 namespace orvalis::cli {
 namespace {
-
-struct StreamCloser {
-  void operator()(UtteranceStream *stream) const { CloseUtteranceStream(stream); }
-};
 
 struct EpdCloser {
   void operator()(EpdInstance *epd) const { FreeMemoryEPD(epd); }
@@ -25,7 +22,7 @@ struct EpdCloser {
 class Detection {
 public:
   Detection(const std::string &name, const DetectionSettings &settings, Report &report,
-            const std::function<void(const Advance &)> &advanced)
+            const Advanced &advanced)
       : name_(name),
         settings_(settings),
         source_(name, settings.audio),
@@ -48,36 +45,18 @@ public:
 
 private:
   void report_utterances() {
-    const std::unique_ptr<UtteranceStream, StreamCloser> stream(
-        OpenUtteranceStream(&settings_.detector));
-    if (!stream) throw std::bad_alloc();
     std::unique_ptr<Excerpts> excerpts;
-    if (!settings_.split_folder.empty())
+    if (!settings_.split.folder.empty())
       excerpts = make_excerpts(name_, settings_.audio, source_.rate_hz());
-
-    const auto take_decided = [&] {
-      for (Utterance found; NextUtterance(stream.get(), &found) == 1;) {
-        // First, so that what is reported is there.
-        if (excerpts)
-          excerpts->write(found.start, found.end,
-                          part_name(settings_.split_folder, name_, found.number),
-                          settings_.replace);
-        report_.utterance(found);
-      }
-      if (excerpts) excerpts->forget_before(EarliestUtteranceStart(stream.get()));
-    };
+    DetectorStage detector(name_, settings_.detector, settings_.split, std::move(excerpts),
+                           report_);
+    std::vector<std::int16_t> passed;
     for (auto piece = source_.read(); !piece.empty(); piece = source_.read()) {
-      if (excerpts) excerpts->hear(piece);
-      while (!piece.empty()) {
-        const auto taken =
-            PushUtteranceAudio(stream.get(), piece.data(), static_cast<std::int32_t>(piece.size()));
-        piece = piece.subspan(static_cast<std::size_t>(taken));
-        take_decided();
-      }
+      passed.clear();
+      detector.push(piece, passed);
       tell_advance();
     }
-    FlushUtteranceStream(stream.get());
-    take_decided();
+    detector.flush(passed);
   }
 
   void report_frames() {
@@ -97,24 +76,20 @@ private:
     });
   }
 
-  void tell_advance() const {
-    const std::chrono::duration<double> elapsed = Progress::Clock::now() - began_;
-    advanced_({name_, static_cast<double>(source_.samples_read()) / source_.rate_hz(),
-               source_.length_seconds(), elapsed.count()});
-  }
+  void tell_advance() const { advanced_(advance_of(name_, source_, began_)); }
 
   std::string name_;
   DetectionSettings settings_;
   AudioSource source_;
   Report &report_;
-  const std::function<void(const Advance &)> &advanced_;
+  const Advanced &advanced_;
   Progress::Clock::time_point began_ = Progress::Clock::now();
 };
 
 }  // namespace
 
 void detect(const std::string &name, const DetectionSettings &settings, Report &report,
-            const std::function<void(const Advance &)> &advanced) {
+            const Advanced &advanced) {
   Detection(name, settings, report, advanced).run();
 }
 

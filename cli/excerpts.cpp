@@ -129,8 +129,12 @@ bool can_be_read_again(const std::string &name) {
 
 std::unique_ptr<Excerpts> make_excerpts(const std::string &name, const AudioSettings &settings,
                                         int engine_rate_hz) {
-  if (!can_be_read_again(name)) return std::make_unique<HeardExcerpts>(engine_rate_hz);
+  if (!can_be_read_again(name)) return make_heard_excerpts(engine_rate_hz);
   return std::make_unique<FileExcerpts>(name, settings, engine_rate_hz);
+}
+
+std::unique_ptr<Excerpts> make_heard_excerpts(int rate_hz) {
+  return std::make_unique<HeardExcerpts>(rate_hz);
 }
 
 }  // namespace orvalis::cli

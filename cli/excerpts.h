@@ -29,4 +29,7 @@ public:
 std::unique_ptr<Excerpts> make_excerpts(const std::string &name, const AudioSettings &settings,
                                         int engine_rate_hz);
 
+/// Excerpts of what the engine heard, whatever that came from.
+std::unique_ptr<Excerpts> make_heard_excerpts(int rate_hz);
+
 }  // namespace orvalis::cli

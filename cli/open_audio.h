@@ -20,7 +20,9 @@ struct AudioSettings {
   bool raw = false;  ///< No header: 16-bit little-endian samples
   int raw_rate_hz = 16000;
   int raw_channels = 1;
-  int channel = 0;  ///< The one to listen to, from 1; 0 takes the mean of all
+  int channel = 0;         ///< The one to listen to, from 1; 0 takes the mean of all
+  bool pair = false;       ///< Two channels, which stay two
+  bool wide_only = false;  ///< 8 kHz is converted like other rates
 };
 
 struct SndfileCloser {

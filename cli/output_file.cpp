@@ -4,11 +4,14 @@
 #include <unistd.h>
 
 #include <fmt/format.h>
+
 #include <atomic>
 #include <cerrno>
 #include <cstdio>
 #include <filesystem>
 #include <system_error>
+
+#include "cli/protected_inputs.h"
 
 namespace orvalis::cli {
 namespace {
@@ -122,6 +125,7 @@ private:
 
 OutputFile::OutputFile(const std::string &path, const OutputFormat &format, bool replace)
     : path_(path), replace_(replace) {
+  if (is_protected(path)) throw OutputError(path + ": the file is an input");
   if (!replace && exists(path)) fail(EEXIST);
   bytes_ = std::make_unique<Bytes>(path);
   SF_INFO info{};

@@ -28,7 +28,8 @@ struct OutputFormat {
 /// committed. Without that it vanishes. Every method may throw OutputError.
 class OutputFile {
 public:
-  /// `replace`: a file of that name gives way. Otherwise it is refused, now and when committing.
+  /// `replace`: a file of that name gives way, unless it is an input. Otherwise it is refused, now
+  /// and when committing.
   OutputFile(const std::string &path, const OutputFormat &format, bool replace);
   ~OutputFile();
 

@@ -117,8 +117,12 @@ void print_error(const std::string &message) {
   std::fputs(("orvalis: " + message + "\n").c_str(), stderr);
 }
 
+void print_note(const std::string &name, const std::string &text) {
+  print_error(fmt::format("{}: {}", name == "-" ? "standard input" : name, text));
+}
+
 void print_input_error(const std::string &name, const std::exception &error) {
-  print_error(fmt::format("{}: {}", name == "-" ? "standard input" : name, error.what()));
+  print_note(name, error.what());
 }
 
 }  // namespace orvalis::cli

@@ -37,6 +37,9 @@ void print_line(const std::string &line);
 /// Writes "orvalis: ..." to standard error; there is nobody to tell if that fails.
 void print_error(const std::string &message);
 
+/// Tells standard error something about the input of that name.
+void print_note(const std::string &name, const std::string &text);
+
 /// Tells standard error what is wrong with the input of that name.
 void print_input_error(const std::string &name, const std::exception &error);
 

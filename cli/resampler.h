@@ -1,4 +1,4 @@
-// Mono audio from one sampling rate to another, piece by piece.
+// Audio from one sampling rate to another, piece by piece.
 #pragma once
 
 #include <memory>
@@ -11,7 +11,7 @@ namespace orvalis::cli {
 
 class Resampler {
 public:
-  Resampler(int from_hz, int to_hz);
+  Resampler(int from_hz, int to_hz, int channels = 1);
 
   /// Appends to `output` what can be said after `input`; `last` also draws out the filter's tail.
   void process(std::span<const float> input, bool last, std::vector<float> &output);
@@ -23,6 +23,7 @@ private:
 
   std::unique_ptr<SRC_STATE_tag, Deleter> state_;
   double ratio_;
+  std::size_t channels_;
 };
 
 }  // namespace orvalis::cli

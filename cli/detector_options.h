@@ -1,0 +1,43 @@
+// The options of commands that look for utterances: the detector's timing, the report, the files.
+#pragma once
+
+#include <utterance_stream.h>
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "cli/detector_stage.h"
+#include "cli/report.h"
+
+namespace orvalis::cli {
+
+/// Those that a single frame's answer does not know.
+struct UtteranceOptions {
+  CLI::Option *hangover, *pad_before, *pad_after, *split;
+};
+
+/// Adds --hangover, --pad-before, --pad-after, --content-type and --split.
+UtteranceOptions add_detector_options(CLI::App &command, UtteranceSettings &detector,
+                                      SplitSettings &split);
+
+/// Adds the option of that name with which the user picks a report. `format` holds the default.
+void add_report_option(CLI::App &command, const std::string &option, std::string &format);
+
+/// The report of that format on some inputs. Throws CLI::ValidationError, in the name of `option`,
+/// if it cannot describe as many.
+std::unique_ptr<Report> make_report(const std::string &format, const std::string &option,
+                                    std::size_t inputs);
+
+/// Refuses an empty name.
+CLI::Validator not_empty();
+
+/// Makes the folder for the utterances' files, before the work begins. Throws CLI::ValidationError
+/// if inputs would give files of the same names.
+void prepare_split(const SplitSettings &split, const std::vector<std::string> &inputs);
+
+/// Makes the folder that an option names, or throws.
+void make_folder(const std::string &option, const std::string &folder);
+
+}  // namespace orvalis::cli
