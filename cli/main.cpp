@@ -1,6 +1,8 @@
 // orvalis: the voice front end on the command line.
+#include <fcntl.h>
 #include <fmt/format.h>
 #include <orvalis.h>
+#include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <cerrno>
@@ -8,6 +10,7 @@
 #include <string>
 #include <system_error>
 
+#include "cli/enhance_commands.h"
 #include "cli/epd_command.h"
 #include "cli/query_commands.h"
 #include "cli/report.h"
@@ -23,8 +26,10 @@ std::string version() {
 
 int run(int argc, char **argv) {
   int exit_status = 0;
-  CLI::App app("Finds where people speak in audio: end-point detection with the Orvalis library.",
-               "orvalis");
+  CLI::App app(
+      "The Orvalis voice front end: finds where people speak in audio, takes noise from it,\n"
+      "levels it.",
+      "orvalis");
   app.require_subcommand(1);
   app.set_version_flag("--version", version());
   app.failure_message([](const CLI::App *, const CLI::Error &error) {
@@ -32,10 +37,13 @@ int run(int argc, char **argv) {
   });
   app.footer(
       "Examples:\n"
-      "  orvalis epd meeting.wav      the utterances of a recording\n"
-      "  orvalis energy meeting.wav   how loud every 20 ms of it are\n"
-      "  orvalis epd --help           all about the command epd");
+      "  orvalis epd meeting.wav                 the utterances of a recording\n"
+      "  orvalis denoise meeting.wav clean.wav   the recording without its noise\n"
+      "  orvalis process meeting.wav out.wav     all that a voice front end does to it\n"
+      "  orvalis energy meeting.wav              how loud every 20 ms of it are\n"
+      "  orvalis denoise --help                  all about the command denoise");
   orvalis::cli::add_epd_command(app, exit_status);
+  orvalis::cli::add_enhance_commands(app, exit_status);
   orvalis::cli::add_query_commands(app, exit_status);
   app.add_subcommand("version", "Print the versions of the tool and of the library")->callback([] {
     orvalis::cli::print_line(version());
@@ -49,9 +57,17 @@ int run(int argc, char **argv) {
   return exit_status;
 }
 
+/// Else a file that is opened would take the place of a closed stream, and what is printed there.
+void hold_standard_streams() {
+  int descriptor = open("/dev/null", O_RDONLY);
+  while (descriptor >= 0 && descriptor <= STDERR_FILENO) descriptor = open("/dev/null", O_RDONLY);
+  if (descriptor >= 0) close(descriptor);
+}
+
 }  // namespace
 
 int main(int argc, char **argv) {
+  hold_standard_streams();
   // A reader that leaves is met where the write fails, not by the end of the process.
   std::signal(SIGPIPE, SIG_IGN);
   // So is a limit on the size of files.
