@@ -123,6 +123,7 @@ CLI::App *add_command(CLI::App &app, const char *name, const char *summary, cons
                    "Inputs, \"-\" for standard input; then the output:\n"
                    "a file, a folder, or \"-\" for standard output")
       ->required()
+      ->option_text("REQUIRED")
       ->expected(2, std::numeric_limits<int>::max())
       ->type_name("");
   command->add_option("--format", options->format, "Format of the output (default: by its name)")

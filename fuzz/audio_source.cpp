@@ -37,7 +37,9 @@ orvalis::cli::AudioSettings settings_of(std::uint8_t byte) {
   return {.raw = byte % 4 == 3,
           .raw_rate_hz = kRates[byte / 4 % 4],
           .raw_channels = 1 + byte / 16 % 4,
-          .channel = byte / 64};
+          .channel = byte / 64,
+          .pair = byte % 8 == 6,
+          .wide_only = byte % 8 >= 6};
 }
 
 }  // namespace
@@ -46,12 +48,14 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   if (size == 0) return 0;
   const MemoryFile file(bytes + 1, size - 1);
   try {
-    orvalis::cli::AudioSource source(file.path(), settings_of(bytes[0]));
+    const auto settings = settings_of(bytes[0]);
+    orvalis::cli::AudioSource source(file.path(), settings);
     require(source.rate_hz() == 8000 || source.rate_hz() == 16000, "audio comes at 8 or 16 kHz");
     std::size_t heard = 0;
     while (heard < kMostSamples) {
       const auto samples = source.read();
       if (samples.empty()) break;
+      require(!settings.pair || samples.size() % 2 == 0, "pairs come whole");
       heard += samples.size();
     }
     if (heard < kMostSamples) source.check_complete();

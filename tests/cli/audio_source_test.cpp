@@ -47,6 +47,27 @@ TEST(AudioSource, SixteenBitsArriveUntouched) {
   EXPECT_EQ(read_all(folder / "stereo.flac"), std::vector<short>(65536, 0));
 }
 
+TEST(AudioSource, PairsAreTheirTwoChannels) {
+  const TemporaryFolder folder;
+  std::vector<short> pairs;
+  for (int i = 0; i < 30000; ++i)
+    pairs.push_back(static_cast<short>(9000 * std::sin(i * (i % 2 == 0 ? 0.01 : 0.013))));
+  for (const int rate : {16000, 8000, 44100}) {
+    for (const int format : {kWav16, kWavFloat}) {
+      write_audio(folder / "pairs.wav", pairs, rate, 2, format);
+      std::vector<short> expected;
+      const auto left = read_all(folder / "pairs.wav", {.channel = 1, .wide_only = true});
+      const auto right = read_all(folder / "pairs.wav", {.channel = 2, .wide_only = true});
+      ASSERT_NEAR(static_cast<double>(left.size()), 15000 * 16000.0 / rate, 1);
+      for (std::size_t i = 0; i < left.size(); ++i)
+        expected.insert(expected.end(), {left[i], right[i]});
+      EXPECT_EQ(read_all(folder / "pairs.wav", {.pair = true, .wide_only = true}), expected)
+          << rate;
+    }
+  }
+  EXPECT_EQ(AudioSource(folder / "pairs.wav", {.pair = true}).source_channels(), 2);
+}
+
 TEST(AudioSource, OtherFormatsAreRoundedAndClipped) {
   const TemporaryFolder folder;
   const float step = 1.0F / 32768;

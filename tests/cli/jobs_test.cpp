@@ -90,19 +90,21 @@ TEST_F(Jobs, LongWorkIsShownOnATerminalAndWiped) {
   // A reader who pauses keeps the tool waiting, however quick it is.
   const std::string slow = " | { sleep 1.2; cat; }";
   const std::string frames = "epd --frames " + kNarrow;
-  ChildProcess shown(command(frames) + " 2>" + terminal.name() + slow, folder_.path());
-  EXPECT_EQ(shown.finish(), 0);
-  const std::string seen = terminal.shown();
-  int percent = 0, seconds = 0, length = 0;
-  double speed = 0;
-  EXPECT_EQ(std::sscanf(seen.c_str(), "\r\x1b[K %d %%  0:00:%d  %lf x real time  all.wav%n",
-                        &percent, &seconds, &speed, &length),
-            3)
-      << seen;
-  EXPECT_GT(length, 0) << seen;
-  EXPECT_NEAR(percent, seconds / 57.114 * 100, 2.5);
-  EXPECT_GT(speed, 0);
-  EXPECT_TRUE(seen.ends_with("all.wav\r\x1b[K")) << seen;
+  for (const std::string &work : {frames, "denoise --keep-rate " + kNarrow + " -"}) {
+    ChildProcess shown(command(work) + " 2>" + terminal.name() + slow, folder_.path());
+    EXPECT_EQ(shown.finish(), 0);
+    const std::string seen = terminal.shown();
+    int percent = 0, seconds = 0, length = 0;
+    double speed = 0;
+    EXPECT_EQ(std::sscanf(seen.c_str(), "\r\x1b[K %d %%  0:00:%d  %lf x real time  all.wav%n",
+                          &percent, &seconds, &speed, &length),
+              3)
+        << seen;
+    EXPECT_GT(length, 0) << seen;
+    EXPECT_NEAR(percent, seconds / 57.114 * 100, 2.5);
+    EXPECT_GT(speed, 0);
+    EXPECT_TRUE(seen.ends_with("all.wav\r\x1b[K")) << seen;
+  }
 
   ChildProcess unseen(command(frames) + slow, folder_.path());
   EXPECT_EQ(unseen.finish(), 0);

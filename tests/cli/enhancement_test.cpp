@@ -1,0 +1,264 @@
+// What `orvalis denoise`, `level` and `process` make of audio.
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <map>
+
+#include "tests/cli/enhanced.h"
+
+namespace orvalis::test {
+namespace {
+
+constexpr std::size_t kDelayOfOne = 48, kDelayOfTwo = 160;
+
+TEST_F(Enhanced, DenoiseGivesTheEnginesFrames) {
+  Pcm mono = noisy_speech(), pairs = noisy_pairs();
+  // Frames that are not suppressed: silence in the middle. And a last one that is not whole.
+  std::fill_n(mono.begin() + 40000, 500, std::int16_t{0});
+  mono.resize(mono.size() - 71);
+  std::fill_n(pairs.begin() + 80000, 1000, std::int16_t{0});
+  pairs.resize(pairs.size() - 2 * 33);
+  EXPECT_EQ(through("denoise", mono), suppressed(mono, 1, 0, kDelayOfOne));
+  EXPECT_EQ(through("denoise --level 13 --mics 1 --no-align", mono), suppressed(mono, 1, 0, 0));
+  EXPECT_EQ(through("denoise --level 18", mono), suppressed(mono, 1, 2, kDelayOfOne));
+  EXPECT_NE(suppressed(mono, 1, 2, 0), suppressed(mono, 1, 0, 0));
+  const std::string two = "denoise --mics 2 --channels 2";
+  EXPECT_EQ(through(two, pairs), suppressed(pairs, 2, 0, kDelayOfTwo));
+  EXPECT_EQ(through(two + " --no-align", pairs), suppressed(pairs, 2, 0, 0));
+}
+
+TEST_F(Enhanced, LengthIsThatOfTheInput) {
+  const Pcm mono = noisy_speech(), pairs = noisy_pairs();
+  for (const int length : {0, 1, 47, 48, 159, 160, 161, 15999, 16000, 16001}) {
+    const Pcm part(mono.begin(), mono.begin() + length);
+    const Pcm part_of_pairs(pairs.begin(), pairs.begin() + 2 * length);
+    EXPECT_EQ(through("denoise", part), suppressed(part, 1, 0, kDelayOfOne)) << length;
+    EXPECT_EQ(through("denoise --no-align", part), suppressed(part, 1, 0, 0)) << length;
+    EXPECT_EQ(through("denoise --mics 2 --channels 2", part_of_pairs),
+              suppressed(part_of_pairs, 2, 0, kDelayOfTwo))
+        << length;
+    EXPECT_EQ(through("level", part), levelled(part)) << length;
+    const std::string file = wav("part.wav", part, 44100);
+    EXPECT_EQ(run("process --force --keep-rate " + file + " " + (folder_ / "out.wav")).status, 0);
+    EXPECT_EQ(read_audio(folder_ / "out.wav").samples.size(), part.size());
+  }
+}
+
+/// Mean power in dB from sample `from` to `to`.
+double power_db(const Pcm &samples, std::size_t from, std::size_t to) {
+  double sum = 0;
+  for (std::size_t i = from; i < to; ++i) sum += double(samples[i]) * samples[i];
+  return 10 * std::log10(sum / static_cast<double>(to - from));
+}
+
+TEST_F(Enhanced, NoiseFallsInPausesAndSilenceStays) {
+  const Pcm mono = noisy_speech(), pairs = noisy_pairs();
+  const struct {
+    const char *options;
+    const Pcm &input;
+    double least_db, most_db;
+  } kCases[] = {{"denoise", mono, 12, 14.5},
+                {"denoise --level 18", mono, 17, 20},
+                {"denoise --mics 2 --channels 2", pairs, 11, 15}};
+  for (const auto &[options, input, least_db, most_db] : kCases) {
+    const Pcm output = through(options, input);
+    const double fall =
+        power_db(mono, 16000, kPause - 1600) - power_db(output, 16000, kPause - 1600);
+    std::printf("%s: noise falls by %.1f dB\n", options, fall);
+    EXPECT_GE(fall, least_db) << options;
+    EXPECT_LE(fall, most_db) << options;
+  }
+  const Pcm silence(5000);
+  for (const std::string command : {"denoise", "denoise --level 18", "level"})
+    EXPECT_EQ(through(command, silence), silence) << command;
+  EXPECT_EQ(through("denoise --mics 2 --channels 2", Pcm(10000)), silence);
+}
+
+/// The lag of `late` behind `early` at which the two are most alike.
+int lag_of(const Pcm &late, const Pcm &early) {
+  constexpr int kMost = 200;
+  double best = 0;
+  int lag_of_best = -kMost - 1;
+  for (int lag = -kMost; lag <= kMost; ++lag) {
+    double sum = 0;
+    for (int i = kMost; i + kMost < std::min(std::ssize(late), std::ssize(early)); ++i)
+      sum += double(late[static_cast<std::size_t>(i + lag)]) * early[static_cast<std::size_t>(i)];
+    if (sum > best) {
+      best = sum;
+      lag_of_best = lag;
+    }
+  }
+  return lag_of_best;
+}
+
+TEST_F(Enhanced, OutputIsNoLaterThanInput) {
+  const Pcm mono = noisy_speech(), pairs = noisy_pairs();
+  const std::string two = "denoise --mics 2 --channels 2";
+  EXPECT_EQ(lag_of(through("denoise", mono), mono), 0);
+  EXPECT_EQ(lag_of(through("denoise --no-align", mono), mono), 48);
+  EXPECT_EQ(lag_of(through(two, pairs), mono), 0);
+  EXPECT_EQ(lag_of(through(two + " --no-align", pairs), mono), 160);
+  EXPECT_EQ(lag_of(through("level", mono), mono), 0);
+
+  // Speech at other rates: as it was recorded, and drawn out.
+  const Pcm narrow = load_recording(kNarrow);
+  const std::map<int, Pcm> speech = {
+      {8000, Pcm(narrow.begin(), narrow.begin() + 40001)},
+      {11025, Pcm(narrow.begin(), narrow.begin() + 40002)},
+      {44100, [&] {
+         Pcm samples;
+         for (std::size_t i = 0; i + 1 < 100003; ++i) {
+           const double at = static_cast<double>(i) * 160 / 441;
+           const auto left = static_cast<std::size_t>(at);
+           const double part = at - static_cast<double>(left);
+           samples.push_back(to_sample(mono[left] * (1 - part) + mono[left + 1] * part));
+         }
+         return samples;
+       }()}};
+  for (const auto &[rate_hz, samples] : speech) {
+    const std::string input = wav("in.wav", samples, rate_hz), output = folder_ / "out.wav";
+    for (const std::string command : {"denoise", "process"}) {
+      const Result kept = run(command + " --force --keep-rate " + input + " " + output);
+      EXPECT_EQ(kept.status, 0) << kept.err;
+      EXPECT_EQ(kept.err.find("written at"), std::string::npos);
+      EXPECT_EQ(read_audio(output).info.samplerate, rate_hz);
+      EXPECT_EQ(samples_in(output).size(), samples.size());
+      EXPECT_EQ(lag_of(samples_in(output), samples), 0) << command << rate_hz;
+    }
+    const Result converted = run("denoise --force " + input + " " + output);
+    EXPECT_EQ(converted.err, "orvalis: " + input + ": written at 16000 Hz, converted from " +
+                                 std::to_string(rate_hz) + " Hz (--keep-rate converts back)\n");
+    EXPECT_EQ(read_audio(output).info.samplerate, 16000);
+    EXPECT_NEAR(static_cast<double>(samples_in(output).size()),
+                static_cast<double>(samples.size()) * 16000 / rate_hz, 1);
+  }
+}
+
+TEST_F(Enhanced, EveryWayGivesTheSame) {
+  const Pcm mono = noisy_speech(), pairs = noisy_pairs();
+  const Pcm expected = suppressed(mono, 1, 0, kDelayOfOne);
+  for (const std::size_t piece : {1u, 7u, 1000u}) {
+    ChildProcess child(command("denoise --raw --format raw - -"), folder_.path());
+    // Single samples only to begin with: they take their time.
+    for (std::size_t at = 0; at < mono.size();) {
+      const std::size_t count = std::min(at < 5000 * piece ? piece : 1000, mono.size() - at);
+      child.write(bytes_of(mono).substr(2 * at, 2 * count));
+      at += count;
+    }
+    EXPECT_EQ(child.finish(), 0);
+    EXPECT_EQ(samples_of(child.output()), expected) << piece;
+  }
+
+  std::string inputs;
+  for (const std::string name : {"a.wav", "b.wav", "c.wav", "d.wav"})
+    inputs += wav(name, mono) + " ";
+  wav("p.wav", pairs, 16000, 2);
+  std::filesystem::create_directory(folder_ / "out");
+  for (const std::string jobs : {"1", "3"}) {
+    EXPECT_EQ(run("denoise --force --jobs " + jobs + " " + inputs + (folder_ / "out")).err, "");
+    for (const std::string &name : names_in(folder_ / "out"))
+      EXPECT_EQ(samples_in((folder_ / "out/") + name), expected) << name;
+    EXPECT_EQ(names_in(folder_ / "out").size(), 4u);
+  }
+
+  // The suppressor of two microphones is one: as if the files came one after the other.
+  const std::string pair = folder_ / "p.wav", other = wav("q.wav", pairs, 16000, 2);
+  const Result one_by_one =
+      run("denoise --mics 2 --jobs 2 " + pair + " " + other + " " + (folder_ / "out"));
+  EXPECT_EQ(
+      one_by_one.err,
+      "orvalis: with --mics 2 one file comes after the other: there is one such suppressor\n");
+  for (const std::string name : {"p.wav", "q.wav"})
+    EXPECT_EQ(samples_in((folder_ / "out/") + name), suppressed(pairs, 2, 0, kDelayOfTwo)) << name;
+}
+
+TEST_F(Enhanced, ChannelsNeedAWord) {
+  const Pcm mono = noisy_speech();
+  Pcm stereo, doubled;
+  for (const std::int16_t sample : mono) {
+    stereo.insert(stereo.end(), {static_cast<std::int16_t>(~sample), sample});
+    doubled.insert(doubled.end(), 2, sample);
+  }
+  const std::string file = wav("stereo.wav", stereo, 16000, 2), out = folder_ / "out.wav";
+  const std::string both = wav("both.wav", doubled, 16000, 2);
+  for (const std::string command : {"denoise ", "level ", "process "}) {
+    const Result refused = run(command + file + " " + out);
+    EXPECT_EQ(refused.status, 1);
+    for (const std::string offer : {"--mics 2", "--mix", "--channel N"})
+      EXPECT_EQ(refused.err.find(offer) == std::string::npos,
+                command == "level " && offer == "--mics 2")
+          << refused.err;
+    EXPECT_FALSE(std::filesystem::exists(out));
+  }
+  const Pcm expected = suppressed(mono, 1, 0, kDelayOfOne);
+  EXPECT_EQ(run("denoise --channel 2 " + file + " " + out).status, 0);
+  EXPECT_EQ(samples_in(out), expected);
+  EXPECT_EQ(run("denoise --force --mix " + both + " " + out).status, 0);
+  EXPECT_EQ(samples_in(out), expected);
+
+  const std::string three = wav("three.wav", Pcm(300), 16000, 3);
+  for (const std::string &wrong : {wav("mono.wav", mono), three}) {
+    const Result result = run("denoise --force --mics 2 " + wrong + " " + out);
+    EXPECT_EQ(result.status, 1);
+    EXPECT_NE(result.err.find("two microphones are two channels, but there "), std::string::npos);
+  }
+}
+
+/// What the tool says of samples at full scale.
+std::string clipping_note(const char *where, const Pcm &samples) {
+  const auto clipped = [](std::int16_t sample) { return sample == 32767 || sample == -32768; };
+  std::array<char, 100> text;
+  std::snprintf(
+      text.data(), text.size(), ": samples of the %s at full scale: %d, the first at %.3f s\n",
+      where, static_cast<int>(std::ranges::count_if(samples, clipped)),
+      static_cast<double>(std::ranges::find_if(samples, clipped) - samples.begin()) / 16000);
+  return text.data();
+}
+
+TEST_F(Enhanced, LevelTellsWhatIsLoudOrClipped) {
+  // A second of a tone that is not loud, then half a second of one that is and clips.
+  Pcm samples;
+  for (int i = 0; i < 24000; ++i)
+    samples.push_back(to_sample((i < 16000 ? 2000 : 40000) * std::sin(i * 0.1)));
+  const std::string file = wav("loud.wav", samples);
+  const Result result = run("level " + file + " -");
+  ASSERT_EQ(result.out.size(), kWavHeader + 2 * samples.size()) << "audio and nothing else";
+  EXPECT_EQ(samples_of(result.out.substr(kWavHeader)), levelled(samples));
+  const std::string name = "orvalis: " + file;
+  EXPECT_EQ(result.err, name + clipping_note("input", samples) + name +
+                            ": loud for 0.50 s, first at 1.00 s\n" + name +
+                            clipping_note("output", levelled(samples)));
+
+  samples.resize(16000);
+  EXPECT_EQ(run("level " + wav("quiet.wav", samples) + " " + (folder_ / "out.wav")).err, "");
+}
+
+TEST_F(Enhanced, ProcessIsDenoiseThenLevelThenEpd) {
+  const Pcm mono = noisy_speech();
+  const std::string file = wav("take.wav", mono), out = folder_ / "out.wav";
+  const std::string options = "--hangover 900 --pad-before 50 --pad-after 40 --content-type 2 ";
+  const Result result = run("process --level 18 --report json --split " + (folder_ / "parts ") +
+                            options + file + " " + out);
+  EXPECT_EQ(result.status, 0) << result.err;
+  const Pcm expected = levelled(suppressed(mono, 1, 2, kDelayOfOne));
+  EXPECT_EQ(samples_in(out), expected);
+  auto found = json_lines(result.out);
+  ASSERT_FALSE(found.empty());
+  for (std::size_t i = 0; i < found.size(); ++i) {
+    EXPECT_EQ(found[i]["file"], file);
+    const Pcm part = samples_in((folder_ / "parts/take-00") + std::to_string(i + 1) + ".wav");
+    EXPECT_EQ(part, Pcm(expected.begin() + found[i]["start_sample"].get<int>(),
+                        expected.begin() + found[i]["end_sample"].get<int>()));
+    found[i].erase("file");
+  }
+  EXPECT_EQ(found, unnamed(options + out));
+
+  // With the audio on standard output, the report goes where the notes go.
+  const Result plain = run("process " + file + " " + (folder_ / "plain.wav"));
+  const Result streamed = run("process --format raw " + file + " -");
+  EXPECT_EQ(samples_of(streamed.out), samples_in(folder_ / "plain.wav"));
+  EXPECT_EQ(streamed.err, plain.out + plain.err);
+}
+
+}  // namespace
+}  // namespace orvalis::test

@@ -1,0 +1,166 @@
+// The outputs of `orvalis denoise`, `level` and `process`: formats, streams, and what is never
+// lost.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <filesystem>
+
+#include "tests/cli/enhanced.h"
+
+namespace orvalis::test {
+namespace {
+
+namespace fs = std::filesystem;
+
+using Outputs = Enhanced;
+
+TEST_F(Outputs, FormatFollowsNameOrOption) {
+  const struct {
+    const char *name, *options;
+    int format;
+  } kCases[] = {{"a.wav", "", kWav16},
+                {"a.FLAC", "", SF_FORMAT_FLAC | SF_FORMAT_PCM_16},
+                {"a.aif", "", SF_FORMAT_AIFF | SF_FORMAT_PCM_16},
+                {"a.au", "", SF_FORMAT_AU | SF_FORMAT_PCM_16},
+                {"a.caf", "", SF_FORMAT_CAF | SF_FORMAT_PCM_16},
+                {"a.ogg", "", SF_FORMAT_OGG | SF_FORMAT_VORBIS},
+                {"a.opus", "", SF_FORMAT_OGG | SF_FORMAT_OPUS},
+                {"b", "--format flac ", SF_FORMAT_FLAC | SF_FORMAT_PCM_16},
+                {"b.wav", "--format au ", SF_FORMAT_AU | SF_FORMAT_PCM_16}};
+  const Pcm expected = levelled(load_recording(kWide));
+  for (const auto &[name, options, format] : kCases) {
+    const std::string file = folder_ / name;
+    EXPECT_EQ(run("level " + std::string(options) + kWide + " " + file).status, 0) << name;
+    EXPECT_EQ(read_audio(file).info.format, format) << name;
+    if ((format & SF_FORMAT_SUBMASK) == SF_FORMAT_PCM_16) {
+      EXPECT_EQ(samples_in(file), expected) << name;
+    }
+    EXPECT_EQ(read_audio(file).samples.size(), expected.size()) << name;
+  }
+  EXPECT_EQ(run("level " + kWide + " " + (folder_ / "a.raw")).status, 0);
+  EXPECT_EQ(samples_of(read_file(folder_ / "a.raw")), expected);
+
+  // Into a folder, inputs keep their names, with an ending that tells the format.
+  const std::string out = folder_ / "out";
+  fs::create_directory(out);
+  const std::string raw = write("r.raw", bytes_of(Pcm(1000, 99))), odd = write("x.s16", "1234");
+  EXPECT_EQ(run("level --raw " + raw + " " + odd + " - " + out).status, 0);
+  EXPECT_EQ(run("level --format flac " + kWide + " " + kWideOpen + " " + out).status, 0);
+  EXPECT_EQ(names_in(out),
+            (std::vector<std::string>{"001.flac", "005.flac", "r.raw", "stdin.wav", "x.wav"}));
+}
+
+TEST_F(Outputs, StreamsBeginBeforeTheInputEnds) {
+  const Pcm speech = load_recording(kWide);
+  ChildProcess child(command("denoise --raw - -"), folder_.path());
+  child.write(bytes_of(speech).substr(0, 16000));
+  EXPECT_TRUE(child.prints(std::string("WAVEfmt ")));
+  // All but a frame that is not whole and the delay.
+  for (int tries = 0; tries < 1000 && child.output().size() < 16000 - 2 * 208; ++tries)
+    std::this_thread::sleep_for(std::chrono::milliseconds(10));
+  EXPECT_GE(child.output().size(), 16000u - 2 * 208);
+  child.write(bytes_of(speech).substr(16000));
+  EXPECT_EQ(child.finish(), 0);
+
+  // What was streamed can be read as it comes, and once it is a file.
+  const std::string streamed = child.output();
+  EXPECT_EQ(samples_of(streamed.substr(kWavHeader)), through("denoise", speech));
+  const auto expected = unnamed("--raw -", streamed.substr(kWavHeader));
+  EXPECT_FALSE(expected.empty());
+  EXPECT_EQ(unnamed("-", streamed), expected);
+  EXPECT_EQ(unnamed(write("streamed.wav", streamed)), expected);
+}
+
+TEST_F(Outputs, NoFileIsLost) {
+  const std::string bytes = read_file(kWide), take = write("take.wav", bytes);
+  fs::create_symlink(take, folder_ / "soft.wav");
+  fs::create_hard_link(take, folder_ / "hard.wav");
+  for (const std::string command : {"denoise --force ", "level --force ", "process --force "}) {
+    const std::string dotted = (folder_ / "./take.wav"), soft = folder_ / "soft.wav";
+    for (const std::string &arguments :
+         {take + " " + take, take + " " + dotted, take + " " + soft, soft + " " + take,
+          take + " " + (folder_ / "hard.wav"), "- " + take + " <" + take, take + " - >>" + take,
+          take + " " + folder_.path().string()}) {
+      const Result refused = run(command + arguments);
+      EXPECT_EQ(refused.status, 1) << arguments;
+      EXPECT_NE(refused.err.find(": the file is an input\n"), std::string::npos) << refused.err;
+      EXPECT_EQ(read_file(take), bytes) << arguments;
+    }
+  }
+  // Nor by the output of another input, or as a part.
+  fs::create_directory(folder_ / "other");
+  const std::string other = write("other/take.wav", bytes);
+  fs::create_symlink(other, folder_ / "alias.wav");
+  const Result one_done =
+      run("level --force " + take + " " + (folder_ / "alias.wav") + " " + (folder_ / "other"));
+  EXPECT_EQ(one_done.err.find("orvalis: " + take + ": " + other + ": the file is an input\n"), 0u);
+  EXPECT_TRUE(fs::exists(folder_ / "other/alias.wav"));
+  EXPECT_EQ(read_file(other), bytes);
+  const std::string part = write("take-001.wav", bytes);
+  EXPECT_EQ(run("epd --force --split " + folder_.path().string() + " " + part + " " + take).status,
+            1);
+  EXPECT_EQ(read_file(part), bytes);
+
+  const std::string letter = write("letter.wav", "a letter");
+  const Result refused = run("denoise " + take + " " + letter);
+  EXPECT_EQ(refused.status, 1);
+  EXPECT_EQ(refused.err,
+            "orvalis: " + take + ": " + letter + ": the file exists; --force replaces it\n");
+  EXPECT_EQ(read_file(letter), "a letter");
+  EXPECT_EQ(run("denoise --force " + take + " " + letter).status, 0);
+  EXPECT_EQ(read_audio(letter).info.samplerate, 16000);
+}
+
+TEST_F(Outputs, NothingHalfWrittenIsLeft) {
+  const std::string out = folder_ / "out/";
+  fs::create_directory(out);
+  const std::string take = write("take.wav", read_file(kWide));
+  const std::string cut = write("cut.wav", read_file(kWide).substr(0, 20000));
+  for (const std::string command_name : {"denoise ", "level ", "process "}) {
+    for (const std::string name : {"a.wav", "a.raw", "a.flac"}) {
+      ChildProcess child(
+          "(ulimit -f 8; " + command(command_name + take + " " + out + name) + " >/dev/null)",
+          folder_.path());
+      EXPECT_EQ(child.finish(), 1);
+      EXPECT_NE(child.errors().find(": " + out + name + ": File too large\n"), std::string::npos)
+          << child.errors();
+    }
+    EXPECT_EQ(run(command_name + cut + " " + out + "a.wav").status, 1) << "half an input";
+    EXPECT_EQ(run(command_name + take + " " + out + "missing/a.wav").status, 1);
+    EXPECT_TRUE(fs::is_empty(out)) << command_name;
+
+    const Result full = run(command_name + take + " - >/dev/full");
+    EXPECT_EQ(full.status, 1);
+    EXPECT_EQ(full.err, "orvalis: standard output: No space left on device\n");
+    EXPECT_EQ(run(command_name + "--force " + take + " /dev/full").err,
+              "orvalis: " + take + ": /dev/full: No space left on device\n");
+    EXPECT_EQ(run(command_name + take + " - >&-").status, 1);
+    EXPECT_EQ(run(command_name + take + " - | true").err, "");
+  }
+  // Where standard error is closed, no note may find its way into the output.
+  const std::string noted = "level --raw --rate 8000 - " + out;
+  EXPECT_NE(run(noted + "a.raw", "some samples").err, "");
+  EXPECT_EQ(run(noted + "b.raw 2>&-", "some samples").status, 0);
+  EXPECT_EQ(read_file(out + "a.raw"), read_file(out + "b.raw"));
+}
+
+TEST_F(Outputs, WrongUsageEndsWith2) {
+  fs::create_directory(folder_ / "d");
+  for (const std::string options :
+       {"", "x", "x y", "x y z", "x out.txt", "x - --format flac", "- - d", "a/x.wav b/x.wav d",
+        "a/x.mp3 b/x.wav d", "--format mp4 x y.wav", "--level 14 x y.wav", "--mics 3 x y.wav",
+        "--mics 2 --mix x y.wav", "--mics 2 --channel 1 x y.wav", "--mics 2 --level 18 x y.wav",
+        "--mix --channel 1 x y.wav", "--jobs 0 x y.wav", "--rate 8000 x y.wav"}) {
+    ChildProcess child("cd " + folder_.path().string() + "; " + command("denoise " + options),
+                       folder_.path());
+    EXPECT_EQ(child.finish(), 2) << options;
+    EXPECT_EQ(child.errors().find("orvalis: "), 0U) << child.errors();
+  }
+  for (const std::string arguments :
+       {"level --mics 2 x y.wav", "process --report xml x y.wav", "level --report json x y.wav",
+        "process --no-align x y.wav", "process --split '' x y.wav"})
+    EXPECT_EQ(run(arguments).status, 2) << arguments;
+}
+
+}  // namespace
+}  // namespace orvalis::test
