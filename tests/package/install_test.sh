@@ -60,8 +60,15 @@ for library in libc6 libsndfile1 libsamplerate0 libfmt; do
 done
 
 # The manual page knows every option of the help.
-options=$("$work/moved/bin/orvalis" epd --help | grep -o -e '--[a-z][a-z-]*')
-for option in $options; do
-  grep -qw -e "Fl ${option#-}" "$work/moved/share/man/man1/orvalis.1" ||
-    check "$option in the manual page" described missing
+commands=$("$work/moved/bin/orvalis" --help | sed -n '/^Subcommands:/,/^$/s/^  \([a-z][a-z]*\).*/\1/p')
+check "the commands" "epd denoise level process energy spectrum version" "$(echo $commands)"
+for command in $commands; do
+  options=$("$work/moved/bin/orvalis" "$command" --help | sed -n '/^Options:/,/^$/p' |
+    grep -o -e '--[a-z][a-z-]*')
+  for option in $options; do
+    grep -qw -e "It .*Fl ${option#-}" "$work/moved/share/man/man1/orvalis.1" ||
+      check "$option of $command in the manual page" described missing
+  done
+  grep -qw -e "Cm .*$command" "$work/moved/share/man/man1/orvalis.1" ||
+    check "$command in the manual page" described missing
 done
