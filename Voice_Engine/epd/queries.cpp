@@ -24,7 +24,7 @@ Word32 block_energy_db(const Word16 *x, Word32 n) {
 }
 
 Word32 largest_energy_db(const Word16 *x, Word32 n, Word32 rate_hz) {
-  const auto block = static_cast<Word32>(rate_hz * 0.02);
+  const Word32 block = energy_block_samples(rate_hz);
   if (block < 1) return 0;
   Word32 largest = 0;
   for (Word64 at = 0; at < n; at += block)

@@ -8,6 +8,11 @@ namespace orvalis {
 /// 10 log10 of the variance of n samples, truncated to whole dB, at least 0.
 Word32 block_energy_db(const Word16 *x, Word32 n);
 
+/// Samples of a block of 20 ms; below 1 where a rate is too low to have one.
+constexpr Word32 energy_block_samples(Word32 rate_hz) {
+  return static_cast<Word32>(rate_hz * 0.02);
+}
+
 /// The largest block_energy_db over blocks of 20 ms; the last one is read whole. 0 where n or the
 /// block length is below 1.
 Word32 largest_energy_db(const Word16 *x, Word32 n, Word32 rate_hz);

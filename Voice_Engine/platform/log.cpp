@@ -1,5 +1,6 @@
 #include "Voice_Engine/platform/log.h"
 
+#include <atomic>
 #include <cstdarg>
 #include <cstdio>
 
@@ -15,19 +16,15 @@ void write_to_standard_error(int priority, const char *tag, const char *text, vo
   std::fprintf(stderr, "%c/%s: %s\n", letter, tag, text);
 }
 
-struct Destination {
-  LogSink sink;
-  void *user;
-};
-
-constexpr Destination kStandardError = {write_to_standard_error, nullptr};
-
-constinit Destination destination = kStandardError;
+// Atomic one by one, so that a host whose sinks need no user may change them at any time.
+constinit std::atomic<LogSink> current_sink = write_to_standard_error;
+constinit std::atomic<void *> current_user = nullptr;
 
 }  // namespace
 
 void set_log_sink(LogSink sink, void *user) {
-  destination = sink != nullptr ? Destination{sink, user} : kStandardError;
+  current_user.store(user, std::memory_order_relaxed);
+  current_sink.store(sink != nullptr ? sink : write_to_standard_error, std::memory_order_release);
 }
 
 void log_line(int priority, const char *tag, const char *format, ...) {
@@ -38,7 +35,8 @@ void log_line(int priority, const char *tag, const char *format, ...) {
 #else
   char text[256];
   std::vsnprintf(text, sizeof text, format, arguments);
-  destination.sink(priority, tag, text, destination.user);
+  const LogSink sink = current_sink.load(std::memory_order_acquire);
+  sink(priority, tag, text, current_user.load(std::memory_order_relaxed));
 #endif
   va_end(arguments);
 }

@@ -1,0 +1,165 @@
+package com.zentq.tqe.phonoweave;
+
+import java.util.ArrayList;
+import java.util.List;
+
+/**
+ * Finds utterances in audio that comes in pieces of any length. No result depends on how the audio
+ * was cut.
+ *
+ * <pre>{@code
+ * try (EndPointDetector detector = EndPointDetector.at(16000).hangoverMillis(800).open()) {
+ *   for (short[] piece = read(); piece != null; piece = read()) {
+ *     detector.push(piece).forEach(System.out::println);
+ *   }
+ *   detector.flush().forEach(System.out::println);
+ * }
+ * }</pre>
+ *
+ * <p><b>Threads.</b> Any thread may call; calls on one detector wait for each other. A detector that
+ * is forgotten rather than closed is released when another one is made.
+ */
+public final class EndPointDetector implements AutoCloseable {
+  /** Settings of a detector. Times are milliseconds from 0 on. */
+  public static final class Settings {
+    private final int rateHz;
+    private int inputGain;
+    private int contentType;
+    private int hangoverMillis = 500;
+    private int padBeforeMillis;
+    private int padAfterMillis;
+
+    private Settings(int rateHz) {
+      if (rateHz != 16000 && rateHz != 8000) {
+        throw new IllegalArgumentException("the rate is 16000 or 8000, not " + rateHz);
+      }
+      this.rateHz = rateHz;
+    }
+
+    /** 0 takes the input as it is, 1 divides it by 4, 2 multiplies it by 4 (wrapping around). */
+    public Settings inputGain(int code) {
+      if (code < 0 || code > 2) {
+        throw new IllegalArgumentException("the input gain is 0, 1 or 2, not " + code);
+      }
+      inputGain = code;
+      return this;
+    }
+
+    /** Timing: 0 and 1 are patient; 2 and more are quicker and refuse short sounds. */
+    public Settings contentType(int type) {
+      contentType = type;
+      return this;
+    }
+
+    /** Longest silence that joins what is before and after it; 500 unless set. */
+    public Settings hangoverMillis(int millis) {
+      hangoverMillis = checkTime(millis);
+      return this;
+    }
+
+    /** Time to add before an utterance; 0 unless set. Padding never crosses a neighbour. */
+    public Settings padBeforeMillis(int millis) {
+      padBeforeMillis = checkTime(millis);
+      return this;
+    }
+
+    /** Time to add after an utterance; 0 unless set. */
+    public Settings padAfterMillis(int millis) {
+      padAfterMillis = checkTime(millis);
+      return this;
+    }
+
+    /**
+     * Opens a detector.
+     *
+     * @throws IllegalStateException if memory runs out
+     */
+    public EndPointDetector open() {
+      return new EndPointDetector(this);
+    }
+
+    private static int checkTime(int millis) {
+      if (millis < 0) throw new IllegalArgumentException("a time is 0 ms or more, not " + millis);
+      return millis;
+    }
+  }
+
+  private final NativeHandle handle;
+  private boolean flushed;
+
+  private EndPointDetector(Settings settings) {
+    NativeLibrary.load();
+    NativeHandle.releaseForgotten();
+    long stream =
+        SafeLayer.openStream(
+            settings.rateHz,
+            settings.inputGain,
+            settings.contentType,
+            settings.hangoverMillis,
+            settings.padBeforeMillis,
+            settings.padAfterMillis);
+    handle = new NativeHandle(this, stream, SafeLayer::closeStream);
+  }
+
+  /**
+   * Settings for audio of a rate, to be changed and opened.
+   *
+   * @param rateHz 16000 or 8000
+   */
+  public static Settings at(int rateHz) {
+    return new Settings(rateHz);
+  }
+
+  /** As {@link #push(short[], int, int)} with the whole array. */
+  public List<Utterance> push(short[] pcm) {
+    return push(pcm, 0, pcm == null ? 0 : pcm.length);
+  }
+
+  /**
+   * Hears samples and returns the utterances that they decide. The array is not changed.
+   *
+   * @throws IllegalArgumentException if the samples are not all in the array
+   * @throws IllegalStateException after the flush or after close
+   */
+  public List<Utterance> push(short[] pcm, int offset, int count) {
+    FrameCutter.checkRange(pcm, offset, count);
+    synchronized (handle) {
+      long stream = handle.address();
+      if (flushed) throw new IllegalStateException("pushed after the flush");
+      List<Utterance> found = new ArrayList<>();
+      int done = 0;
+      do {
+        done += SafeLayer.pushAudio(stream, pcm, offset + done, count - done);
+        collect(stream, found);
+      } while (done < count);
+      return found;
+    }
+  }
+
+  /**
+   * Ends the audio and returns the utterances that are left; none when called again.
+   *
+   * @throws IllegalStateException after close
+   */
+  public List<Utterance> flush() {
+    synchronized (handle) {
+      long stream = handle.address();
+      flushed = true;
+      SafeLayer.flushStream(stream);
+      List<Utterance> found = new ArrayList<>();
+      collect(stream, found);
+      return found;
+    }
+  }
+
+  /** Releases the detector. Utterances not returned are lost. Does nothing the second time. */
+  @Override
+  public void close() {
+    handle.close();
+  }
+
+  private static void collect(long stream, List<Utterance> found) {
+    long[] fields = new long[6];
+    while (SafeLayer.nextUtterance(stream, fields) == 1) found.add(new Utterance(fields));
+  }
+}
