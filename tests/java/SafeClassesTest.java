@@ -1,0 +1,288 @@
+package com.zentq.tqe.phonoweave;
+
+import static org.junit.jupiter.api.Assertions.assertArrayEquals;
+import static org.junit.jupiter.api.Assertions.assertEquals;
+import static org.junit.jupiter.api.Assertions.assertFalse;
+import static org.junit.jupiter.api.Assertions.assertThrows;
+import static org.junit.jupiter.api.Assertions.assertTrue;
+
+import java.nio.ShortBuffer;
+import java.util.ArrayList;
+import java.util.Arrays;
+import java.util.List;
+import java.util.Random;
+import java.util.function.Supplier;
+import org.junit.jupiter.api.BeforeEach;
+import org.junit.jupiter.api.Test;
+import org.junit.jupiter.api.function.Executable;
+
+/** The safe classes: cuts, delays, ends, misuse and forgetting. */
+class SafeClassesTest {
+  private static final int CUTS = Integer.getInteger("cuts");
+
+  @BeforeEach
+  void quiet() {
+    EngineLog.off();
+  }
+
+  private static NoiseSuppressor suppressor(int microphones) {
+    return microphones == 2
+        ? NoiseSuppressor.forTwoMicrophones()
+        : NoiseSuppressor.forOneMicrophone(NoiseSuppressor.Strength.STRONG);
+  }
+
+  /** Lengths of pieces that make up the whole. */
+  private static List<Integer> cut(int whole, Random random) {
+    int longest = 8 << random.nextInt(13);
+    List<Integer> pieces = new ArrayList<>();
+    for (int rest = whole; rest > 0; rest -= pieces.get(pieces.size() - 1)) {
+      pieces.add(Math.min(rest, random.nextInt(longest + 1)));
+    }
+    return pieces;
+  }
+
+  private interface Push {
+    short[] push(short[] pcm, int offset, int count);
+  }
+
+  /** All that comes out of the pieces and of the flush. */
+  private static short[] pushAll(
+      short[] pcm, List<Integer> pieces, Push push, Supplier<short[]> flush) {
+    ShortBuffer out = ShortBuffer.allocate(pcm.length + 1000);
+    int at = 0;
+    for (int length : pieces) {
+      out.put(push.push(pcm, at, length));
+      at += length;
+    }
+    out.put(flush.get());
+    return Arrays.copyOf(out.array(), out.position());
+  }
+
+  private static short[] suppress(int microphones, short[] pcm, List<Integer> pieces) {
+    try (NoiseSuppressor ns = suppressor(microphones)) {
+      return pushAll(pcm, pieces, ns::push, ns::flush);
+    }
+  }
+
+  private static short[] level(short[] pcm, List<Integer> pieces) {
+    try (DynamicsControl drc = new DynamicsControl()) {
+      return pushAll(pcm, pieces, drc::push, drc::flush);
+    }
+  }
+
+  static String utterances(short[] pcm, List<Integer> pieces) {
+    try (EndPointDetector epd = EndPointDetector.at(16000).hangoverMillis(100).open()) {
+      StringBuilder text = new StringBuilder();
+      int at = 0;
+      for (int length : pieces) {
+        for (Utterance found : epd.push(pcm, at, length)) text.append(describe(found));
+        at += length;
+      }
+      for (Utterance found : epd.flush()) text.append(describe(found));
+      return text.toString();
+    }
+  }
+
+  private static String describe(Utterance found) {
+    return found + " (" + found.began + ", " + found.ended + ")\n";
+  }
+
+  @Test
+  void resultsDoNotDependOnTheCut() {
+    long seed = Long.getLong("seed", System.nanoTime());
+    Random random = new Random(seed);
+    short[] mono = Audio.withGap(Arrays.copyOf(Audio.command(), 44_444));
+    short[] pairs = Arrays.copyOf(Audio.twoMicrophones(), 12_802);
+    String utterances = utterances(mono, List.of(mono.length));
+    short[] one = suppress(1, mono, List.of(mono.length));
+    short[] two = suppress(2, pairs, List.of(pairs.length));
+    short[] levelled = level(mono, List.of(mono.length));
+    assertTrue(utterances.startsWith("utterance 1: "), utterances);
+    for (int i = 0; i < CUTS; ++i) {
+      List<Integer> pieces = cut(mono.length, random);
+      String repeat = "cut " + i + "; repeat with -Dseed=" + seed;
+      assertEquals(utterances, utterances(mono, pieces), repeat);
+      assertArrayEquals(one, suppress(1, mono, pieces), repeat);
+      assertArrayEquals(two, suppress(2, pairs, cut(pairs.length, random)), repeat);
+      assertArrayEquals(levelled, level(mono, pieces), repeat);
+    }
+  }
+
+  /** More utterances at once than the engine's queue holds. */
+  @Test
+  void allUtterancesComeOut() {
+    short[] command = Audio.command();
+    short[] many = new short[40 * command.length];
+    for (int i = 0; i < 40; ++i) {
+      System.arraycopy(command, 0, many, i * command.length, command.length);
+    }
+    try (EndPointDetector epd = EndPointDetector.at(16000).open()) {
+      int found = epd.push(many).size();
+      assertTrue(found >= 39, found + " utterances");
+    }
+  }
+
+  @Test
+  void suppressorIsTheEnginesFrameByFrame() {
+    for (int microphones = 1; microphones <= 2; ++microphones) {
+      short[] whole = Audio.withGap(microphones == 2 ? Audio.twoMicrophones() : Audio.command());
+      int frame = 160 * microphones;
+      short[] pcm = Arrays.copyOf(whole, whole.length / frame * frame - 36);
+      int delay;
+      try (NoiseSuppressor ns = suppressor(microphones)) {
+        delay = ns.delaySamples();
+      }
+      assertEquals(microphones == 2 ? 320 : 48, delay);
+
+      // What the engine makes of it whose frames come with the delayed input in the output.
+      short[] late = Audio.concat(new short[delay], Audio.concat(pcm, mirrored(pcm, microphones)));
+      short[] padded = Arrays.copyOfRange(late, delay, late.length);
+      short[] expected = new short[0];
+      long ns = Loquent.initializeDoNS(2, microphones, 0);
+      for (int at = 0; at + frame <= padded.length; at += frame) {
+        short[] out = Arrays.copyOfRange(late, at, at + frame);
+        Loquent.processDoNSFrame(
+            ns, Arrays.copyOfRange(padded, at, at + frame), frame, out, frame);
+        expected = Audio.concat(expected, out);
+      }
+      Loquent.freeMemoryDoNS(ns);
+
+      short[] out = suppress(microphones, pcm, List.of(pcm.length));
+      assertEquals(pcm.length + delay, out.length);
+      assertArrayEquals(Arrays.copyOf(expected, out.length), out);
+      int silent = whole.length / 2 / frame * frame + 2 * frame;
+      assertArrayEquals(
+          Arrays.copyOfRange(pcm, silent - delay, silent - delay + frame),
+          Arrays.copyOfRange(out, silent, silent + frame),
+          "null audio comes out late, as it is");
+    }
+  }
+
+  /** The end of the audio backwards, pairs staying pairs. */
+  private static short[] mirrored(short[] pcm, int channels) {
+    short[] back = new short[1000 * channels];
+    for (int i = 0; i < back.length; ++i) {
+      back[i] = pcm[pcm.length - (i / channels + 1) * channels + i % channels];
+    }
+    return back;
+  }
+
+  @Test
+  void shortInputsHaveTheirLength() {
+    for (int samples : new int[] {0, 1, 7, 159, 160, 161}) {
+      short[] pcm = Arrays.copyOfRange(Audio.command(), 16000, 16000 + samples);
+      List<Integer> pieces = List.of(samples);
+      assertEquals(samples == 0 ? 0 : samples + 48, suppress(1, pcm, pieces).length);
+      short[] levelled = level(pcm, pieces);
+      assertEquals(samples, levelled.length);
+      // Mirrored ends are as loud as the audio: the gain does not know them from it.
+      if (samples == 7) assertTrue(levelled[6] * pcm[6] >= 0);
+    }
+  }
+
+  @Test
+  void loudnessIsThatOfTheLastFrame() {
+    short[] frame = new short[160];
+    Arrays.fill(frame, (short) 20000);
+    try (DynamicsControl drc = new DynamicsControl()) {
+      drc.push(frame, 0, 159);
+      assertFalse(drc.isLoud());
+      drc.push(frame, 0, 1);
+      assertTrue(drc.isLoud());
+      drc.push(new short[1760]);
+      assertFalse(drc.isLoud());
+    }
+  }
+
+  @Test
+  void misuseIsTold() {
+    short[] pcm = new short[10];
+    EndPointDetector epd = EndPointDetector.at(8000).open();
+    NoiseSuppressor ns = suppressor(1);
+    DynamicsControl drc = new DynamicsControl();
+    for (int[] range : new int[][] {{-1, 1}, {0, 11}, {10, 1}, {5, -1}, {1 << 30, 1 << 30}}) {
+      int at = range[0];
+      int count = range[1];
+      assertMisuse(() -> epd.push(pcm, at, count), IllegalArgumentException.class);
+      assertMisuse(() -> ns.push(pcm, at, count), IllegalArgumentException.class);
+      assertMisuse(() -> drc.push(pcm, at, count), IllegalArgumentException.class);
+    }
+    for (Executable call :
+        new Executable[] {
+          () -> epd.push(null),
+          () -> ns.push(null),
+          () -> drc.push(null),
+          () -> EndPointDetector.at(44100),
+          () -> EndPointDetector.at(16000).inputGain(3),
+          () -> EndPointDetector.at(16000).hangoverMillis(-1),
+          () -> EndPointDetector.at(16000).padBeforeMillis(-1),
+          () -> EndPointDetector.at(16000).padAfterMillis(-1),
+          () -> NoiseSuppressor.forOneMicrophone(null),
+          () -> EngineLog.toLogger(null)
+        }) {
+      assertMisuse(call, IllegalArgumentException.class);
+    }
+    for (int i = 0; i < 2; ++i) {
+      assertEquals(List.of(), epd.flush());
+      assertEquals(0, ns.flush().length);
+      assertEquals(0, drc.flush().length);
+      assertMisuse(() -> epd.push(pcm), IllegalStateException.class);
+      assertMisuse(() -> ns.push(pcm), IllegalStateException.class);
+      assertMisuse(() -> drc.push(pcm), IllegalStateException.class);
+    }
+    for (int i = 0; i < 2; ++i) {
+      epd.close();
+      ns.close();
+      drc.close();
+      assertMisuse(epd::flush, IllegalStateException.class);
+      assertMisuse(ns::flush, IllegalStateException.class);
+      assertMisuse(drc::flush, IllegalStateException.class);
+    }
+    for (long failed : new long[] {0, -1}) {
+      assertMisuse(() -> new NativeHandle(this, failed, x -> {}), IllegalStateException.class);
+    }
+  }
+
+  private static void assertMisuse(Executable call, Class<? extends RuntimeException> kind) {
+    assertFalse(assertThrows(kind, call).getMessage().isEmpty());
+  }
+
+  @Test
+  void onlyOneSuppressorOfTwoMicrophonesIsOpen() {
+    try (NoiseSuppressor first = suppressor(2)) {
+      assertMisuse(NoiseSuppressor::forTwoMicrophones, IllegalStateException.class);
+      first.push(new short[3]);
+      assertMisuse(first::flush, IllegalStateException.class);
+    }
+    suppressor(2).close();
+  }
+
+  @Test
+  void forgottenHandlesAreReleased() throws InterruptedException {
+    suppressor(2).push(new short[10]);
+    for (int i = 0; i < 20; ++i) EndPointDetector.at(16000).open();
+    assertTrue(NativeHandle.living() > 0);
+    // The place for two microphones is free again only once the forgotten one is released.
+    for (int tries = 0; NativeHandle.living() > 0 && tries < 1000; ++tries) {
+      System.gc();
+      Thread.sleep(10);
+      new DynamicsControl().close();
+    }
+    assertEquals(0, NativeHandle.living());
+    suppressor(2).close();
+  }
+
+  @Test
+  void linesGoWhereTheyAreSent() {
+    List<String> lines = LoquentTest.linesOf(() -> new DynamicsControl().close());
+    assertTrue(lines.get(0).startsWith("FINE Create DRC, SamplingRate : 16000"), lines.toString());
+    lines = LoquentTest.linesOf(() -> Loquent.computeEnergyFrame(null, 160, 16000));
+    assertEquals(
+        List.of("SEVERE TQE: computeEnergyFrame: 160 samples asked of an array of 0"), lines);
+    lines = LoquentTest.linesOf(() -> {
+      EngineLog.off();
+      new DynamicsControl().close();
+    });
+    assertEquals(List.of(), lines);
+  }
+}
