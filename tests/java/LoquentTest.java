@@ -182,6 +182,17 @@ class LoquentTest {
         Loquent.computeEnergyFrame(pcm, 900, 16000));
   }
 
+  /** With frames of 80 samples the suppressor reaches 80 samples beyond the last one. */
+  @Test
+  void theSuppressorsReachIsWithinTheCopy() {
+    short[] pcm = Arrays.copyOfRange(Audio.command(), 16000, 16000 + 1920);
+    short[] out = new short[1920];
+    long ns = Loquent.initializeDoNS(3000, 1, 0);
+    assertEquals(1920, Loquent.processDoNSFrame(ns, pcm, 1920, out, 1920));
+    assertNotEquals(0, out[1919]);
+    Loquent.freeMemoryDoNS(ns);
+  }
+
   @Test
   void wrongArgumentsAreRefusedAndChangeNothing() {
     long epd = Loquent.initializeEPD(0, 0);
