@@ -72,3 +72,10 @@ for command in $commands; do
   grep -qw -e "Cm .*$command" "$work/moved/share/man/man1/orvalis.1" ||
     check "$command in the manual page" described missing
 done
+
+# A build with Java installs its jars too.
+if [ -d "$build/java" ]; then
+  for jar in orvalis orvalis-sources orvalis-javadoc orvalis-example; do
+    [ -s "$installed/share/java/$jar.jar" ] || check "share/java/$jar.jar" installed missing
+  done
+fi
