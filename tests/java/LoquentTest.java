@@ -8,10 +8,7 @@ import static org.junit.jupiter.api.Assertions.assertTrue;
 import java.util.ArrayList;
 import java.util.Arrays;
 import java.util.List;
-import java.util.function.ToIntFunction;
-import java.util.logging.Handler;
 import java.util.logging.Level;
-import java.util.logging.LogRecord;
 import java.util.logging.Logger;
 import org.junit.jupiter.api.BeforeEach;
 import org.junit.jupiter.api.Test;
@@ -28,11 +25,18 @@ class LoquentTest {
     EngineLog.off();
   }
 
-  /** One answer for each whole frame. */
-  private static int[] answers(short[] pcm, int frame, ToIntFunction<short[]> call) {
+  private interface Call {
+    int on(int at, short[] frame);
+  }
+
+  /** The answer to each whole frame, none of which may be changed. */
+  private static int[] answers(short[] pcm, int frame, Call call) {
     int[] answers = new int[pcm.length / frame];
     for (int i = 0; i < answers.length; ++i) {
-      answers[i] = call.applyAsInt(Arrays.copyOfRange(pcm, i * frame, (i + 1) * frame));
+      int at = i * frame;
+      short[] samples = Arrays.copyOfRange(pcm, at, at + frame);
+      answers[i] = call.on(at, samples);
+      assertArrayEquals(Arrays.copyOfRange(pcm, at, at + frame), samples);
     }
     return answers;
   }
@@ -44,21 +48,14 @@ class LoquentTest {
     short[] pcm = Audio.withGap(narrow ? Audio.narrowBand() : Audio.sentence());
     int frame = narrow ? 80 : 160;
     long epd = Loquent.initializeEPD(mode, 0);
-    int[] number = {0};
-    int[] answers =
-        answers(
-            pcm,
-            frame,
-            samples -> {
-              if (number[0]++ == RESET_AT) assertEquals(0, Loquent.resetEPDparams(epd));
-              short[] before = samples.clone();
-              int answer =
-                  contentType < 0
-                      ? Loquent.processEPDFrame(epd, samples, frame)
-                      : Loquent.ProcessEPDFrameByCnttype(epd, samples, frame, contentType);
-              assertArrayEquals(before, samples, "the array is never changed");
-              return answer;
-            });
+    Call call =
+        (at, samples) -> {
+          if (at == RESET_AT * frame) assertEquals(0, Loquent.resetEPDparams(epd));
+          return contentType < 0
+              ? Loquent.processEPDFrame(epd, samples, frame)
+              : Loquent.ProcessEPDFrameByCnttype(epd, samples, frame, contentType);
+        };
+    int[] answers = answers(pcm, frame, call);
     assertEquals(0, Loquent.freeMemoryEPD(epd));
     assertArrayEquals(Bridge.epd(mode, pcm, frame, contentType, RESET_AT), answers);
     assertTrue(Arrays.stream(answers).sum() > 0, "there is speech");
@@ -73,20 +70,14 @@ class LoquentTest {
     Arrays.fill(expected, (short) 77);
     short[] result = expected.clone();
     long ns = Loquent.initializeDoNS(mode, microphones, -5);
-    int[] at = {0};
-    int[] counts =
-        answers(
-            pcm,
-            frame,
-            samples -> {
-              short[] in = samples.clone();
-              short[] out = Arrays.copyOfRange(result, at[0], at[0] + frame);
-              int count = Loquent.processDoNSFrame(ns, in, frame, out, frame);
-              assertArrayEquals(samples, in, "the input is never changed");
-              System.arraycopy(out, 0, result, at[0], frame);
-              at[0] += frame;
-              return count;
-            });
+    Call call =
+        (at, in) -> {
+          short[] out = Arrays.copyOfRange(result, at, at + frame);
+          int count = Loquent.processDoNSFrame(ns, in, frame, out, frame);
+          System.arraycopy(out, 0, result, at, frame);
+          return count;
+        };
+    int[] counts = answers(pcm, frame, call);
     assertEquals(0, Loquent.freeMemoryDoNS(ns));
     assertArrayEquals(Bridge.ns(mode, microphones, pcm, expected, frame), counts);
     assertArrayEquals(expected, result);
@@ -100,22 +91,19 @@ class LoquentTest {
   void dynamicsControlWorksAsInC(int rateHz) {
     short[] original = Audio.sentence();
     short[] expected = original.clone();
-    short[] result = new short[original.length / 160 * 160];
+    short[] result = original.clone();
     long drc = Loquent.initializeDRC(rateHz, 0);
-    int[] at = {0};
-    int[] answers =
-        answers(
-            original,
-            160,
-            samples -> {
-              int answer = Loquent.processDRC(drc, samples, 160);
-              System.arraycopy(samples, 0, result, at[0], 160);
-              at[0] += 160;
-              return answer;
-            });
+    Call call =
+        (at, samples) -> {
+          short[] frame = samples.clone();
+          int answer = Loquent.processDRC(drc, frame, 160);
+          System.arraycopy(frame, 0, result, at, 160);
+          return answer;
+        };
+    int[] answers = answers(original, 160, call);
     assertEquals(0, Loquent.freeMemoryDRC(drc));
     assertArrayEquals(Bridge.drc(rateHz, expected, 160), answers);
-    assertArrayEquals(Arrays.copyOf(expected, result.length), result);
+    assertArrayEquals(expected, result);
     assertEquals(rateHz == 16000, !Arrays.equals(original, expected), "in place");
   }
 
@@ -123,32 +111,21 @@ class LoquentTest {
   @ValueSource(ints = {16000, 8000})
   void queriesAnswerAsInC(int rateHz) {
     short[] pcm = Audio.command();
-    int frame = rateHz / 50;
+    int block = rateHz / 50;
     int[] energies =
-        answers(
-            pcm,
-            frame,
-            samples -> {
-              short[] before = samples.clone();
-              int energy = Loquent.computeEnergyFrame(samples, frame, rateHz);
-              assertArrayEquals(before, samples);
-              return energy;
-            });
-    assertArrayEquals(Bridge.energy(rateHz, pcm, frame), energies);
+        answers(pcm, block, (at, samples) -> Loquent.computeEnergyFrame(samples, block, rateHz));
+    assertArrayEquals(Bridge.energy(rateHz, pcm, block), energies);
     assertTrue(Arrays.stream(energies).max().getAsInt() > 40);
 
     int[] spectra = new int[pcm.length / 160 * 128];
-    int[] spectrum = new int[130];
-    int[] frames = {0};
-    answers(
-        pcm,
-        160,
-        samples -> {
-          Arrays.fill(spectrum, 0);
+    Call call =
+        (at, samples) -> {
+          int[] spectrum = new int[130];
           assertEquals(1, Loquent.getSpectrum(samples, spectrum, rateHz));
-          System.arraycopy(spectrum, 0, spectra, 128 * frames[0]++, 128);
+          System.arraycopy(spectrum, 0, spectra, at / 160 * 128, 128);
           return spectrum[128] + spectrum[129];
-        });
+        };
+    assertEquals(0, Arrays.stream(answers(pcm, 160, call)).sum(), "nothing behind the bins");
     assertArrayEquals(Bridge.spectrum(rateHz, pcm), spectra);
   }
 
@@ -158,16 +135,10 @@ class LoquentTest {
     short[] pcm = Arrays.copyOfRange(Audio.command(), 16000, 16000 + 960);
     short[] padded = Arrays.copyOf(Arrays.copyOf(pcm, 900), 960);
     for (int microphones = 1; microphones <= 2; ++microphones) {
-      short[][] out = new short[2][960];
-      for (int i = 0; i < 2; ++i) {
-        long ns = Loquent.initializeDoNS(0, microphones, 0);
-        int count = i == 0 ? 900 : 960;
-        assertEquals(
-            960, Loquent.processDoNSFrame(ns, i == 0 ? pcm : padded, count, out[i], count));
-        Loquent.freeMemoryDoNS(ns);
-      }
-      assertArrayEquals(Arrays.copyOf(out[1], 900), Arrays.copyOf(out[0], 900));
-      assertArrayEquals(new short[60], Arrays.copyOfRange(out[0], 900, 960));
+      short[] out = suppressedAtOnce(microphones, pcm, 900);
+      short[] expected = suppressedAtOnce(microphones, padded, 960);
+      assertArrayEquals(Arrays.copyOf(expected, 900), Arrays.copyOf(out, 900));
+      assertArrayEquals(new short[60], Arrays.copyOfRange(out, 900, 960));
     }
     short[] rest = Arrays.copyOfRange(pcm, 900, 960);
     for (short[] samples : new short[][] {pcm, padded}) {
@@ -180,6 +151,14 @@ class LoquentTest {
     assertEquals(
         Loquent.computeEnergyFrame(padded, 960, 16000),
         Loquent.computeEnergyFrame(pcm, 900, 16000));
+  }
+
+  private static short[] suppressedAtOnce(int microphones, short[] pcm, int count) {
+    short[] out = new short[pcm.length];
+    long ns = Loquent.initializeDoNS(0, microphones, 0);
+    assertEquals(960, Loquent.processDoNSFrame(ns, pcm, count, out, count));
+    Loquent.freeMemoryDoNS(ns);
+    return out;
   }
 
   /** With frames of 80 samples the suppressor reaches 80 samples beyond the last one. */
@@ -264,7 +243,7 @@ class LoquentTest {
       long epd = Loquent.initializeEPD(0, 0);
       if (off) assertEquals(0, Loquent.LogEpdSetting(epd, 1));
       Runnable listen =
-          () -> answers(Audio.command(), 160, pcm -> Loquent.processEPDFrame(epd, pcm, 160));
+          () -> answers(Audio.command(), 160, (at, pcm) -> Loquent.processEPDFrame(epd, pcm, 160));
       boolean logged = linesOf(listen).stream().anyMatch(line -> line.contains(hangover));
       assertNotEquals(off, logged);
       Loquent.resetEPDparams(epd);
@@ -273,25 +252,15 @@ class LoquentTest {
     }
   }
 
-  /** The engine's lines meanwhile; a handler that throws does no harm. */
+  /** The engine's lines meanwhile; a logger that throws does no harm. */
   static List<String> linesOf(Runnable work) {
     List<String> lines = new ArrayList<>();
     Logger logger = Logger.getAnonymousLogger();
-    logger.setUseParentHandlers(false);
     logger.setLevel(Level.ALL);
-    logger.addHandler(
-        new Handler() {
-          @Override
-          public void publish(LogRecord line) {
-            lines.add(line.getLevel() + " " + line.getMessage());
-            throw new IllegalStateException("a handler's own fault");
-          }
-
-          @Override
-          public void flush() {}
-
-          @Override
-          public void close() {}
+    logger.setFilter(
+        line -> {
+          lines.add(line.getLevel() + " " + line.getMessage());
+          throw new IllegalStateException("a logger's own fault");
         });
     EngineLog.toLogger(logger);
     work.run();

@@ -173,10 +173,7 @@ class SafeClassesTest {
       short[] pcm = Arrays.copyOfRange(Audio.command(), 16000, 16000 + samples);
       List<Integer> pieces = List.of(samples);
       assertEquals(samples == 0 ? 0 : samples + 48, suppress(1, pcm, pieces).length);
-      short[] levelled = level(pcm, pieces);
-      assertEquals(samples, levelled.length);
-      // Mirrored ends are as loud as the audio: the gain does not know them from it.
-      if (samples == 7) assertTrue(levelled[6] * pcm[6] >= 0);
+      assertEquals(samples, level(pcm, pieces).length);
     }
   }
 
