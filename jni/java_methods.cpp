@@ -128,12 +128,13 @@ LOQUENT(jint, processDoNSFrame)
   WorkingCopy in_copy(static_cast<std::size_t>(in_count), room);
   WorkingCopy out_copy(static_cast<std::size_t>(in_count), room);
   if (in_copy.data() == nullptr || out_copy.data() == nullptr) return out_of_memory(kMethod);
-  const Elements<jshortArray> in_elements(env, in);
+  Elements<jshortArray> in_elements(env, in);
   const Elements<jshortArray> out_elements(env, out);
   if (in_elements.data() == nullptr || out_elements.data() == nullptr)
     return out_of_memory(kMethod);
   in_copy.fill_from(in_elements.data());
   out_copy.fill_from(out_elements.data());
+  in_elements.release();  // before the output's, which has to stay if both are one array
   const jint answer = ProcessDoNSFrame(ns, in_copy.data(), in_count, out_copy.data(), out_count);
   out_copy.store_to(out_elements.data());
   return answer;

@@ -70,15 +70,22 @@ class LoquentTest {
     Arrays.fill(expected, (short) 77);
     short[] result = expected.clone();
     long ns = Loquent.initializeDoNS(mode, microphones, -5);
+    long inPlace = Loquent.initializeDoNS(mode, 1, 0);
     Call call =
         (at, in) -> {
           short[] out = Arrays.copyOfRange(result, at, at + frame);
           int count = Loquent.processDoNSFrame(ns, in, frame, out, frame);
+          if (microphones == 1) {
+            short[] both = in.clone();
+            assertEquals(count, Loquent.processDoNSFrame(inPlace, both, frame, both, frame));
+            assertArrayEquals(out[0] == 77 && out[159] == 77 ? in : out, both, "one array for both");
+          }
           System.arraycopy(out, 0, result, at, frame);
           return count;
         };
     int[] counts = answers(pcm, frame, call);
     assertEquals(0, Loquent.freeMemoryDoNS(ns));
+    assertEquals(0, Loquent.freeMemoryDoNS(inPlace));
     assertArrayEquals(Bridge.ns(mode, microphones, pcm, expected, frame), counts);
     assertArrayEquals(expected, result);
     // Frames that are left alone keep what was there, the gap's among them.

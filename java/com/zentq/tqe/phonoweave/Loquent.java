@@ -98,7 +98,7 @@ public final class Loquent {
   public static native long initializeDoNS(int mode, int microphones, int unused);
 
   /**
-   * Suppresses the noise of whole frames. The input is not changed.
+   * Suppresses the noise of whole frames. The input is not changed; it may be the output's array.
    *
    * <p>Frames that are not suppressed leave their part of the output as it is: those with more than
    * 60 zeros in a row, the first ones until the level has settled, and, with two microphones, very
