@@ -20,8 +20,13 @@ UtteranceStream *stream_of(jlong handle) {
 
 jlong JNICALL open_stream(JNIEnv *, jclass, jint rate_hz, jint input_gain, jint content_type,
                           jint hangover_ms, jint pad_before_ms, jint pad_after_ms) {
-  const UtteranceSettings settings = {rate_hz,     input_gain,    content_type,
-                                      hangover_ms, pad_before_ms, pad_after_ms};
+  const UtteranceSettings settings = {.rate_hz = rate_hz,
+                                      .input_gain = input_gain,
+                                      .content_type = content_type,
+                                      .hangover_ms = hangover_ms,
+                                      .pad_before_ms = pad_before_ms,
+                                      .pad_after_ms = pad_after_ms,
+                                      .pcm_dump = 0};
   return reinterpret_cast<intptr_t>(OpenUtteranceStream(&settings));
 }
 
