@@ -33,8 +33,9 @@ struct EnhanceOptions {
 
 int run(EnhanceOptions &options) {
   EnhancementSettings &work = options.work;
-  const std::string destination = options.inputs.back();
+  std::string destination = options.inputs.back();
   options.inputs.pop_back();
+  if (destination == "/dev/stdout") destination = "-";  // what is printed must not get between
   if (std::ranges::count(options.inputs, "-") > 1)
     throw CLI::ValidationError("FILE", "standard input can be read only once");
   const auto report = make_report(options.report, "--report", options.inputs.size());

@@ -255,9 +255,11 @@ TEST_F(Enhanced, ProcessIsDenoiseThenLevelThenEpd) {
 
   // With the audio on standard output, the report goes where the notes go.
   const Result plain = run("process " + file + " " + (folder_ / "plain.wav"));
-  const Result streamed = run("process --format raw " + file + " -");
-  EXPECT_EQ(samples_of(streamed.out), samples_in(folder_ / "plain.wav"));
-  EXPECT_EQ(streamed.err, plain.out + plain.err);
+  for (const std::string standard_output : {"-", "/dev/stdout"}) {
+    const Result streamed = run("process --format raw " + file + " " + standard_output);
+    EXPECT_EQ(samples_of(streamed.out), samples_in(folder_ / "plain.wav"));
+    EXPECT_EQ(streamed.err, plain.out + plain.err);
+  }
 }
 
 }  // namespace
