@@ -32,6 +32,12 @@ int rename_to_new(const std::string &from, const std::string &to) {
   return std::rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
 }
 
+/// Whether libsndfile can write a file without a sample that can be read again.
+bool can_be_empty(int format) {
+  const int type = format & SF_FORMAT_TYPEMASK;
+  return type != SF_FORMAT_FLAC && type != SF_FORMAT_OGG;
+}
+
 }  // namespace
 
 /// The bytes under their temporary name. Keeps the reason of the first failure, which libsndfile
@@ -124,7 +130,7 @@ private:
 };
 
 OutputFile::OutputFile(const std::string &path, const OutputFormat &format, bool replace)
-    : path_(path), replace_(replace) {
+    : path_(path), replace_(replace), lacks_samples_(!can_be_empty(format.format)) {
   if (is_protected(path)) throw OutputError(path + ": the file is an input");
   if (!replace && exists(path)) fail(EEXIST);
   bytes_ = std::make_unique<Bytes>(path);
@@ -156,27 +162,21 @@ void OutputFile::check(bool good) const {
   if (!good) throw OutputError(path_ + ": the audio could not be encoded");
 }
 
-void OutputFile::write(std::span<const short> samples) {
+template <class Sample>
+void OutputFile::append(std::span<const Sample> samples,
+                        sf_count_t (*write)(SNDFILE *, const Sample *, sf_count_t)) {
   const auto count = static_cast<sf_count_t>(samples.size());
-  check(sf_write_short(file_.get(), samples.data(), count) == count);
+  if (count > 0) lacks_samples_ = false;
+  check(write(file_.get(), samples.data(), count) == count);
 }
 
-void OutputFile::write(std::span<const int> samples) {
-  const auto count = static_cast<sf_count_t>(samples.size());
-  check(sf_write_int(file_.get(), samples.data(), count) == count);
-}
-
-void OutputFile::write(std::span<const float> samples) {
-  const auto count = static_cast<sf_count_t>(samples.size());
-  check(sf_write_float(file_.get(), samples.data(), count) == count);
-}
-
-void OutputFile::write(std::span<const double> samples) {
-  const auto count = static_cast<sf_count_t>(samples.size());
-  check(sf_write_double(file_.get(), samples.data(), count) == count);
-}
+void OutputFile::write(std::span<const short> samples) { append(samples, sf_write_short); }
+void OutputFile::write(std::span<const int> samples) { append(samples, sf_write_int); }
+void OutputFile::write(std::span<const float> samples) { append(samples, sf_write_float); }
+void OutputFile::write(std::span<const double> samples) { append(samples, sf_write_double); }
 
 void OutputFile::commit() {
+  if (lacks_samples_) throw OutputError(path_ + ": the format cannot hold audio without a sample");
   // Encoders and headers are finished by closing.
   const bool closed = sf_close(file_.release()) == 0;
   bytes_->close();

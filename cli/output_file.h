@@ -46,11 +46,15 @@ public:
 private:
   class Bytes;
 
+  template <class Sample>
+  void append(std::span<const Sample> samples,
+              sf_count_t (*write)(SNDFILE *, const Sample *, sf_count_t));
   [[noreturn]] void fail(int error) const;
   void check(bool good) const;
 
   std::string path_;
   bool replace_;
+  bool lacks_samples_;            // and its format cannot be without
   std::unique_ptr<Bytes> bytes_;  // outlives file_, which writes to it while closing
   SndfilePointer file_;
 };

@@ -137,6 +137,14 @@ TEST_F(Outputs, NothingHalfWrittenIsLeft) {
     EXPECT_EQ(run(command_name + take + " - >&-").status, 1);
     EXPECT_EQ(run(command_name + take + " - | true").err, "");
   }
+  // libsndfile writes these without a header if there is no sample.
+  for (const std::string name : {"empty.flac", "empty.ogg", "empty.opus"}) {
+    const Result empty = run("level --raw - " + out + name);
+    EXPECT_EQ(empty.err, "orvalis: standard input: " + out + name +
+                             ": the format cannot hold audio without a sample\n");
+  }
+  EXPECT_TRUE(fs::is_empty(out));
+
   // Where standard error is closed, no note may find its way into the output.
   const std::string noted = "level --raw --rate 8000 - " + out;
   EXPECT_NE(run(noted + "a.raw", "some samples").err, "");

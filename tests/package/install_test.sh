@@ -43,6 +43,10 @@ check_installation() {
   check "$1: the consumer built by CMake" "$answer" "$("$made/consumer" <"$recording")"
   check "$1: the tool" '1 0.510 2.250 1.740' \
     "$("$2/bin/orvalis" epd --raw - <"$recording" | tail -n 1 | xargs)"
+  [ -d "$build/java" ] || return 0
+  for jar in orvalis orvalis-sources orvalis-javadoc orvalis-example; do
+    [ -s "$2/share/java/$jar.jar" ] || check "$1: $jar.jar" present missing
+  done
 }
 
 quietly "$CMAKE" --install "$build" --prefix "$work/first"
@@ -72,10 +76,3 @@ for command in $commands; do
   grep -qw -e "Cm .*$command" "$work/moved/share/man/man1/orvalis.1" ||
     check "$command in the manual page" described missing
 done
-
-# A build with Java installs its jars too.
-if [ -d "$build/java" ]; then
-  for jar in orvalis orvalis-sources orvalis-javadoc orvalis-example; do
-    [ -s "$installed/share/java/$jar.jar" ] || check "share/java/$jar.jar" installed missing
-  done
-fi
