@@ -61,32 +61,6 @@ Span energetic_range(const Pcm &pcm, int32_t rate_hz, double rest) {
   return {time_of(rest), time_of(1 - rest)};
 }
 
-/// Mean level of the frames within 30 dB of the loudest one.
-double speech_level(const Pcm &pcm, int32_t rate_hz) {
-  const auto levels = frame_levels(pcm, static_cast<std::size_t>(rate_hz / 100));
-  const double threshold = *std::max_element(levels.begin(), levels.end()) - 30;
-  double power = 0;
-  int frames = 0;
-  for (const double level : levels) {
-    if (level < threshold) continue;
-    power += std::pow(10, level / 10);
-    ++frames;
-  }
-  return 10 * std::log10(power / frames);
-}
-
-/// The recording with noise `below_db` under its speech and `margin` samples of that noise around.
-Pcm in_noise(const Pcm &speech, std::size_t margin, NoiseColour colour, double level_db) {
-  const auto noise = unit_noise(speech.size() + 2 * margin, colour, 20260705);
-  const double scale = std::pow(10, level_db / 20);
-  Pcm mixed(noise.size());
-  for (std::size_t i = 0; i < mixed.size(); ++i) {
-    const bool inside = i >= margin && i < margin + speech.size();
-    mixed[i] = to_sample(scale * noise[i] + (inside ? speech[i - margin] : 0));
-  }
-  return mixed;
-}
-
 /// Words of each recording by its name, from lines like "<s> ten of clubs </s> (001)".
 std::map<std::string, int> words_of(const std::string &transcript) {
   std::ifstream file(std::string(ORVALIS_SPEECH_16K) + "/" + transcript);

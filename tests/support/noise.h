@@ -48,4 +48,30 @@ inline std::vector<double> frame_levels(const Pcm &pcm, std::size_t frame_sample
   return levels;
 }
 
+/// Mean level of the frames within 30 dB of the loudest one.
+inline double speech_level(const Pcm &pcm, std::int32_t rate_hz) {
+  const auto levels = frame_levels(pcm, static_cast<std::size_t>(rate_hz / 100));
+  const double threshold = *std::max_element(levels.begin(), levels.end()) - 30;
+  double power = 0;
+  int frames = 0;
+  for (const double level : levels) {
+    if (level < threshold) continue;
+    power += std::pow(10, level / 10);
+    ++frames;
+  }
+  return 10 * std::log10(power / frames);
+}
+
+/// The recording with noise `below_db` under its speech and `margin` samples of that noise around.
+inline Pcm in_noise(const Pcm &speech, std::size_t margin, NoiseColour colour, double level_db) {
+  const auto noise = unit_noise(speech.size() + 2 * margin, colour, 20260705);
+  const double scale = std::pow(10, level_db / 20);
+  Pcm mixed(noise.size());
+  for (std::size_t i = 0; i < mixed.size(); ++i) {
+    const bool inside = i >= margin && i < margin + speech.size();
+    mixed[i] = to_sample(scale * noise[i] + (inside ? speech[i - margin] : 0));
+  }
+  return mixed;
+}
+
 }  // namespace orvalis::test

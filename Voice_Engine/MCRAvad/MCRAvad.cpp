@@ -1,0 +1,71 @@
+// The exported entries of the MCRA detector.
+#include "Voice_Engine/MCRAvad/MCRAvad.h"
+
+#include <cstddef>
+#include <cstring>
+
+#include "Voice_Engine/MCRAvad/frame_decision.h"
+#include "Voice_Engine/MCRAvad/noise_spectrum.h"
+#include "Voice_Engine/MCRAvad/speech_presence.h"
+#include "Voice_Engine/basic_op/word.h"
+#include "Voice_Engine/platform/export.h"
+#include "Voice_Engine/platform/log.h"
+
+namespace {
+
+void analyse_frame(VADINFO &vad, int16_t *frame, int32_t length) {
+  orvalis::count_up(vad.frameIndex);
+  orvalis::take_periodogram(vad, frame, length);
+  orvalis::update_noise(vad);
+  orvalis::update_presence(vad);
+}
+
+}  // namespace
+
+extern "C" {
+
+ORVALIS_EXPORT void initialVADINFO(VADINFO **info) {
+  VADINFO &vad = **info;
+  // Spectra, energies and `reserved`; configuration follows them.
+  std::memset(&vad, 0, offsetof(VADINFO, historyUpdate));
+  vad.frameIndex = -1;
+  vad.energyThreshold = -1;
+  // Far above any power, so that slots without a spectrum are no minimum.
+  std::memset(vad.minPower, 1, sizeof vad.minPower);
+  std::memset(vad.minHistory, 1, sizeof vad.minHistory);
+  vad.energyMargin = 2;
+  vad.calibrationIndex = 0;
+  vad.calibrationOlderSum = 0;
+  vad.calibrationNewerSum = 0;
+  vad.calibrationPeak = 0;
+  vad.calibrationCount = 0;
+}
+
+ORVALIS_EXPORT void reset_MCRA_params(VADINFO **info) {
+  using namespace orvalis;
+  log_line(kLogDebug, kLogTag, "TQE: reset MCRA params");
+  VADINFO &vad = **info;
+  vad.energyMargin = 1;
+  vad.lowThresholdSelect = 0;
+  vad.calibrationMode = 0;
+  vad.calibrationDone = 0;
+  vad.calibrationPhase = 0;
+  vad.calibrationIndex = 0;
+  vad.calibrationCount = 0;
+  vad.calibrationBest = 0;
+  vad.calibrationOlderSum = 0;
+  vad.calibrationNewerSum = 0;
+  vad.calibrationPeak = 0;
+  vad.energyThreshold = 0;  // the calibrated threshold of silence
+}
+
+ORVALIS_EXPORT void ApplyVAD(VADINFO **info, int16_t *frame, int32_t length) {
+  analyse_frame(**info, frame, length);
+}
+
+ORVALIS_EXPORT int32_t processVAD(VADINFO **info, int16_t *frame, int32_t length, float exponent) {
+  analyse_frame(**info, frame, length);
+  return orvalis::decide_frame(**info, exponent) ? 1 : 0;
+}
+
+}  // extern "C"
