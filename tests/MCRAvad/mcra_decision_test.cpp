@@ -36,8 +36,9 @@ protected:
       vad.minPower[k] = k / 64 == 1 ? std::llrint(frame.minimum_energy * 0x1p25) : 0;
       vad.speechProb[k] = k < frame.speech_bins ? INT32_MAX : 0;
     }
-    // A bin's probability is at most 1 - 2^-31: the missing units round the sum down.
-    if (frame.speech_bins > 0) vad.speechProb[MCRA_BINS - 1] += frame.speech_bins;
+    // A bin's probability is at most 1 - 2^-31: the missing units are made up for, and half a bin
+    // more makes no other count.
+    vad.speechProb[MCRA_BINS - 1] += frame.speech_bins + (1 << 30);
     return decide_frame(vad, exponent);
   }
 
@@ -90,11 +91,12 @@ TEST_F(McraDecision, StartupLearnsFromTenAndNineteenFrames) {
   decide(kNothing);
   for (int n = 1; n <= 30; ++n) {
     // Frame 5 is too loud: frame 4 counts again. Frames 20 and later are not learnt.
-    decide({1, n == 5 ? 31 : n < 20 ? n * 0.125 : 30.5, 0, 0});
-    EXPECT_EQ(record_.prevSmoothedEnergy, n == 5 ? 0.5F : n < 20 ? n * 0.125F : 30.5F);
+    const double energy = n == 5 ? 30.25 : n == 6 ? 30 : n < 20 ? n * 0.125 : 30.5;
+    decide({1, energy, 0, 0});
+    EXPECT_EQ(record_.prevSmoothedEnergy, n == 5 ? 0.5 : energy);
   }
   EXPECT_EQ(record_.startupFrameEnergy, 19);  // 1, then nine times 2
-  EXPECT_EQ(record_.startupSmoothedEnergy, 0.125F * (190 - 1));
+  EXPECT_EQ(record_.startupSmoothedEnergy, 0.125F * (190 - 1 - 6) + 30);
 }
 
 TEST_F(McraDecision, ScaleFollowsTheStartOrTheMinima) {
@@ -103,8 +105,8 @@ TEST_F(McraDecision, ScaleFollowsTheStartOrTheMinima) {
     int calibration_enable;
     double minimum, limit;  // of two frames' smoothed energy, with a margin of 2
   };
-  const Case kCases[] = {{10, 0, 9, 1},       {10.5F, 0, 9, 2},   {20, 0, 9, 2},
-                         {40, 0, 9, 4},       {40, 1, 0.75, 1.875}, {40, -1, 0.75, 1.875},
+  const Case kCases[] = {{10, 0, 9, 1},           {10.5F, 0, 9, 2},     {20, 0, 9, 2},
+                         {40, 0, 9, 4},           {40, 1, 0.75, 1.875}, {40, -1, 0.75, 1.875},
                          {10, 1, 0.1875, 0.46875}};
   for (const Case &c : kCases) {
     record_.startupSmoothedEnergy = c.startup;
@@ -123,8 +125,10 @@ TEST_F(McraDecision, ScaleFollowsTheStartOrTheMinima) {
   }
 }
 
-/// Energies of 500 frames from frame 80 on, with the loudest stretch in the fourth window.
-double energy_of_frame(int index) { return 1 + (index % 7) * 0.125 + (index > 130 ? 2 : 0); }
+/// Energies from frame 80 on: loud at first and louder from the third window on.
+double energy_of_frame(int index) {
+  return 1 + (index % 7) * 0.125 + (index < 30 ? 3 : 0) + (index > 130 ? 4 : 0);
+}
 
 TEST_F(McraDecision, SixWindowsCalibrateAndTheSeventhNeverCloses) {
   for (const float exponent : {0.84F, 0.5F, 1.0F}) {
@@ -206,21 +210,22 @@ TEST(McraEntries, SetWhatTheyAreMeantToSet) {
   EXPECT_EQ(vad->minHistory[19][127], 72340172838076673);
   EXPECT_EQ(vad->energyThreshold, -1);
   EXPECT_EQ(vad->energyMargin, 2);
-  for (const auto &powers : {vad->periodogram, vad->smoothedPeriodogram, vad->recursivePower,
-                             vad->noisePower})
+  for (const auto &powers :
+       {vad->periodogram, vad->smoothedPeriodogram, vad->recursivePower, vad->noisePower})
     EXPECT_EQ(std::count(powers, powers + 128, 0), 128);
   for (const auto &words : {vad->presenceIndicatorAvg, vad->noiseSmoothing, vad->postSnr,
                             vad->prioriSnr, vad->gain, vad->prioriSnrAvg, vad->speechProb})
     EXPECT_EQ(std::count(words, words + 128, 0), 128);
   EXPECT_EQ(std::count(vad->reserved, vad->reserved + 80, 0), 80);
-  for (const float zero : {vad->prevSmoothedEnergy, vad->prevMinEnergy, vad->prevFrameEnergy,
-                           vad->startupSmoothedEnergy, vad->startupFrameEnergy,
-                           vad->calibrationOlderSum, vad->calibrationNewerSum, vad->calibrationPeak})
+  for (const float zero :
+       {vad->prevSmoothedEnergy, vad->prevMinEnergy, vad->prevFrameEnergy,
+        vad->startupSmoothedEnergy, vad->startupFrameEnergy, vad->calibrationOlderSum,
+        vad->calibrationNewerSum, vad->calibrationPeak})
     EXPECT_EQ(zero, 0);
   EXPECT_EQ(vad->prevSpeechBins + vad->frameSnr + vad->calibrationIndex + vad->calibrationCount, 0);
-  for (const auto field : {&VADINFO::historyUpdate, &VADINFO::calibrationMode,
-                           &VADINFO::calibrationEnable, &VADINFO::lowThresholdSelect,
-                           &VADINFO::calibrationDone, &VADINFO::calibrationPhase})
+  for (const auto field :
+       {&VADINFO::historyUpdate, &VADINFO::calibrationMode, &VADINFO::calibrationEnable,
+        &VADINFO::lowThresholdSelect, &VADINFO::calibrationDone, &VADINFO::calibrationPhase})
     EXPECT_EQ(vad->*field, before.*field);
   EXPECT_EQ(vad->calibrationBest, before.calibrationBest);
 
@@ -234,9 +239,9 @@ TEST(McraEntries, SetWhatTheyAreMeantToSet) {
        {&VADINFO::lowThresholdSelect, &VADINFO::calibrationMode, &VADINFO::calibrationDone,
         &VADINFO::calibrationPhase, &VADINFO::calibrationIndex, &VADINFO::calibrationCount})
     EXPECT_EQ(vad->*field, 0);
-  for (const auto field : {&VADINFO::calibrationBest, &VADINFO::calibrationOlderSum,
-                           &VADINFO::calibrationNewerSum, &VADINFO::calibrationPeak,
-                           &VADINFO::energyThreshold})
+  for (const auto field :
+       {&VADINFO::calibrationBest, &VADINFO::calibrationOlderSum, &VADINFO::calibrationNewerSum,
+        &VADINFO::calibrationPeak, &VADINFO::energyThreshold})
     EXPECT_EQ(vad->*field, 0);
   EXPECT_EQ(vad->energyMargin, 1);
   EXPECT_EQ(vad->calibrationEnable, before.calibrationEnable);

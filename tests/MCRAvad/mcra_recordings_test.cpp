@@ -53,8 +53,7 @@ void rate(const Pcm &speech, const Pcm &mixed, std::size_t margin, bool keeps_hi
   const auto answers = answers_to(mixed, keeps_history);
   for (std::size_t i = kAround; i + kAround < answers.size(); ++i) {
     double around = -99;
-    for (std::size_t j = i - kAround; j <= i + kAround; ++j)
-      around = std::max(around, level_at(j));
+    for (std::size_t j = i - kAround; j <= i + kAround; ++j) around = std::max(around, level_at(j));
     if (level_at(i) >= loudest - 20) rates.words.take(answers[i]);
     if (around < loudest - 40) rates.pauses.take(answers[i]);
   }
@@ -76,8 +75,7 @@ TEST(McraRecordings, WordsAreCoveredAndPausesAreNot) {
     for (const auto colour : {NoiseColour::kWhite, NoiseColour::kPink}) {
       Rates rates[2];
       for (const Pcm &speech : recordings) {
-        const Pcm mixed =
-            in_noise(speech, kMargin, colour, speech_level(speech, 16000) - below_db);
+        const Pcm mixed = in_noise(speech, kMargin, colour, speech_level(speech, 16000) - below_db);
         for (const bool keeps_history : {false, true})
           rate(speech, mixed, kMargin, keeps_history, rates[keeps_history]);
       }
@@ -98,8 +96,7 @@ TEST(McraRecordings, WordsAreCoveredAtBothRates) {
   for (const char *name : {"wav/hts1a.wav", "wav/vk5qi.wav"}) {
     const Pcm speech = speech_8k(name);
     Rates rates;
-    const Pcm mixed =
-        in_noise(speech, 16000, NoiseColour::kPink, speech_level(speech, 8000) - 20);
+    const Pcm mixed = in_noise(speech, 16000, NoiseColour::kPink, speech_level(speech, 8000) - 20);
     rate(speech, mixed, 16000, false, rates);
     std::printf("%s: %.1f %% of the words, %.2f %% of the pauses\n", name, rates.words.percent(),
                 rates.pauses.percent());
