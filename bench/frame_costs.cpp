@@ -8,6 +8,7 @@
 #include <memory>
 #include <vector>
 
+#include "Voice_Engine/MCRAvad/MCRAvad.h"
 #include "Voice_Engine/MCRAvad/Math_baseop.h"
 #include "Voice_Engine/MCRAvad/noscale_fft_512p.h"
 #include "Voice_Engine/drc/dynamics_control.h"
@@ -115,6 +116,26 @@ public:
 private:
   Word32 band_;
   VelmoraVadState state_{};
+};
+
+class McraDetection {
+public:
+  static constexpr std::size_t kBytes = sizeof(VADINFO);
+
+  void start() {
+    VADINFO *record = record_.get();
+    *record = {};
+    initialVADINFO(&record);
+  }
+  void hear(const Word16 *frame, int samples) {
+    VADINFO *record = record_.get();
+    std::copy_n(frame, samples, buffer_);
+    benchmark::DoNotOptimize(processVAD(&record, buffer_, samples, 0.84F));
+  }
+
+private:
+  std::shared_ptr<VADINFO> record_ = std::make_shared<VADINFO>();
+  Word16 buffer_[MCRA_FRAME_SAMPLES] = {};
 };
 
 /// Two microphones: the second hears the speech three samples later, and noise of its own.
@@ -244,6 +265,7 @@ void register_frame_costs() {
   measure("process_drc", wide, Leveling());
   measure("VelmoraVAD, 16 kHz", wide, VoiceDetection(0));
   measure("VelmoraVAD, 8 kHz", narrow, VoiceDetection(1));
+  measure("processVAD", wide, McraDetection());
   measure("c_fft_epd, band 0", wide, Transformation([](Word16 *x) { c_fft_epd(x, 1, 0); }));
   measure("c_fft_epd, band 1", narrow, Transformation([](Word16 *x) { c_fft_epd(x, 1, 1); }));
   measure("r_fft_epd, band 0", wide, Transformation([](Word16 *x) { r_fft_epd(x, 1, 0); }));

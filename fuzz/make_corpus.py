@@ -62,6 +62,33 @@ def epd_frame():
         bytes([2]) + number(n) for n in [0, 1, 160, -1, -1 << 31, (1 << 31) - 1])
 
 
+def mcra_frame():
+    def configuration(history=0, mode=0, enable=0, low=0, margin=2):
+        return b"".join(map(number, [history, mode, enable, low, margin]))
+
+    def heard(piece, length=160, exponent=84):
+        return bytes([AUDIO]) + number(length) + number(exponent) + piece
+
+    reset, again, configure, only_analysed = (bytes([op]) for op in range(4))
+    speech = [noise(8000), voice(8000), noise(6400), voice(6400, period=80), noise(9600)]
+    for name, fields in {"all_time": (), "history": (1,), "low": (1, 0, 0, 1, 1),
+                         "any_fields": (-1, 1 << 30, -1 << 31, 7, -5)}.items():
+        yield name, configuration(*fields) + b"".join(map(heard, speech))
+    for name, exponent in {"calibrated": 84, "steep": 200, "flat": 0, "negative": -1082130432,
+                           "not_a_number": 2143289344, "infinite": 2139095040}.items():
+        yield name, configuration(1, 1, 1) + b"".join(
+            heard(piece, exponent=exponent) for piece in (noise(9600, 60), *speech) * 2)
+    yield "lengths", configuration() + b"".join(
+        heard(noise(1600), length) for length in (0, 1, 100, 161, -1, (1 << 31) - 1))
+    yield "full_scale", configuration() + b"".join(
+        heard(piece) for piece in [constant(4000, 0), constant(4000, -32768), voice(8000, 32767),
+                                   noise(8000, 32767), constant(4000, 0),
+                                   literal(*[32767, -32768] * 80), constant(1600, 1)])
+    yield "resets", configuration(0, 1, 1) + b"".join(
+        heard(piece) + reset + configure + configuration(1, 1, 1) for piece in speech) + again + (
+            heard(voice(3200)) + only_analysed + noise(160) + number(160) + heard(voice(3200)))
+
+
 def ns_frame():
     whole, any_cut, null = bytes([2]), bytes([1]), bytes([0])
     speech = [noise(8000), voice(8000), noise(3200), voice(6400, period=80)]
@@ -161,7 +188,7 @@ def audio_source():
 
 
 corpus = pathlib.Path(__file__).parent / "corpus"
-for target in (epd_frame, ns_frame, utterance_stream, audio_source):
+for target in (epd_frame, mcra_frame, ns_frame, utterance_stream, audio_source):
     folder = corpus / target.__name__
     folder.mkdir(parents=True, exist_ok=True)
     for name, content in target():

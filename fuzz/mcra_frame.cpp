@@ -1,0 +1,99 @@
+// The MCRA detector: any configuration, exponent, length of window, reset and audio.
+#include <algorithm>
+#include <bit>
+#include <memory>
+
+#include "Voice_Engine/MCRAvad/MCRAvad.h"
+#include "fuzz/input.h"
+#include "jni/orvalis.h"
+
+namespace {
+
+using orvalis::fuzz::Input;
+using orvalis::fuzz::require;
+
+constexpr std::size_t kMostSamples = 96000;  // a calibration takes 93000
+
+void configure(VADINFO &vad, Input &input) {
+  vad.historyUpdate = input.number();
+  vad.calibrationMode = input.number();
+  vad.calibrationEnable = input.number();
+  vad.lowThresholdSelect = input.number();
+  vad.energyMargin = input.number();
+}
+
+/// Mostly hundredths, and now and then any 32 bits.
+float read_exponent(Input &input) {
+  const std::int32_t number = input.number();
+  return number >= 0 && number < 255 ? static_cast<float>(number) / 100
+                                     : std::bit_cast<float>(number);
+}
+
+void require_invariants(const VADINFO &vad, std::int32_t answer) {
+  require(answer == 0 || answer == 1, "an answer is 0 or 1");
+  require(answer == 0 || vad.frameIndex > 0, "the first frame is not speech");
+  require(vad.frameSnr >= 0, "the frame's SNR is not negative");
+  require(vad.calibrationPhase >= 0 && vad.calibrationPhase <= 6, "the last phase is 6");
+  require(vad.calibrationIndex <= 215, "the calibration ends at 215");
+  for (int k = 0; k < MCRA_BINS; ++k) {
+    require(vad.periodogram[k] >= 0 && vad.periodogram[k] < INT64_C(1) << 43, "a power is bounded");
+    require(vad.smoothedPeriodogram[k] < INT64_C(1) << 45, "a smoothed power is bounded");
+    require(vad.minPower[k] >= 21474, "minima have a floor");
+    require(vad.noisePower[k] >= 0 && vad.noisePower[k] < INT64_C(1) << 45, "noise is bounded");
+    require(vad.noiseSmoothing[k] >= 2145336163, "noise keeps 0.999");
+    require(vad.prioriSnr[k] >= 1, "an a priori SNR is never 0");
+    require(vad.gain[k] >= 0 && vad.gain[k] < 1 << 21, "a gain is bounded");
+    require(vad.speechProb[k] == 0 || vad.speechProb[k] > 109521665, "small probabilities are cut");
+  }
+  require(std::count(std::begin(vad.reserved), std::end(vad.reserved), 0) == 80, "reserved is 0");
+}
+
+void judge(VADINFO *vad, const std::vector<std::int16_t> &audio, std::int32_t length,
+           float exponent) {
+  for (std::size_t at = 0; at + MCRA_FRAME_SAMPLES <= audio.size(); at += MCRA_FRAME_SAMPLES) {
+    // Without spare capacity, so that reading or writing beyond it is noticed.
+    std::vector<std::int16_t> frame(&audio[at], &audio[at] + MCRA_FRAME_SAMPLES);
+    const std::int32_t index = vad->frameIndex;
+    require_invariants(*vad, processVAD(&vad, frame.data(), length, exponent));
+    require(vad->frameIndex == index + 1, "frames are counted");
+  }
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
+  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  Input input(bytes, size);
+  const auto record = std::make_unique<VADINFO>();
+  VADINFO *vad = record.get();
+  initialVADINFO(&vad);
+  configure(*vad, input);
+
+  for (std::size_t heard = 0; !input.is_empty() && heard < kMostSamples;) {
+    switch (input.byte() % 8) {
+      case 0:
+        reset_MCRA_params(&vad);
+        break;
+      case 1:
+        initialVADINFO(&vad);
+        break;
+      case 2:
+        configure(*vad, input);
+        break;
+      case 3: {
+        std::vector<std::int16_t> frame = input.audio();
+        frame.resize(MCRA_FRAME_SAMPLES);
+        ApplyVAD(&vad, frame.data(), input.number());
+        break;
+      }
+      default: {
+        const std::int32_t length = input.number();
+        const float exponent = read_exponent(input);
+        const std::vector<std::int16_t> audio = input.audio();
+        heard += audio.size();
+        judge(vad, audio, length, exponent);
+      }
+    }
+  }
+  return 0;
+}
