@@ -2,7 +2,9 @@
 
 #include <orvalis.h>
 
+#include <algorithm>
 #include <cstdint>
+#include <cstdlib>
 #include <memory>
 #include <new>
 #include <span>
@@ -11,6 +13,7 @@
 
 #include "cli/audio_source.h"
 #include "cli/excerpts.h"
+#include "cli/report_input.h"
 
 namespace orvalis::cli {
 namespace {
@@ -18,6 +21,15 @@ namespace {
 struct EpdCloser {
   void operator()(EpdInstance *epd) const { FreeMemoryEPD(epd); }
 };
+
+/// Of what the detector keeps to itself only its answer is known; the level is that of the audio.
+Trace trace_of(std::int32_t answer, std::span<const std::int16_t> frame) {
+  const auto samples = static_cast<std::int32_t>(frame.size());
+  const auto peak = std::ranges::max(frame, {}, [](int sample) { return std::abs(sample); });
+  return {{"answer", std::int64_t{answer}},
+          {"energy", std::int64_t{computeEnergy(frame.data(), samples)}},
+          {"peak", std::int64_t{std::abs(peak)}}};
+}
 
 class Detection {
 public:
@@ -32,15 +44,13 @@ public:
   }
 
   void run() {
-    report_.begin_file(name_, source_.rate_hz());
-    if (settings_.frames) {
-      report_frames();
-    } else {
-      report_utterances();
-    }
-    report_.end_file(source_.samples_read());
-    // Last, so that a damaged file still gives what could be decided.
-    source_.check_complete();
+    report_input(name_, source_, report_, [this] {
+      if (settings_.frames || settings_.trace) {
+        report_frames();
+      } else {
+        report_utterances();
+      }
+    });
   }
 
 private:
@@ -70,8 +80,14 @@ private:
     std::int64_t number = 0;
     source_.for_each_block(frame_length, [&](std::span<const std::int16_t> frame) {
       const auto samples = static_cast<std::int32_t>(frame.size());
-      report_.frame(number++, ProcessEPDFrameByCnttype(epd.get(), frame.data(), samples,
-                                                       detector.content_type));
+      const std::int32_t answer =
+          ProcessEPDFrameByCnttype(epd.get(), frame.data(), samples, detector.content_type);
+      if (settings_.trace) {
+        report_.trace(number, static_cast<double>(number) / 100, trace_of(answer, frame));
+      } else {
+        report_.frame(number, answer);
+      }
+      ++number;
       tell_advance();
     });
   }

@@ -16,6 +16,7 @@ struct DetectionSettings {
   AudioSettings audio;
   UtteranceSettings detector = UTTERANCE_SETTINGS_DEFAULT;
   bool frames = false;  ///< Answers to frames instead of utterances
+  bool trace = false;   ///< The same with the frames' levels
   SplitSettings split;
 };
 

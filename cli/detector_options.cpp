@@ -65,6 +65,13 @@ std::unique_ptr<Report> make_report(const std::string &format, const std::string
   return format == "labels" ? make_labels_report() : make_textgrid_report();
 }
 
+std::string trace_format(const CLI::App &command, const std::string &picked) {
+  if (command.get_option("--format")->count() == 0) return "csv";
+  if (picked == "csv" || picked == "json") return picked;
+  throw CLI::ValidationError("--trace",
+                             "the format " + picked + " holds no trace; use csv or json");
+}
+
 void prepare_split(const SplitSettings &split, const std::vector<std::string> &inputs) {
   if (split.folder.empty()) return;
   if (const std::string pair = same_parts(inputs); !pair.empty())

@@ -30,6 +30,10 @@ void add_report_option(CLI::App &command, const std::string &option, std::string
 std::unique_ptr<Report> make_report(const std::string &format, const std::string &option,
                                     std::size_t inputs);
 
+/// The format of a trace: csv, unless the user has picked one by --format. Throws
+/// CLI::ValidationError for one that holds no frames.
+std::string trace_format(const CLI::App &command, const std::string &picked);
+
 /// Refuses an empty name.
 CLI::Validator not_empty();
 

@@ -38,10 +38,11 @@ void prepare_dump(EpdOptions &options) {
   options.detection.detector.pcm_dump = 1;
 }
 
-int run_epd(EpdOptions &options) {
+int run_epd(const CLI::App &command, EpdOptions &options) {
   if (std::ranges::count(options.files, "-") > 1)
     throw CLI::ValidationError("FILE", "standard input can be read only once");
-  const std::string &format = options.format;
+  std::string &format = options.format;
+  if (options.detection.trace) format = trace_format(command, format);
   if (options.detection.frames && format != "table" && format != "json" && format != "csv")
     throw CLI::ValidationError("--frames", "the format " + format + " knows utterances only");
   options.detection.detector.input_gain = options.gain == "0.25" ? 1 : options.gain == "4" ? 2 : 0;
@@ -121,6 +122,13 @@ void add_epd_command(CLI::App &app, int &exit_status) {
       ->excludes(utterances.pad_before)
       ->excludes(utterances.pad_after)
       ->excludes(utterances.split);
+  epd->add_flag("--trace", options->detection.trace,
+                "Print the answer to every frame and its level,\nas csv or json")
+      ->excludes(utterances.hangover)
+      ->excludes(utterances.pad_before)
+      ->excludes(utterances.pad_after)
+      ->excludes(utterances.split)
+      ->excludes("--frames");
   auto *jobs = epd->add_option("--jobs", options->jobs, "Files to work on at once")
                    ->check(from_to(1, 256))
                    ->type_name("N")
@@ -133,7 +141,7 @@ void add_epd_command(CLI::App &app, int &exit_status) {
       ->type_name("DIR");
 
   add_audio_options(*epd, options->detection.audio);
-  epd->callback([options, &exit_status] { exit_status = run_epd(*options); });
+  epd->callback([options, epd, &exit_status] { exit_status = run_epd(*epd, *options); });
 }
 
 }  // namespace orvalis::cli

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cctype>
 #include <filesystem>
+#include <variant>
 #include <vector>
 
 namespace orvalis::cli {
@@ -18,6 +19,7 @@ public:
     rate_hz_ = rate_hz;
   }
   void frame(std::int64_t, int) override {}
+  void trace(std::int64_t, double, const Trace &) override {}
   void end_file(std::int64_t) override {}
 
 protected:
@@ -43,6 +45,17 @@ public:
                            static_cast<double>(number) / 100, answer));
   }
 
+  void trace(std::int64_t number, double start_s, const Trace &values) override {
+    std::string names = "file,frame,start";
+    std::string line = fmt::format("{},{},{:.2f}", quoted(name_), number, start_s);
+    for (const TraceValue &traced : values) {
+      names += std::string(",") + traced.name;
+      std::visit([&](auto value) { line += fmt::format(",{}", value); }, traced.value);
+    }
+    header(names);
+    print_line(line);
+  }
+
 private:
   static std::string quoted(const std::string &field) {
     if (field.find_first_of(",\"\r\n") == std::string::npos) return field;
@@ -51,7 +64,7 @@ private:
     return text + '"';
   }
 
-  void header(const char *names) {
+  void header(const std::string &names) {
     if (!has_header_) print_line(names);
     has_header_ = true;
   }

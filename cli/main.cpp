@@ -14,6 +14,7 @@
 #include "cli/epd_command.h"
 #include "cli/query_commands.h"
 #include "cli/report.h"
+#include "cli/vad_command.h"
 
 namespace {
 
@@ -38,11 +39,13 @@ int run(int argc, char **argv) {
   app.footer(
       "Examples:\n"
       "  orvalis epd meeting.wav                 the utterances of a recording\n"
+      "  orvalis vad meeting.wav                 the same by another detector\n"
       "  orvalis denoise meeting.wav clean.wav   the recording without its noise\n"
       "  orvalis process meeting.wav out.wav     all that a voice front end does to it\n"
       "  orvalis energy meeting.wav              how loud every 20 ms of it are\n"
       "  orvalis denoise --help                  all about the command denoise");
   orvalis::cli::add_epd_command(app, exit_status);
+  orvalis::cli::add_vad_command(app, exit_status);
   orvalis::cli::add_enhance_commands(app, exit_status);
   orvalis::cli::add_query_commands(app, exit_status);
   app.add_subcommand("version", "Print the versions of the tool and of the library")->callback([] {

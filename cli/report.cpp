@@ -3,9 +3,11 @@
 #include <fmt/format.h>
 
 #include <cerrno>
+#include <cmath>
 #include <cstdio>
 #include <nlohmann/json.hpp>
 #include <system_error>
+#include <variant>
 
 #include "cli/progress.h"
 
@@ -34,6 +36,8 @@ public:
     column_names("    frame     start    answer");
     print_line(fmt::format("{:9} {:9.2f} {:9}", number, static_cast<double>(number) / 100, answer));
   }
+
+  void trace(std::int64_t, double, const Trace &) override {}
 
   void end_file(std::int64_t) override {
     if (empty_) print_line("no utterance");
@@ -84,9 +88,24 @@ public:
            {"answer", answer}});
   }
 
+  void trace(std::int64_t number, double start_s, const Trace &values) override {
+    nlohmann::ordered_json line = {
+        {"file", name_}, {"rate", rate_hz_}, {"frame", number}, {"start", start_s}};
+    for (const TraceValue &traced : values)
+      std::visit([&](auto value) { line[traced.name] = json_number(value); }, traced.value);
+    print(line);
+  }
+
   void end_file(std::int64_t) override {}
 
 private:
+  static nlohmann::ordered_json json_number(std::int64_t value) { return value; }
+
+  /// In as many digits as single precision has; what is no number is null.
+  static nlohmann::ordered_json json_number(float value) {
+    return std::isfinite(value) ? nlohmann::ordered_json::parse(fmt::format("{}", value)) : nullptr;
+  }
+
   double seconds(std::int64_t samples) const { return static_cast<double>(samples) / rate_hz_; }
 
   static void print(const nlohmann::ordered_json &line) {

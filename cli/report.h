@@ -6,6 +6,7 @@
 #include <memory>
 #include <string>
 
+#include "cli/trace.h"
 #include "utterance_stream.h"
 
 namespace orvalis::cli {
@@ -21,6 +22,8 @@ public:
   virtual void utterance(const Utterance &utterance) = 0;
   /// The detector's answer to a frame of 10 ms, numbered from 0.
   virtual void frame(std::int64_t number, int answer) = 0;
+  /// What led to an answer; start_s is the time at which the frame starts. For csv and json.
+  virtual void trace(std::int64_t number, double start_s, const Trace &values) = 0;
   /// All of `samples` were heard.
   virtual void end_file(std::int64_t samples) = 0;
 };

@@ -19,6 +19,9 @@ public:
   void frame(std::int64_t number, int answer) override {
     turn_.act([number, answer, &report = report_] { report.frame(number, answer); });
   }
+  void trace(std::int64_t number, double start_s, const Trace &values) override {
+    turn_.act([=, &report = report_] { report.trace(number, start_s, values); });
+  }
   void end_file(std::int64_t samples) override {
     turn_.act([samples, &report = report_] { report.end_file(samples); });
   }

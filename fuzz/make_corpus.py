@@ -79,7 +79,8 @@ def mcra_frame():
         yield name, configuration(1, 1, 1) + b"".join(
             heard(piece, exponent=exponent) for piece in (noise(9600, 60), *speech) * 2)
     yield "lengths", configuration() + b"".join(
-        heard(noise(1600), length) for length in (0, 1, 100, 161, -1, (1 << 31) - 1))
+        heard(noise(1600), length) for length in (0, 1, 100, 161, -1, (1 << 31) - 1)) + (
+            heard(constant(1600, -32768), 0))
     yield "full_scale", configuration() + b"".join(
         heard(piece) for piece in [constant(4000, 0), constant(4000, -32768), voice(8000, 32767),
                                    noise(8000, 32767), constant(4000, 0),

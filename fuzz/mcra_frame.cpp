@@ -36,10 +36,10 @@ void require_invariants(const VADINFO &vad, std::int32_t answer) {
   require(vad.calibrationPhase >= 0 && vad.calibrationPhase <= 6, "the last phase is 6");
   require(vad.calibrationIndex <= 215, "the calibration ends at 215");
   for (int k = 0; k < MCRA_BINS; ++k) {
-    require(vad.periodogram[k] >= 0 && vad.periodogram[k] < INT64_C(1) << 43, "a power is bounded");
-    require(vad.smoothedPeriodogram[k] < INT64_C(1) << 45, "a smoothed power is bounded");
+    require(vad.periodogram[k] >= 0 && vad.periodogram[k] < INT64_C(1) << 45, "a power is bounded");
+    require(vad.smoothedPeriodogram[k] < INT64_C(1) << 47, "a smoothed power is bounded");
     require(vad.minPower[k] >= 21474, "minima have a floor");
-    require(vad.noisePower[k] >= 0 && vad.noisePower[k] < INT64_C(1) << 45, "noise is bounded");
+    require(vad.noisePower[k] >= 0 && vad.noisePower[k] < INT64_C(1) << 47, "noise is bounded");
     require(vad.noiseSmoothing[k] >= 2145336163, "noise keeps 0.999");
     require(vad.prioriSnr[k] >= 1, "an a priori SNR is never 0");
     require(vad.gain[k] >= 0 && vad.gain[k] < 1 << 21, "a gain is bounded");

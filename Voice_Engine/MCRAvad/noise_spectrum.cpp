@@ -10,8 +10,8 @@
 namespace orvalis {
 namespace {
 
-// 160 samples at full scale make a periodogram below 2^43 and, as the neighbours' weights add up to
-// 4, smoothed powers below 2^45: sums of them need no saturation.
+// 160 samples at full scale make a periodogram below 2^45, even without the window, and as the
+// neighbours' weights add up to 4, smoothed powers below 2^47: sums of them need no saturation.
 constexpr Word32 kFrameSamples = MCRA_FRAME_SAMPLES;
 
 /// Weighted sum of a bin and its neighbours, as far as there are any.
