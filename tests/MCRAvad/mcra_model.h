@@ -1,5 +1,5 @@
 // The analysis of the MCRA detector once more, step by step as it is defined, over the exported
-// mathematics. It keeps a state of its own; powers must stay below 2^46.
+// mathematics. It keeps a state of its own.
 #pragma once
 
 #include <cstdint>

@@ -65,7 +65,7 @@ done
 
 # The manual page knows every option of the help.
 commands=$("$work/moved/bin/orvalis" --help | sed -n '/^Subcommands:/,/^$/s/^  \([a-z][a-z]*\).*/\1/p')
-check "the commands" "epd denoise level process energy spectrum version" "$(echo $commands)"
+check "the commands" "epd vad denoise level process energy spectrum version" "$(echo $commands)"
 for command in $commands; do
   options=$("$work/moved/bin/orvalis" "$command" --help | sed -n '/^Options:/,/^$/p' |
     grep -o -e '--[a-z][a-z-]*')
