@@ -164,10 +164,10 @@ void OutputFile::check(bool good) const {
 
 template <class Sample>
 void OutputFile::append(std::span<const Sample> samples,
-                        sf_count_t (*write)(SNDFILE *, const Sample *, sf_count_t)) {
+                        sf_count_t (*encode)(SNDFILE *, const Sample *, sf_count_t)) {
   const auto count = static_cast<sf_count_t>(samples.size());
   if (count > 0) lacks_samples_ = false;
-  check(write(file_.get(), samples.data(), count) == count);
+  check(encode(file_.get(), samples.data(), count) == count);
 }
 
 void OutputFile::write(std::span<const short> samples) { append(samples, sf_write_short); }

@@ -48,7 +48,7 @@ private:
 
   template <class Sample>
   void append(std::span<const Sample> samples,
-              sf_count_t (*write)(SNDFILE *, const Sample *, sf_count_t));
+              sf_count_t (*encode)(SNDFILE *, const Sample *, sf_count_t));
   [[noreturn]] void fail(int error) const;
   void check(bool good) const;
 
