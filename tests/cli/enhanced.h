@@ -2,9 +2,9 @@
 #pragma once
 
 #include <orvalis.h>
+#include <algorithm>
 
 #include <array>
-#include <cstring>
 #include <string>
 #include <vector>
 
@@ -23,7 +23,7 @@ inline std::string bytes_of(const Pcm &samples) {
 
 inline Pcm samples_of(const std::string &bytes) {
   Pcm samples(bytes.size() / 2);
-  std::memcpy(samples.data(), bytes.data(), 2 * samples.size());
+  std::copy_n(bytes.data(), 2 * samples.size(), reinterpret_cast<char *>(samples.data()));
   return samples;
 }
 
