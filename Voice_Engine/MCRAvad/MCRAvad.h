@@ -51,8 +51,8 @@
  *   8 kHz     20 ms     31.25 Hz  0 to 1.25 kHz
  *
  * The first frame is never speech, and it is the first estimate of the noise: begin with
- * background. Frames below about -45 dB of full scale are not speech (-49 dB with an energyMargin
- * of 1).
+ * background. Frames below about -45 dB of full scale are rarely speech (-48 dB with an
+ * energyMargin of 1).
  *
  *
  * Life of a record
