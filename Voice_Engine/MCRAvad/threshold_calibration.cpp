@@ -47,7 +47,7 @@ void take_frame(VADINFO &vad, Word32 base, float frame_energy) {
 
 void advance_window(VADINFO &vad, float frame_energy, float exponent) {
   const Word32 phase = vad.calibrationPhase;
-  if (phase > kLastPhase) return;
+  if (phase < 0 || phase > kLastPhase) return;
   const Word32 base = kWindowStep * phase;
   const Word32 end = base + kWindowFrames;
   // The last window only waits for its end, which no other window reaches: the threshold rests.
