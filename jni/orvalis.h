@@ -170,7 +170,7 @@ typedef struct NsInstance NsInstance;
  *   micCount   mode                         samples a frame       suppresses    delay
  *   1          0 (or rate digit 0)          160                   13 dB         48 samples
  *   1          2                            160                   18.4 dB       48 samples
- *   2          any                          320: 160 pairs        14 dB         160 samples
+ *   2          any                          320: 160 pairs        up to 14 dB   160 samples
  *   other      any                          as for 1              nothing       none
  *
  * With one microphone the thousands of the mode are its rate digit, as for InitializeEPD: 1 makes
