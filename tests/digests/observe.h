@@ -1,0 +1,89 @@
+// What a service shows beside its answers: the flags of all operators, its log lines, its dump
+// files. A handle's number, which lines and names hold, is read as '#'.
+#pragma once
+
+#include <cstring>
+#include <filesystem>
+#include <map>
+#include <stdexcept>
+#include <string>
+
+#include "Voice_Engine/platform/dump_file.h"
+#include "jni/orvalis.h"
+#include "tests/digests/hostile.h"
+#include "tests/digests/judge.h"
+#include "tests/support/child_process.h"
+#include "tests/support/flag_words.h"
+#include "tests/support/scripted_malloc.h"
+#include "tests/support/temporary_folder.h"
+
+namespace orvalis::test {
+
+class Observer {
+public:
+  explicit Observer(Judge &judge) : judge_(judge) {
+    std::filesystem::create_directories(folder_.path() / "sdcard/VRpreprocess");
+    if (SetDumpRoot(folder_.path().c_str()) != 0) throw std::runtime_error("no dump root");
+    SetLogSink(
+        [](int priority, const char *tag, const char *text, void *self) {
+          static_cast<Observer *>(self)->lines_ +=
+              std::to_string(priority) + '/' + tag + ": " + text + '\n';
+        },
+        this);
+    write_flags({});
+  }
+  ~Observer() {
+    SetLogSink(nullptr, nullptr);
+    SetDumpRoot(nullptr);
+  }
+  Observer(const Observer &) = delete;
+  Observer &operator=(const Observer &) = delete;
+
+  /// The instance whose number is a handle's.
+  void watch(const void *handle) { number_ = std::to_string(handle_number(handle)); }
+
+  /// Sometimes leaves what no operator would in the flags, as a host may.
+  void disturb_flags(Random &random) {
+    if (draw(random, 0, 7) != 0) return;
+    FlagWords words;
+    words.fill(pick(random, {0, 1, 7}));
+    write_flags(words);
+  }
+
+  /// Ends a call: flags and lines join what the service has taken.
+  void call() {
+    judge_.take(read_flags(), anonymous(lines_));
+    lines_.clear();
+    judge_.call();
+  }
+
+  /// Takes the names and contents of all dump files there are and removes them.
+  void take_dumps() {
+    std::map<std::string, Pcm> dumps;
+    for (const auto &file :
+         std::filesystem::recursive_directory_iterator(folder_.path() / "sdcard")) {
+      if (!file.is_regular_file()) continue;
+      const std::string bytes = read_file(file.path());
+      Pcm &samples = dumps[anonymous(file.path().lexically_relative(folder_.path()))];
+      samples.resize(bytes.size() / sizeof samples[0]);
+      std::memcpy(samples.data(), bytes.data(), bytes.size());
+      std::filesystem::remove(file.path());
+    }
+    for (const auto &[name, samples] : dumps) judge_.take(name, samples);
+    call();
+  }
+
+private:
+  std::string anonymous(std::string text) const {
+    for (std::size_t at = 0; (at = text.find(number_, at)) != std::string::npos;)
+      text.replace(at, number_.size(), "#");
+    return text;
+  }
+
+  Judge &judge_;
+  TemporaryFolder folder_;
+  std::string lines_;
+  std::string number_ = "no number";
+};
+
+}  // namespace orvalis::test
