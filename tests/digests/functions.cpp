@@ -1,6 +1,7 @@
 // The extended mathematics and its tables.
 #include "Math_baseop.h"
 
+#include "tests/digests/observe.h"
 #include "tests/digests/sweep.h"
 
 namespace orvalis::test {
@@ -50,6 +51,16 @@ TEST(Digests, Functions) {
     for (const double x : {0.0, -0.0, 1.5, -1.5, 1e300, -1e300, -5e-324})
       judge.take(ZOLT_abs_double(x));
     judge.call();
+  });
+  judge.sequence("out-of-range", [&] {
+    for (const std::int64_t x : {-2, -1, 0, 1}) {
+      judge.take(last_words([&] { ZOLT_L64_div(5, x); }));
+      judge.take(last_words([&] { ZOLT_L64_sqrt_Q0(x); }));
+      for (const std::int16_t q : {-40, -32, -31, -15, 0, 14, 15, 16, 31, 40})
+        for (const std::int32_t value : {static_cast<std::int32_t>(x), 32767, 32768, INT32_MAX})
+          judge.take(last_words([&] { ZOLT_L_pow2_plus(value, q, 0, 1); }));
+      judge.call();
+    }
   });
   judge.sequence("windows", [&] {
     Random random(12);

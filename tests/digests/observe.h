@@ -1,7 +1,13 @@
 // What a service shows beside its answers: the flags of all operators, its log lines, its dump
-// files. A handle's number, which lines and names hold, is read as '#'.
+// files, and what it prints before it ends the process. A handle's number, which lines and names
+// hold, is read as '#'.
 #pragma once
 
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <map>
@@ -18,6 +24,28 @@
 #include "tests/support/temporary_folder.h"
 
 namespace orvalis::test {
+
+/// What a call prints, and how the process ends that makes it.
+template <class Call>
+std::string last_words(Call call) {
+  std::fflush(stdout);  // or the child repeats what is still buffered
+  int ends[2];
+  if (pipe(ends) != 0) throw std::runtime_error("no pipe");
+  const pid_t child = fork();
+  if (child == 0) {
+    dup2(ends[1], STDOUT_FILENO);
+    call();
+    std::puts("returned");
+    std::exit(77);
+  }
+  close(ends[1]);
+  std::string words;
+  for (char letter; read(ends[0], &letter, 1) == 1;) words += letter;
+  close(ends[0]);
+  int status = 0;
+  waitpid(child, &status, 0);
+  return words + std::to_string(WIFEXITED(status) ? WEXITSTATUS(status) : -1);
+}
 
 class Observer {
 public:
@@ -57,8 +85,10 @@ public:
     judge_.call();
   }
 
-  /// Takes the names and contents of all dump files there are and removes them.
+  /// Takes the names and contents of all dump files there are and removes them; and whether files
+  /// were left open.
   void take_dumps() {
+    judge_.take(open_files() - opened_before_);
     std::map<std::string, Pcm> dumps;
     for (const auto &file :
          std::filesystem::recursive_directory_iterator(folder_.path() / "sdcard")) {
@@ -74,6 +104,10 @@ public:
   }
 
 private:
+  static std::ptrdiff_t open_files() {
+    return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
+  }
+
   std::string anonymous(std::string text) const {
     for (std::size_t at = 0; (at = text.find(number_, at)) != std::string::npos;)
       text.replace(at, number_.size(), "#");
@@ -82,6 +116,7 @@ private:
 
   Judge &judge_;
   TemporaryFolder folder_;
+  std::ptrdiff_t opened_before_ = open_files();
   std::string lines_;
   std::string number_ = "no number";
 };

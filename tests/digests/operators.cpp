@@ -1,6 +1,7 @@
 // The operators of all three copies, with all flags that they leave, their tables, and block
 // scaling.
 #include "basic_op.h"
+#include "tests/digests/observe.h"
 #include "tests/digests/sweep.h"
 
 namespace orvalis::test {
@@ -115,6 +116,16 @@ TEST(Digests, Operators) {
   ZOLT(div_s, [](int a, int b) { return a >= 0 && a <= b && b > 0; });
   ZOLT(div_l, [](int a, int b) { return a >= 0 && b > 0; });
 
+  judge.sequence("ZOLT-divisions-out-of-range", [&] {
+    for (const int a : {-1, 0, 1, 5}) {
+      for (const int b : {-1, 0, 1, 3}) {
+        const auto divisor = static_cast<std::int16_t>(b);
+        judge.take(last_words([&] { ZOLT_div_s(static_cast<std::int16_t>(a), divisor); }));
+        judge.take(last_words([&] { ZOLT_div_l(a, divisor); }));
+        judge.call();
+      }
+    }
+  });
   judge.sequence("tablog", [&] {
     judge.take(tablog);
     judge.call();

@@ -57,11 +57,13 @@ void cross(Visit visit, const List &first, const Lists &...rest) {
   for (const auto x : first) cross([&](auto... tail) { visit(x, tail...); }, rest...);
 }
 
+constexpr auto kEverywhere = [](auto...) { return true; };
+
 /// Folds a function's results, and all flags that it leaves from standing ones of 0 and 1, into a
 /// sequence. `defined` says which operands it may be called with.
-template <class Function, class Result, class... Words, class Defined>
-void sweep_as(Judge &judge, const std::string &name, Function function, Result (*)(Words...),
-              Defined defined) {
+template <class Result, class... Words, class Defined = decltype(kEverywhere)>
+void sweep(Judge &judge, const std::string &name, Result (*function)(Words...),
+           Defined defined = kEverywhere) {
   judge.sequence(name, [&] {
     constexpr int kBlock = 4096;
     int calls = 0;
@@ -102,14 +104,6 @@ void sweep_as(Judge &judge, const std::string &name, Function function, Result (
     }
     judge.call(block);
   });
-}
-
-constexpr auto kEverywhere = [](auto...) { return true; };
-
-template <class Result, class... Words, class Defined = decltype(kEverywhere)>
-void sweep(Judge &judge, const std::string &name, Result (*function)(Words...),
-           Defined defined = kEverywhere) {
-  sweep_as(judge, name, function, function, defined);
 }
 
 }  // namespace orvalis::test

@@ -4,9 +4,7 @@
 #include "float_fft.h"
 #include "noscale_fft_512p.h"
 #include "orvalis.h"
-#include "tests/digests/hostile.h"
-#include "tests/digests/judge.h"
-#include "tests/support/flag_words.h"
+#include "tests/digests/observe.h"
 
 namespace orvalis::test {
 namespace {
@@ -115,6 +113,18 @@ TEST(Digests, UnscaledFft) {
   });
   each_block<std::int32_t>(judge, "int_bitrev_32bit", 512, [&](auto &block, Random &) {
     int_bitrev_32bit(256, block.data(), &block[256], fix_bitrev_256);
+  });
+  judge.sequence("refusals", [&] {
+    std::int16_t in[512] = {};
+    std::int32_t re[512], im[512];
+    for (const auto frame : {Noscale_FFT_512p_Frame, Noscale_FFT_256p_Frame_64bit}) {
+      for (const std::int32_t length : {-1, 0, 1, 256, 257, 512, 513})
+        judge.take(last_words([&] { std::exit(1 + frame(in, length, re, im)); }));
+      judge.take(last_words([&] { std::exit(1 + frame(nullptr, 160, re, im)); }));
+      judge.take(last_words([&] { std::exit(1 + frame(in, 160, nullptr, im)); }));
+      judge.take(last_words([&] { std::exit(1 + frame(in, 160, re, nullptr)); }));
+      judge.call();
+    }
   });
   judge.sequence("tables", [&] {
     judge.take(sin_table_fft_512_noscale, sin_table_fft_256_noscale, fix_bitrev_512,
