@@ -147,6 +147,17 @@ TEST(Digests, TwoMicrophones) {
     for (std::size_t i = pairs.size() / 3 | 1; i < 2 * pairs.size() / 3; i += 2) dying[i] = 0;
     run_two(judge, dying, 1);
   });
+  judge.sequence("barely-audible", [&] {
+    Pcm quiet;
+    for (int frame = 0; frame < 60; ++frame) {
+      for (int i = 0; i < 160; ++i) {  // magnitudes that sum up to 1599, 1600 or 1601
+        const int sample = i == 0 ? 9 + frame % 3 : 10;
+        quiet.push_back(static_cast<std::int16_t>((frame + i) % 3 == 0 ? -sample : sample));
+        quiet.push_back(static_cast<std::int16_t>(i * frame % 100));
+      }
+    }
+    run_two(judge, quiet, 1);
+  });
   judge.sequence("bad-length", [&] {
     S2chnsState state{};
     Pcm out(2000, 7);
