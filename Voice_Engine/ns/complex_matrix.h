@@ -40,27 +40,29 @@ ORVALIS_KERNEL Matrix operator-(const Matrix &a, const Matrix &b) {
   return {a.m11 - b.m11, a.m12 - b.m12, a.m21 - b.m21, a.m22 - b.m22};
 }
 
-ORVALIS_KERNEL Matrix operator*(const Matrix &a, const Matrix &b) {
+ORVALIS_KERNEL Matrix mul_2by2_matrix(const Matrix &a, const Matrix &b) {
   return {a.m11 * b.m11 + a.m12 * b.m21, a.m11 * b.m12 + a.m12 * b.m22,
           a.m21 * b.m11 + a.m22 * b.m21, a.m21 * b.m12 + a.m22 * b.m22};
 }
 
-ORVALIS_KERNEL Bin row_times_column(Pair row, Pair column) {
-  return row.first * column.first + row.second * column.second;
+/// Row times column.
+ORVALIS_KERNEL Bin mul_1by2_2by1_matrix(const Pair &a, const Pair &b) {
+  return a.first * b.first + a.second * b.second;
 }
 
-ORVALIS_KERNEL Pair row_times_matrix(Pair row, const Matrix &m) {
-  return {row.first * m.m11 + row.second * m.m21, row.first * m.m12 + row.second * m.m22};
+/// Row times matrix, a row.
+ORVALIS_KERNEL Pair mul_1by2_2by2_matrix(const Pair &a, const Matrix &b) {
+  return {a.first * b.m11 + a.second * b.m21, a.first * b.m12 + a.second * b.m22};
 }
 
-ORVALIS_KERNEL Matrix column_times_row(Pair column, Pair row) {
-  return {column.first * row.first, column.first * row.second, column.second * row.first,
-          column.second * row.second};
+/// Column times row, a matrix.
+ORVALIS_KERNEL Matrix mul_2by1_1by2_matrix(const Pair &a, const Pair &b) {
+  return {a.first * b.first, a.first * b.second, a.second * b.first, a.second * b.second};
 }
 
-/// The adjugate times the determinant's conjugate, over the determinant's power. A singular matrix
-/// gives infinities or not-a-numbers.
-ORVALIS_KERNEL Matrix inverse(const Matrix &a) {
+/// a^-1: the adjugate times the determinant's conjugate, over the determinant's power. A singular
+/// matrix gives infinities or not-a-numbers.
+ORVALIS_KERNEL Matrix inv_matrix(const Matrix &a) {
   const Bin determinant = a.m11 * a.m22 - a.m12 * a.m21;
   const float n = power(determinant);
   const Complex<double> d = widened(determinant);
@@ -73,12 +75,13 @@ ORVALIS_KERNEL Matrix inverse(const Matrix &a) {
           over_determinant(a.m11)};
 }
 
-/// Coefficients of the parametric multichannel Wiener filter from m = Phi_vv^-1 Phi_yy; the first
-/// column is the filter that estimates the speech at the first microphone. beta trades distortion
-/// for suppression. The 1 beside |d|^2 bounds the coefficients where d is small.
+/// Coefficients of the parametric multichannel Wiener filter from m = Phi_vv^-1 Phi_yy:
+/// (m - I) conj(d) / (|d|^2 + 1) with d = beta + tr(m) - 2. The first column is the filter that
+/// estimates the speech at the first microphone. beta trades distortion for suppression. The 1
+/// beside |d|^2 bounds the coefficients where d is small.
 /// Source: M. Souden, J. Benesty, S. Affes, "On optimal frequency-domain multichannel linear
 /// filtering for noise reduction", 2010.
-ORVALIS_KERNEL Matrix pmwf_coefficients(const Matrix &m, float beta) {
+ORVALIS_KERNEL Matrix compute_PMWF_coeff(const Matrix &m, float beta) {
   const Bin d = {static_cast<float>(static_cast<double>(m.m11.re) + m.m22.re - 2.0 + beta),
                  m.m11.im + m.m22.im};
   const double denominator = power(d) + 1.0;
@@ -91,5 +94,26 @@ ORVALIS_KERNEL Matrix pmwf_coefficients(const Matrix &m, float beta) {
   return {coefficient(m.m11 - one), coefficient(m.m12), coefficient(m.m21),
           coefficient(m.m22 - one)};
 }
+
+/// A matrix for each bin, in split form: four real parts a bin, row by row, and four imaginary
+/// ones.
+struct Matrices {
+  float re[4 * kTransformBins];
+  float im[4 * kTransformBins];
+
+  ORVALIS_KERNEL Matrix load(int bin) const {
+    const float *x = re + 4 * bin;
+    const float *y = im + 4 * bin;
+    return {{x[0], y[0]}, {x[1], y[1]}, {x[2], y[2]}, {x[3], y[3]}};
+  }
+
+  ORVALIS_KERNEL void store(int bin, const Matrix &m) {
+    const Bin elements[] = {m.m11, m.m12, m.m21, m.m22};
+    for (int i = 0; i < 4; ++i) {
+      re[4 * bin + i] = elements[i].re;
+      im[4 * bin + i] = elements[i].im;
+    }
+  }
+};
 
 }  // namespace orvalis

@@ -40,16 +40,27 @@ ORVALIS_KERNEL float smoothed(double keep, float old, float now) {
   return static_cast<float>(keep * old + (1.0 - keep) * now);
 }
 
-ORVALIS_KERNEL void smooth(Matrices &covariance, const Matrices &now, int bin, double keep) {
+ORVALIS_KERNEL void smooth(Matrices &covariance, int bin, double keep, const Matrices &now) {
   for (int i = 4 * bin; i < 4 * bin + 4; ++i) {
     covariance.re[i] = smoothed(keep, covariance.re[i], now.re[i]);
     covariance.im[i] = smoothed(keep, covariance.im[i], now.im[i]);
   }
 }
 
-ORVALIS_KERNEL void smooth(Matrices &covariance, const Matrices &now) {
-  for (int k = 0; k < kTransformBins; ++k) smooth(covariance, now, k, cov_smoothing);
-}
+/// Both channels of a frame.
+struct Spectra {
+  Spectrum first, second;
+  Matrices YY;  ///< Y Y^H
+
+  ORVALIS_KERNEL Pair Y(int bin) const { return {first[bin], second[bin]}; }
+};
+
+/// What tells speech from noise in the bins of a frame.
+struct Ratios {
+  float gamma[kTransformBins];  ///< a posteriori ratio
+  float r[kTransformBins];      ///< trace of Phi_vv^-1 Phi_yy; r - 2 is the a priori ratio
+  float beta[kTransformBins];   ///< power of the speech behind the noise's inverse
+};
 
 /// The spectrum of a channel's previous and new frame under the window; the new frame becomes the
 /// previous one.
@@ -94,46 +105,42 @@ ORVALIS_KERNEL Bin with_magnitude(Bin y, float magnitude) {
 }
 
 /// The first frames take all audio as noise, and put out the first channel, lowered.
-ORVALIS_KERNEL Spectrum warm_up(S2chnsState &state) {
-  const S2chnsWork &work = state.work;
-  if (state.frame_count == 0) {
-    state.Phi_yy = state.Phi_vv = work.YY;
-  } else {
-    smooth(state.Phi_yy, work.YY);
-    smooth(state.Phi_vv, work.YY);
-  }
+ORVALIS_KERNEL Spectrum warm_up(S2chnsState &state, const Spectra &frame) {
+  if (state.frame_count == 0) state.Phi_yy = state.Phi_vv = frame.YY;
   bufferreset(state.spp_smoothed, kTransformBins);
   bufferreset(state.spp_prev, kTransformBins);
 
   Spectrum output;
   for (int k = 0; k < kTransformBins; ++k) {
-    const Bin Y0 = work.Y.load(k).first;
+    if (state.frame_count > 0) {
+      smooth(state.Phi_yy, k, cov_smoothing, frame.YY);
+      smooth(state.Phi_vv, k, cov_smoothing, frame.YY);
+    }
+    const Bin Y0 = frame.first[k];
     output[k] = with_magnitude(Y0, output_gain * std::sqrt(power(Y0)));
   }
   return output;
 }
 
-/// Forms the ratios that tell speech from noise, for the noise covariance as it stands.
-ORVALIS_KERNEL void form_ratios(S2chnsState &state) {
-  S2chnsWork &work = state.work;
-  inv_matrix(state.Phi_vv, work.Phi_vv_inv);
+/// Re(Y^H a Y)
+ORVALIS_KERNEL float quadratic_form(const Pair &Y, const Matrix &a) {
+  return mul_1by2_2by1_matrix(mul_1by2_2by2_matrix(conj(Y), a), Y).re;
+}
 
-  mul_1by2_2by2_matrix(work.Y_conj, work.Phi_vv_inv, work.row);
-  mul_1by2_2by1_matrix(work.row, work.Y, work.scalar);
-  buffercopy(work.scalar.re, work.gamma, kTransformBins);
-
-  mul_2by2_matrix(work.Phi_vv_inv, state.Phi_yy, work.M);
+/// The ratios for the noise covariance as it stands.
+ORVALIS_KERNEL void form_ratios(const S2chnsState &state, const Spectra &frame, Ratios &ratios) {
   for (int k = 0; k < kTransformBins; ++k) {
-    const Matrix M = work.M.load(k);
-    work.r[k] = M.m11.re + M.m22.re;
-    work.Phi_xx.store(k, state.Phi_yy.load(k) - state.Phi_vv.load(k));
+    const Pair Y = frame.Y(k);
+    const Matrix Phi_yy = state.Phi_yy.load(k);
+    const Matrix Phi_vv = state.Phi_vv.load(k);
+    const Matrix Phi_xx = Phi_yy - Phi_vv;
+    const Matrix Phi_vv_inv = inv_matrix(Phi_vv);
+    const Matrix M = mul_2by2_matrix(Phi_vv_inv, Phi_yy);
+    const Matrix N = mul_2by2_matrix(mul_2by2_matrix(Phi_vv_inv, Phi_xx), Phi_vv_inv);
+    ratios.gamma[k] = quadratic_form(Y, Phi_vv_inv);
+    ratios.r[k] = M.m11.re + M.m22.re;
+    ratios.beta[k] = quadratic_form(Y, N);
   }
-
-  mul_2by2_matrix(work.Phi_vv_inv, work.Phi_xx, work.M);
-  mul_2by2_matrix(work.M, work.Phi_vv_inv, work.N);
-  mul_1by2_2by2_matrix(work.Y_conj, work.N, work.row);
-  mul_1by2_2by1_matrix(work.row, work.Y, work.scalar);
-  buffercopy(work.scalar.re, work.beta, kTransformBins);
 }
 
 /// How much a bin by itself looks like noise: 1 is noise alone.
@@ -171,54 +178,51 @@ ORVALIS_KERNEL float presence_probability(float q, float r, float beta) {
   return std::isnan(p) ? 0 : SAFE_SAP(p);
 }
 
-ORVALIS_KERNEL void find_presence(const S2chnsWork &work, float *p) {
+ORVALIS_KERNEL void find_presence(const Ratios &ratios, float *p) {
   constexpr float kLeastPrior = 0.01F;
   constexpr float kMostPrior = 0.99F;
-  const float global = global_decision(work.gamma);
+  const float global = global_decision(ratios.gamma);
   for (int k = 0; k < kTransformBins; ++k) {
-    const float q = global * local_soft_decision(work.r[k], work.gamma[k]) *
-                    local_averaged_decision(work.gamma, k);
-    p[k] = presence_probability(std::clamp(q, kLeastPrior, kMostPrior), work.r[k], work.beta[k]);
+    const float q = global * local_soft_decision(ratios.r[k], ratios.gamma[k]) *
+                    local_averaged_decision(ratios.gamma, k);
+    p[k] =
+        presence_probability(std::clamp(q, kLeastPrior, kMostPrior), ratios.r[k], ratios.beta[k]);
   }
 }
 
 /// The less speech a bin holds, the faster its noise is learnt.
-ORVALIS_KERNEL void update_noise(S2chnsState &state) {
+ORVALIS_KERNEL void update_noise(S2chnsState &state, const Spectra &frame) {
   for (int k = 0; k < kTransformBins; ++k) {
     const double keep = kLeastNoiseMemory + (1.0 - kLeastNoiseMemory) * state.spp_smoothed[k];
-    smooth(state.Phi_vv, state.work.YY, k, keep);
+    smooth(state.Phi_vv, k, keep, frame.YY);
   }
 }
 
 /// Estimates presence and noise twice: smoothed over time, then with the noise just learnt.
-ORVALIS_KERNEL void track(S2chnsState &state) {
-  smooth(state.Phi_yy, state.work.YY);
+ORVALIS_KERNEL void track(S2chnsState &state, const Spectra &frame) {
+  for (int k = 0; k < kTransformBins; ++k) smooth(state.Phi_yy, k, cov_smoothing, frame.YY);
 
+  Ratios ratios;
   float p[kTransformBins];
-  form_ratios(state);
-  find_presence(state.work, p);
+  form_ratios(state, frame, ratios);
+  find_presence(ratios, p);
   for (int k = 0; k < kTransformBins; ++k)
     state.spp_smoothed[k] = smoothed(kAbsenceMemory, state.spp_prev[k], p[k]);
-  update_noise(state);
+  update_noise(state, frame);
 
-  form_ratios(state);
-  find_presence(state.work, p);
-  buffercopy(p, state.spp_smoothed, kTransformBins);
-  buffercopy(p, state.spp_prev, kTransformBins);
-  update_noise(state);
+  form_ratios(state, frame, ratios);
+  find_presence(ratios, state.spp_smoothed);
+  buffercopy(state.spp_smoothed, state.spp_prev, kTransformBins);
+  update_noise(state, frame);
 }
 
 /// Filters both channels; the output has the first channel's phase and 0.2 to 1 of its magnitude.
-ORVALIS_KERNEL Spectrum filter(S2chnsState &state) {
-  S2chnsWork &work = state.work;
-  inv_matrix(state.Phi_vv, work.Phi_vv_inv);
-  mul_2by2_matrix(work.Phi_vv_inv, state.Phi_yy, work.M);
-  compute_PMWF_coeff(work.M, work.N, pmwf_beta);
-
+ORVALIS_KERNEL Spectrum filter(const S2chnsState &state, const Spectra &frame) {
   Spectrum output{};  // DC, Nyquist and bin 1 stay silent
   for (int k = 2; k < kTransformBins; ++k) {
-    const Pair Y = work.Y.load(k);
-    const Matrix W = work.N.load(k);
+    const Pair Y = frame.Y(k);
+    const Matrix M = mul_2by2_matrix(inv_matrix(state.Phi_vv.load(k)), state.Phi_yy.load(k));
+    const Matrix W = compute_PMWF_coeff(M, pmwf_beta);
     const Bin Z = conj(W.m11) * Y.first + conj(W.m21) * Y.second;
     const float most = std::sqrt(power(Y.first));
     const float filtered = std::sqrt(power(Z));
@@ -238,21 +242,18 @@ ORVALIS_KERNEL void process_frame(S2chnsState &state, const Word16 *in, Word16 *
   }
   if (magnitudes < kLeastMagnitudes) return;
 
-  S2chnsWork &work = state.work;
-  const Spectrum Y0 = analyse(state.frame_history[0], frame[0]);
-  const Spectrum Y1 = analyse(state.frame_history[1], frame[1]);
-  for (int k = 0; k < kTransformBins; ++k) {
-    work.Y.store(k, {Y0[k], Y1[k]});
-    work.Y_conj.store(k, {conj(Y0[k]), conj(Y1[k])});
-  }
-  mul_2by1_1by2_matrix(work.Y, work.Y_conj, work.YY);
+  Spectra spectra;
+  spectra.first = analyse(state.frame_history[0], frame[0]);
+  spectra.second = analyse(state.frame_history[1], frame[1]);
+  for (int k = 0; k < kTransformBins; ++k)
+    spectra.YY.store(k, mul_2by1_1by2_matrix(spectra.Y(k), conj(spectra.Y(k))));
 
   Spectrum output;
   if (state.frame_count < kWarmUpFrames) {
-    output = warm_up(state);
+    output = warm_up(state, spectra);
   } else {
-    track(state);
-    output = filter(state);
+    track(state, spectra);
+    output = filter(state, spectra);
   }
   synthesise(output, state.overlap_tail, out);
   count_up(state.frame_count);

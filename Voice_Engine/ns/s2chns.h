@@ -14,7 +14,7 @@
 #pragma once
 
 #include "Voice_Engine/basic_op/word.h"
-#include "Voice_Engine/ns/pmwf.h"
+#include "Voice_Engine/ns/complex_matrix.h"
 
 struct NsInstance;
 
@@ -23,21 +23,6 @@ namespace orvalis {
 inline constexpr int kHop = 160;          ///< samples a channel and frame
 inline constexpr int kWindow = 2 * kHop;  ///< samples under the window
 inline constexpr int kWarmUpFrames = 11;  ///< frames that only learn the noise
-
-/// What a frame needs between its steps and the next frame does not.
-struct S2chnsWork {
-  Pairs Y;          ///< both channels' spectra
-  Pairs Y_conj;     ///< and their conjugates, as a row
-  Matrices YY;      ///< Y Y^H
-  Matrices Phi_xx;  ///< covariance of the speech
-  Matrices Phi_vv_inv;
-  Matrices M, N;  ///< products
-  Pairs row;
-  Scalars scalar;
-  float gamma[kTransformBins];  ///< a posteriori ratio
-  float r[kTransformBins];      ///< trace of Phi_vv^-1 Phi_yy; r - 2 is the a priori ratio
-  float beta[kTransformBins];   ///< power of the speech behind the noise's inverse
-};
 
 /// State of one suppressor, all zero before the first frame.
 struct S2chnsState {
@@ -48,7 +33,6 @@ struct S2chnsState {
   float spp_smoothed[kTransformBins];  ///< speech-presence probability of this frame
   float spp_prev[kTransformBins];      ///< and the one that the next frame is smoothed with
   Word32 frame_count;                  ///< frames processed; saturates
-  S2chnsWork work;
 };
 
 /// Forgets everything: the next 11 frames learn the noise again.

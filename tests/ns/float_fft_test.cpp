@@ -7,12 +7,11 @@
 #include <array>
 #include <cmath>
 #include <complex>
-#include <memory>
 #include <numbers>
 #include <random>
 #include <vector>
 
-#include "Voice_Engine/ns/pmwf.h"
+#include "Voice_Engine/ns/complex_matrix.h"
 #include "tests/support/random.h"
 
 namespace orvalis::test {
@@ -94,141 +93,46 @@ TEST(FloatFft, HasTheTwiddleFactorsOfTheCLibrary) {
 
 // ---- Algebra ----
 
-template <class Value>
-void randomise(Bins<Value> &bins, std::mt19937_64 &generator, double scale = 1) {
-  std::normal_distribution<float> normal(0, static_cast<float>(scale));
-  for (float &x : bins.re) x = normal(generator);
-  for (float &x : bins.im) x = normal(generator);
+using Elements = std::array<Wide, 4>;  // row by row
+
+Wide widened_value(Bin x) { return {x.re, x.im}; }
+
+Elements elements_of(const Matrix &m) {
+  return {widened_value(m.m11), widened_value(m.m12), widened_value(m.m21), widened_value(m.m22)};
 }
 
-/// Element i of a bin, in double precision.
-template <class Value>
-Wide at(const Bins<Value> &bins, int bin, int i) {
-  const int place = Bins<Value>::kParts * bin + i;
-  return {bins.re[place], bins.im[place]};
-}
-
-#define EXPECT_CLOSE(got, expected, scale) \
-  EXPECT_LT(std::abs((got) - (expected)), 1e-6 * (scale)) << "bin " << k << ", element " << i
-
-TEST(Pmwf, ProductsMatchDoublePrecision) {
+TEST(ComplexMatrix, InverseAndCoefficientsMatchDoublePrecision) {
   std::mt19937_64 generator = seeded_generator();
-  Matrices a, b, matrix;
-  Pairs row, column, product;
-  Scalars scalar;
-  for (int round = 0; round < 20; ++round) {
-    randomise(a, generator);
-    randomise(b, generator);
-    randomise(row, generator);
-    randomise(column, generator);
-    mul_2by2_matrix(a, b, matrix);
-    mul_1by2_2by2_matrix(row, b, product);
-    mul_1by2_2by1_matrix(row, column, scalar);
-    for (int k = 0; k < 256; ++k) {
-      for (int i = 0; i < 4; ++i)
-        EXPECT_CLOSE(at(matrix, k, i),
-                     at(a, k, i & 2) * at(b, k, i & 1) + at(a, k, i | 1) * at(b, k, i | 2), 30);
-      for (int i = 0; i < 2; ++i)
-        EXPECT_CLOSE(at(product, k, i),
-                     at(row, k, 0) * at(b, k, i) + at(row, k, 1) * at(b, k, i + 2), 30);
-      const int i = 0;
-      EXPECT_CLOSE(at(scalar, k, 0),
-                   at(row, k, 0) * at(column, k, 0) + at(row, k, 1) * at(column, k, 1), 30);
-    }
-    mul_2by1_1by2_matrix(column, row, matrix);
-    for (int k = 0; k < 256; ++k)
-      for (int i = 0; i < 4; ++i)
-        EXPECT_CLOSE(at(matrix, k, i), at(column, k, i / 2) * at(row, k, i % 2), 20);
-  }
-}
-
-TEST(Pmwf, InverseAndCoefficientsMatchDoublePrecision) {
-  std::mt19937_64 generator = seeded_generator();
-  Matrices a, inverted, w;
   for (const double scale : {1e-4, 1.0, 1e4}) {
-    randomise(a, generator, scale);
-    for (int k = 0; k < 256; ++k) {  // diagonally dominant: well conditioned
-      a.re[4 * k] += static_cast<float>(12 * scale);
-      a.re[4 * k + 3] += static_cast<float>(12 * scale);
-    }
-    inv_matrix(a, inverted);
-    compute_PMWF_coeff(a, w, 3.0F);
-    for (int k = 0; k < 256; ++k) {
-      const Wide det = at(a, k, 0) * at(a, k, 3) - at(a, k, 1) * at(a, k, 2);
-      const Wide adjugate[] = {at(a, k, 3), -at(a, k, 1), -at(a, k, 2), at(a, k, 0)};
-      const Wide d = 3.0 + at(a, k, 0) + at(a, k, 3) - 2.0;
+    std::normal_distribution<float> normal(0, static_cast<float>(scale));
+    const auto bin = [&](double own) -> Bin {
+      return {static_cast<float>(own) + normal(generator), normal(generator)};
+    };
+    for (int round = 0; round < 1000; ++round) {
+      // Diagonally dominant: well conditioned.
+      const Matrix m = {bin(12 * scale), bin(0), bin(0), bin(12 * scale)};
+      const Elements a = elements_of(m);
+      const Elements inverted = elements_of(inv_matrix(m));
+      const Elements w = elements_of(compute_PMWF_coeff(m, 3.0F));
+      const Wide det = a[0] * a[3] - a[1] * a[2];
+      const Wide adjugate[] = {a[3], -a[1], -a[2], a[0]};
+      const Wide d = 3.0 + a[0] + a[3] - 2.0;
       for (int i = 0; i < 4; ++i) {
-        EXPECT_CLOSE(at(inverted, k, i), adjugate[i] / det, 2 / scale);
-        const Wide n = at(a, k, i) - (i % 3 == 0 ? 1.0 : 0.0);
-        EXPECT_CLOSE(at(w, k, i), n * std::conj(d) / (std::norm(d) + 1), 2);
+        EXPECT_LT(std::abs(inverted[i] - adjugate[i] / det), 2e-6 / scale) << i;
+        const Wide n = a[i] - (i % 3 == 0 ? 1.0 : 0.0);
+        EXPECT_LT(std::abs(w[i] - n * std::conj(d) / (std::norm(d) + 1)), 2e-6) << i;
       }
     }
   }
 }
 
-TEST(Pmwf, KnowsIdentitySingularAndHermitian) {
-  std::mt19937_64 generator = seeded_generator();
-  Matrices a{}, out;
-  for (int k = 0; k < 256; ++k) a.re[4 * k] = a.re[4 * k + 3] = 1;
-  a.re[4 * 7 + 1] = a.re[4 * 7 + 2] = 1;  // all elements of bin 7 are equal
-  inv_matrix(a, out);
-  for (int i = 0; i < 1024; ++i) {
-    if (i / 4 == 7) {
-      EXPECT_FALSE(std::isfinite(out.re[i]));
-    } else {
-      EXPECT_EQ(out.re[i], a.re[i]);
-      EXPECT_EQ(out.im[i], 0);
-    }
-  }
-  a.re[4 * 7 + 1] = a.re[4 * 7 + 2] = 0;
-  compute_PMWF_coeff(a, out, 3.0F);
-  for (int i = 0; i < 1024; ++i) {
-    EXPECT_EQ(out.re[i], 0);
-    EXPECT_EQ(out.im[i], 0);
-  }
-
-  Pairs column, row;
-  randomise(column, generator, 1000);
-  row = column;
-  for (float &x : row.im) x = -x;
-  mul_2by1_1by2_matrix(column, row, out);
-  for (int k = 0; k < 256; ++k) {
-    const double size = std::norm(at(column, k, 0)) + std::norm(at(column, k, 1));
-    const int i = 0;
-    for (const int diagonal : {0, 3}) {
-      EXPECT_GE(at(out, k, diagonal).real(), 0);
-      EXPECT_LT(std::abs(at(out, k, diagonal).imag()), 1e-7 * size);
-    }
-    EXPECT_CLOSE(at(out, k, 1), std::conj(at(out, k, 2)), size);
-  }
-}
-
-TEST(Pmwf, EachBinStandsAlone) {
-  // The same matrix gives the same bits wherever in the array it stands.
-  std::mt19937_64 generator = seeded_generator();
-  Matrices a, b, product, product_turned, inverted, inverted_turned, w, w_turned;
-  const auto turned = [](const Matrices &bins, int by) {
-    Matrices result = bins;
-    std::rotate(std::begin(result.re), std::begin(result.re) + 4 * by, std::end(result.re));
-    std::rotate(std::begin(result.im), std::begin(result.im) + 4 * by, std::end(result.im));
-    return result;
-  };
-  const auto same = [](const Matrices &x, const Matrices &y) {
-    return std::ranges::equal(x.re, y.re) && std::ranges::equal(x.im, y.im);
-  };
-  randomise(a, generator);
-  randomise(b, generator);
-  mul_2by2_matrix(a, b, product);
-  inv_matrix(a, inverted);
-  compute_PMWF_coeff(a, w, 3.0F);
-  for (int by = 1; by < 9; ++by) {
-    mul_2by2_matrix(turned(a, by), turned(b, by), product_turned);
-    inv_matrix(turned(a, by), inverted_turned);
-    compute_PMWF_coeff(turned(a, by), w_turned, 3.0F);
-    EXPECT_TRUE(same(product_turned, turned(product, by)));
-    EXPECT_TRUE(same(inverted_turned, turned(inverted, by)));
-    EXPECT_TRUE(same(w_turned, turned(w, by)));
-  }
+TEST(ComplexMatrix, KnowsIdentityAndSingular) {
+  const Matrix identity = {{1, 0}, {0, 0}, {0, 0}, {1, 0}};
+  EXPECT_EQ(elements_of(inv_matrix(identity)), elements_of(identity));
+  EXPECT_EQ(elements_of(compute_PMWF_coeff(identity, 3.0F)), Elements{});
+  const Matrix all_equal = {{1, 0}, {1, 0}, {1, 0}, {1, 0}};
+  for (const Wide &element : elements_of(inv_matrix(all_equal)))
+    EXPECT_FALSE(std::isfinite(element.real()));
 }
 
 }  // namespace

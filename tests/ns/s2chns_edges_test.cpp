@@ -19,7 +19,7 @@ namespace {
 /// Everything that the next frame depends on.
 std::vector<std::byte> memory_of(const S2chnsState &state) {
   const auto *bytes = reinterpret_cast<const std::byte *>(&state);
-  return {bytes, bytes + offsetof(S2chnsState, work)};
+  return {bytes, bytes + sizeof state};
 }
 
 Pcm hiss(int frames, unsigned seed) {
