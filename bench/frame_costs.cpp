@@ -143,13 +143,13 @@ class TwoMicrophones {
 public:
   static constexpr std::size_t kBytes = sizeof(S2chnsState);
 
-  void start() { reset_s2chns(*state_); }
+  void start() { S2CHNSInit(*state_); }
   void hear(const Word16 *frame, int samples) {
     for (int i = 0; i < samples; ++i) {
       pairs_[2 * i] = frame[i];
       pairs_[2 * i + 1] = static_cast<Word16>(frame[std::max(0, i - 3)] / 2 + (i * 7919 % 41 - 20));
     }
-    process_s2chns(*state_, pairs_, pairs_, kHop);
+    S2CHNSProcessNSFrame(*state_, pairs_, pairs_, kHop);
     benchmark::DoNotOptimize(pairs_);
   }
 
@@ -261,7 +261,7 @@ void register_frame_costs() {
   measure("ProcessEPDFrame, 16 kHz", wide, Detection(0));
   measure("ProcessEPDFrame, 8 kHz", narrow, Detection(1000));
   measure("s1chns_C", wide, Suppression());
-  measure("process_s2chns", wide, TwoMicrophones());
+  measure("S2CHNSProcessNSFrame", wide, TwoMicrophones());
   measure("process_drc", wide, Leveling());
   measure("VelmoraVAD, 16 kHz", wide, VoiceDetection(0));
   measure("VelmoraVAD, 8 kHz", narrow, VoiceDetection(1));

@@ -20,6 +20,8 @@ int32_t process_frames(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
   return orvalis::EPD_Proc_Frame(epd, pcm, numSample, contentType);
 }
 
+constinit orvalis::S2chnsState process_wide_pair{};  // of all suppressors of two microphones
+
 constexpr int64_t kNoDrc = -1;
 
 /// Null for what no creation returns as a handle.
@@ -65,13 +67,13 @@ ORVALIS_EXPORT int32_t setLogging(EpdInstance *epd, int32_t /*value*/) {
 ORVALIS_EXPORT int32_t FreeMemoryEPD(EpdInstance *epd) { return orvalis::freeMemory_EPD(epd); }
 
 ORVALIS_EXPORT NsInstance *InitializeDoNS(int32_t mode, int32_t micCount, int32_t /*unused*/) {
-  return orvalis::DoNS_Create(mode, micCount);
+  return orvalis::DoNS_Create(mode, micCount, process_wide_pair);
 }
 
 ORVALIS_EXPORT int32_t ProcessDoNSFrame(NsInstance *ns, int16_t *in, int32_t numIn, int16_t *out,
                                         int32_t numOut) {
   if (numIn > 0 && (in == nullptr || out == nullptr)) return -1;
-  return orvalis::DO_NS_Proc_Frame(ns, in, numIn, out, numOut);
+  return orvalis::DO_NS_Proc_Frame(ns, process_wide_pair, in, numIn, out, numOut);
 }
 
 ORVALIS_EXPORT int32_t FreeMemoryNS(NsInstance *ns) { return orvalis::freeMemory_NS(ns); }

@@ -3,7 +3,6 @@
 #include <cstdlib>
 
 #include "Voice_Engine/epd/frame_screening.h"
-#include "Voice_Engine/ns/s2chns.h"
 #include "Voice_Engine/platform/dump_file.h"
 #include "Voice_Engine/platform/log.h"
 #include "Voice_Engine/platform/version.h"
@@ -42,22 +41,22 @@ void log_version(Word32 suppressor_mode) {
            "IS127", suppressor_mode);
 }
 
-void initialise_suppressor(NsInstance *ns, Word16 suppressor_mode) {
+void initialise_suppressor(NsInstance *ns, S2chnsState &pair, Word16 suppressor_mode) {
   if (ns->micCount == 1) {
     log_line(kLogDebug, kLogTag, "TQE: DoNS_Create 1Mic NS Initialize");
     S1CHNSInit(&ns->suppressor, suppressor_mode);
   } else if (ns->micCount == 2) {
     log_line(kLogDebug, kLogTag, "TQE: DoNS_Create 2Mic NS Initialize");
-    S2CHNSInit(ns);
+    S2CHNSInit(pair);
   }
 }
 
 /// Suppresses one frame; false if the instance suppresses nothing.
-bool suppress(NsInstance *ns, Word16 *in, Word16 *out, NsFlags &flags) {
+bool suppress(NsInstance *ns, S2chnsState &pair, Word16 *in, Word16 *out, NsFlags &flags) {
   if (ns->micCount == 1) {
     s1chns_C(flags, &ns->suppressor, in, out);
   } else if (ns->micCount == 2) {
-    S2CHNSProcessNSFrame(ns, in, out, kHop);
+    S2CHNSProcessNSFrame(pair, in, out, kHop);
   } else {
     return false;
   }
@@ -66,7 +65,7 @@ bool suppress(NsInstance *ns, Word16 *in, Word16 *out, NsFlags &flags) {
 
 }  // namespace
 
-NsInstance *DoNS_Create(Word32 mode, Word32 micCount) {
+NsInstance *DoNS_Create(Word32 mode, Word32 micCount, S2chnsState &pair) {
   auto *ns = static_cast<NsInstance *>(std::malloc(sizeof(NsInstance)));
   if (ns == nullptr) {
     log_version(0);
@@ -81,7 +80,7 @@ NsInstance *DoNS_Create(Word32 mode, Word32 micCount) {
   ns->inputDumpFile = nullptr;
   ns->resultDumpFile = nullptr;
   const Word16 suppressor_mode = mode % 1000 == 2 ? 2 : 0;
-  initialise_suppressor(ns, suppressor_mode);
+  initialise_suppressor(ns, pair, suppressor_mode);
   if (dumps(*ns)) {
     ns->inputDumpFile = open_dump(kDumpFolder, ns, kInputSuffix);
     ns->resultDumpFile = open_dump(kDumpFolder, ns, kResultSuffix);
@@ -90,7 +89,8 @@ NsInstance *DoNS_Create(Word32 mode, Word32 micCount) {
   return ns;
 }
 
-Word32 DO_NS_Proc_Frame(NsInstance *ns, Word16 *in, Word32 numIn, Word16 *out, Word32 numOut) {
+Word32 DO_NS_Proc_Frame(NsInstance *ns, S2chnsState &pair, Word16 *in, Word32 numIn, Word16 *out,
+                        Word32 numOut) {
   if (ns == nullptr || numIn != numOut) return -1;
   const Word32 length = frame_length(*ns);
   if (length == kRefused) return -1;
@@ -116,7 +116,8 @@ Word32 DO_NS_Proc_Frame(NsInstance *ns, Word16 *in, Word32 numIn, Word16 *out, W
     if (!audio_settled(ns->abnormalCheckCount, ns->processedSamples, length, is_normal,
                        kSettlingTexts))
       continue;
-    if (suppress(ns, in, out, *flags) && dumps(*ns)) write_dump(ns->resultDumpFile, out, length);
+    if (suppress(ns, pair, in, out, *flags) && dumps(*ns))
+      write_dump(ns->resultDumpFile, out, length);
   }
   return ns->processedSamples;
 }

@@ -5,9 +5,10 @@
 #include <cstdio>
 
 #include "Voice_Engine/ns/s1chns.h"
+#include "Voice_Engine/ns/s2chns.h"
 
-/// Everything that one noise suppressor knows; two microphones share one process-wide suppressor
-/// instead. Allocated uncleared: creation sets each field before it is read.
+/// Everything that one noise suppressor knows but for the record of two microphones, which belongs
+/// to the caller. Allocated uncleared: creation sets each field before it is read.
 struct NsInstance {
   orvalis::Word32 pcmDumpEnabled;      ///< 0: no caller can ask for dump files
   orvalis::Word32 rateMode;            ///< rate digit of the mode
@@ -22,13 +23,17 @@ struct NsInstance {
 
 namespace orvalis {
 
+// `pair` is the record of two microphones, the same one for every call on an instance; with another
+// number of microphones it is left alone.
+
 /// Creates an instance; null if memory runs out. Modes: see orvalis.h.
-NsInstance *DoNS_Create(Word32 mode, Word32 micCount);
+NsInstance *DoNS_Create(Word32 mode, Word32 micCount, S2chnsState &pair);
 
 /// Suppresses a buffer of whole frames; a partial last frame is read and written whole. Frames that
 /// are not suppressed leave `out` as it is. Returns the samples processed since creation, or -1 for
 /// a null instance, for counts that differ, and for one microphone at 8 kHz.
-Word32 DO_NS_Proc_Frame(NsInstance *ns, Word16 *in, Word32 numIn, Word16 *out, Word32 numOut);
+Word32 DO_NS_Proc_Frame(NsInstance *ns, S2chnsState &pair, Word16 *in, Word32 numIn, Word16 *out,
+                        Word32 numOut);
 
 /// Releases an instance. Returns 0, or -1 for a null or an all-ones handle.
 Word32 freeMemory_NS(NsInstance *ns);

@@ -259,8 +259,6 @@ ORVALIS_KERNEL void process_frame(S2chnsState &state, const Word16 *in, Word16 *
   count_up(state.frame_count);
 }
 
-constinit S2chnsState process_wide_suppressor{};
-
 }  // namespace
 
 void s2chns_frame_portable(S2chnsState &state, const Word16 *in, Word16 *out) {
@@ -271,19 +269,13 @@ ORVALIS_WITH_FMA void s2chns_frame_fused(S2chnsState &state, const Word16 *in, W
   process_frame(state, in, out);
 }
 
-void reset_s2chns(S2chnsState &state) { std::memset(&state, 0, sizeof state); }
+void S2CHNSInit(S2chnsState &state) { std::memset(&state, 0, sizeof state); }
 
-Word32 process_s2chns(S2chnsState &state, const Word16 *in, Word16 *out, Word16 n) {
+Word32 S2CHNSProcessNSFrame(S2chnsState &state, const Word16 *in, Word16 *out, Word16 n) {
   if (n % kHop != 0) return kBadLength;
   const auto frame = has_fma() ? s2chns_frame_fused : s2chns_frame_portable;
   for (int at = 0; at < n; at += kHop) frame(state, in + 2 * at, out + at);
   return 0;
-}
-
-void S2CHNSInit(NsInstance *) { reset_s2chns(process_wide_suppressor); }
-
-Word32 S2CHNSProcessNSFrame(NsInstance *, const Word16 *in, Word16 *out, Word16 n) {
-  return process_s2chns(process_wide_suppressor, in, out, n);
 }
 
 Word32 S2CHNSFree() { return 0; }

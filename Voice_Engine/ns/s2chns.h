@@ -16,8 +16,6 @@
 #include "Voice_Engine/basic_op/word.h"
 #include "Voice_Engine/ns/complex_matrix.h"
 
-struct NsInstance;
-
 namespace orvalis {
 
 inline constexpr int kHop = 160;          ///< samples a channel and frame
@@ -36,25 +34,20 @@ struct S2chnsState {
 };
 
 /// Forgets everything: the next 11 frames learn the noise again.
-void reset_s2chns(S2chnsState &state);
+void S2CHNSInit(S2chnsState &state);
 
 /// Suppresses n samples a channel, n a multiple of 160: interleaved pairs in and out, both channels
 /// of the output the same. Output frame j begins at element 160 j and is 320 long, so that of
 /// several frames each but the last keeps only its first half. A frame whose mean magnitude in
 /// channel 0 is below 10 leaves output and state as they are. Output beyond 16 bits wraps around.
 /// Returns 0, or -100 for any other n; nothing happens for n < 1.
-Word32 process_s2chns(S2chnsState &state, const Word16 *in, Word16 *out, Word16 n);
+Word32 S2CHNSProcessNSFrame(S2chnsState &state, const Word16 *in, Word16 *out, Word16 n);
 
-/// The two bodies behind process_s2chns, for one frame; the second needs has_fma().
+/// The two bodies behind S2CHNSProcessNSFrame, for one frame; the second needs has_fma().
 void s2chns_frame_portable(S2chnsState &state, const Word16 *in, Word16 *out);
 void s2chns_frame_fused(S2chnsState &state, const Word16 *in, Word16 *out);
 
-/// The same over the one suppressor that all callers in the process share; the instance is not
-/// used.
-void S2CHNSInit(NsInstance *instance);
-Word32 S2CHNSProcessNSFrame(NsInstance *instance, const Word16 *in, Word16 *out, Word16 n);
-
-/// Releases nothing, for the suppressor owns nothing. Returns 0.
+/// Releases nothing, for a suppressor owns nothing. Returns 0.
 Word32 S2CHNSFree();
 
 /// exp(x), held between exp(-10) and exp(10).

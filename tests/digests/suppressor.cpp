@@ -89,9 +89,9 @@ void run_two(Judge &judge, const Pcm &pairs, std::int16_t frames) {
   const auto samples = static_cast<std::size_t>(frames * 2 * kHop);
   for (std::size_t at = 0; at + samples <= pairs.size(); at += samples) {
     Pcm out(samples, 1234);
-    judge.take(
-        process_s2chns(*state, &pairs[at], out.data(), static_cast<std::int16_t>(frames * kHop)),
-        out);
+    judge.take(S2CHNSProcessNSFrame(*state, &pairs[at], out.data(),
+                                    static_cast<std::int16_t>(frames * kHop)),
+               out);
     take_record(judge, *state);
     observer.call();
   }
@@ -162,7 +162,7 @@ TEST(Digests, TwoMicrophones) {
     S2chnsState state{};
     Pcm out(2000, 7);
     for (const Word16 n : {-160, -1, 0, 1, 159, 161, 321})
-      judge.take(process_s2chns(state, pairs.data(), out.data(), n), out);
+      judge.take(S2CHNSProcessNSFrame(state, pairs.data(), out.data(), n), out);
     take_record(judge, state);
     judge.call();
   });

@@ -84,7 +84,7 @@ struct Model {
       } else if (is_settled(4 * small < 3 * length)) {
         calm = 3;
         if (mics == 1) s1chns_C(flags, &single, in + at, out + at);
-        if (mics == 2) process_s2chns(both, in + at, out + at, 160);
+        if (mics == 2) S2CHNSProcessNSFrame(both, in + at, out + at, 160);
       }
     }
     return heard;

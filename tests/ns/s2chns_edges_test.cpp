@@ -35,7 +35,7 @@ TEST(S2chnsEdges, StaysFiniteWhenBothMicrophonesHearTheSame) {
   for (std::size_t i = 0; i < pairs.size(); i += 2) pairs[i + 1] = pairs[i];
   double in_power = 0, out_power = 0;
   for (std::size_t at = 0; at < pairs.size(); at += 320) {
-    process_s2chns(*state, &pairs[at], out.data(), 160);
+    S2CHNSProcessNSFrame(*state, &pairs[at], out.data(), 160);
     for (const Matrices *phi : {&state->Phi_yy, &state->Phi_vv}) {
       const auto finite = [](float x) { return std::isfinite(x); };
       ASSERT_TRUE(std::ranges::all_of(phi->re, finite) && std::ranges::all_of(phi->im, finite));
@@ -55,7 +55,7 @@ TEST(S2chnsEdges, StartsWithAFifthOfTheFirstMicrophone) {
   const Pcm pairs = hiss(13, 4);
   Pcm out(320), before(320);
   for (int frame = 0; frame < 13; ++frame) {
-    process_s2chns(*state, &pairs[320 * frame], out.data(), 160);
+    S2CHNSProcessNSFrame(*state, &pairs[320 * frame], out.data(), 160);
     double error = 0;
     for (int i = 0; i < 320; i += 2) error = std::max(error, std::abs(out[i] - 0.2 * before[i]));
     EXPECT_EQ(error < 1.01, frame < 11) << frame << ' ' << error;
@@ -67,21 +67,21 @@ TEST(S2chnsEdges, LeavesQuietFramesAndOddLengthsAlone) {
   const auto state = std::make_unique<S2chnsState>();
   Pcm pairs = hiss(40, 5), out(320);
   for (int frame = 0; frame < 40; ++frame)
-    process_s2chns(*state, &pairs[320 * frame], out.data(), 160);
+    S2CHNSProcessNSFrame(*state, &pairs[320 * frame], out.data(), 160);
   const auto before = memory_of(*state);
   const Pcm untouched(320, 12345);
   out = untouched;
   for (const Word16 n : {100, 1, 159, 161, -1, -159, -32768})
-    EXPECT_EQ(process_s2chns(*state, pairs.data(), out.data(), n), -100) << n;
+    EXPECT_EQ(S2CHNSProcessNSFrame(*state, pairs.data(), out.data(), n), -100) << n;
   for (const Word16 n : {0, -160, -32640})
-    EXPECT_EQ(process_s2chns(*state, pairs.data(), out.data(), n), 0) << n;
+    EXPECT_EQ(S2CHNSProcessNSFrame(*state, pairs.data(), out.data(), n), 0) << n;
   for (int i = 0; i < 160; ++i) pairs[2 * i] = static_cast<Word16>(i % 2 ? -10 : 10);
   pairs[10] = 9;  // the second microphone may be loud
-  EXPECT_EQ(process_s2chns(*state, pairs.data(), out.data(), 160), 0);
+  EXPECT_EQ(S2CHNSProcessNSFrame(*state, pairs.data(), out.data(), 160), 0);
   EXPECT_EQ(out, untouched);
   EXPECT_EQ(memory_of(*state), before);
   pairs[10] = -10;
-  EXPECT_EQ(process_s2chns(*state, pairs.data(), out.data(), 160), 0);
+  EXPECT_EQ(S2CHNSProcessNSFrame(*state, pairs.data(), out.data(), 160), 0);
   EXPECT_NE(out, untouched);
   EXPECT_NE(memory_of(*state), before);
 }
@@ -93,8 +93,8 @@ TEST(S2chnsEdges, WritesEachFrameOverTheSecondHalfOfTheOneBefore) {
     if (second_is_quiet) std::fill_n(&pairs[320], 320, Word16{3});
     Pcm out(960, 12345), expected = out;
     for (int frame = 0; frame < 3; ++frame)
-      process_s2chns(*single, &pairs[320 * frame], &expected[160 * frame], 160);
-    EXPECT_EQ(process_s2chns(*whole, pairs.data(), out.data(), 480), 0);
+      S2CHNSProcessNSFrame(*single, &pairs[320 * frame], &expected[160 * frame], 160);
+    EXPECT_EQ(S2CHNSProcessNSFrame(*whole, pairs.data(), out.data(), 480), 0);
     EXPECT_EQ(out, expected);
     EXPECT_TRUE(memory_of(*whole) == memory_of(*single));
   }
@@ -117,7 +117,7 @@ TEST(S2chnsEdges, WrapsWhatExceedsSixteenBits) {
   for (std::size_t i = 0; i < std::size(cases); ++i) state->overlap_tail[i] = cases[i].first;
   Pcm pairs(320), out(320);
   for (int i = 300; i < 320; ++i) pairs[i] = 1000;  // far from the samples in question
-  process_s2chns(*state, pairs.data(), out.data(), 160);
+  S2CHNSProcessNSFrame(*state, pairs.data(), out.data(), 160);
   for (std::size_t i = 0; i < std::size(cases); ++i)
     EXPECT_EQ(out[2 * i], cases[i].second) << cases[i].first;
 }

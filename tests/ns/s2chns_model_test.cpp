@@ -230,7 +230,7 @@ Errors follow(S2chnsState &state, const Pcm &pairs) {
   for (std::size_t at = 0; at + 320 <= pairs.size(); at += 320) {
     Model model(state);
     const Reals expected = model.process(&pairs[at]);
-    EXPECT_EQ(process_s2chns(state, &pairs[at], out.data(), 160), 0);
+    EXPECT_EQ(S2CHNSProcessNSFrame(state, &pairs[at], out.data(), 160), 0);
     for (int k = 0; k < kBins; ++k) {
       worsen(errors.input, distance(state.Phi_yy, k, model.input[k]));
       worsen(errors.noise, distance(state.Phi_vv, k, model.noise[k]));

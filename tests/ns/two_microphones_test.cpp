@@ -39,7 +39,7 @@ Pcm suppressed(S2chnsState &state, const Pcm &pairs) {
                            [](float sum, float value) { return sum + 0 * value; }) == 0;
   };
   for (std::size_t at = 0; at + 2 * kHop <= pairs.size(); at += 2 * kHop) {
-    EXPECT_EQ(process_s2chns(state, &pairs[at], frame.data(), kHop), 0);
+    EXPECT_EQ(S2CHNSProcessNSFrame(state, &pairs[at], frame.data(), kHop), 0);
     for (int i = 0; i < kHop; ++i) output[at / 2 + i] = frame[2 * i];
     if (!is_finite(state.Phi_yy.re) || !is_finite(state.Phi_yy.im) || !is_finite(state.Phi_vv.re) ||
         !is_finite(state.Phi_vv.im) || !is_finite(state.spp_prev) ||
