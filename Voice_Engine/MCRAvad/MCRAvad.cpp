@@ -68,4 +68,8 @@ ORVALIS_EXPORT int32_t processVAD(VADINFO **info, int16_t *frame, int32_t length
   return orvalis::decide_frame(**info, exponent) ? 1 : 0;
 }
 
+ORVALIS_EXPORT int32_t explainVAD(VADINFO **info, McraReasons *reasons) {
+  return orvalis::explain_frame(**info, *reasons) ? 1 : 0;
+}
+
 }  // extern "C"

@@ -201,6 +201,30 @@ void ApplyVAD(VADINFO **info, int16_t *frame, int32_t length);
  */
 int32_t processVAD(VADINFO **info, int16_t *frame, int32_t length, float exponent);
 
+/*
+ * Why a frame was answered as it was. It is speech if each of the first three values exceeds its
+ * threshold, frame 0 apart. Energies and bins are those of the frame and its predecessor together.
+ */
+typedef struct McraReasons {
+  int32_t frameIndex;
+  int32_t answer;                             /* 1 for speech, 0 for none */
+  float energy, energyThreshold;              /* of periodogram */
+  float smoothedEnergy, smoothedThreshold;    /* of smoothedPeriodogram */
+  float minEnergy;                            /* of minPower */
+  float frameSnr;                             /* mean a priori SNR, as a ratio */
+  int64_t speechBins, speechBinsThreshold;    /* bins' worth of speechProb */
+  /* What the next frame's reasons need of this frame. */
+  float prevEnergy, prevSmoothedEnergy, prevMinEnergy;
+  int64_t prevSpeechBins;
+} McraReasons;
+
+/*
+ * Explains the frame that processVAD has just answered, and returns that answer. Fill `reasons` with
+ * zeros before the first frame and call this after every frame; it then holds the reasons for the
+ * last one. The record is only read.
+ */
+int32_t explainVAD(VADINFO **info, McraReasons *reasons);
+
 #ifdef __cplusplus
 }
 #endif

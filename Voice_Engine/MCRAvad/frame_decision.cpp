@@ -14,11 +14,19 @@ constexpr Word32 kLastStartupFrame = 19;
 constexpr Word32 kLastSummedFrame = 10;
 constexpr Word32 kFirstSettledFrame = 80;
 
-struct FrameMeasures {
+/// Energies and bins of a frame, or of a frame and its predecessor.
+struct Measures {
   float energy = 0;
   float smoothed_energy = 0;
   float minimum_energy = 0;
   Word64 speech_bins = 0;
+};
+
+/// What the measures of two frames have to exceed.
+struct Thresholds {
+  float energy;
+  float smoothed_energy;
+  Word64 speech_bins;
 };
 
 /// Sum of powers in Q31. A product with a power of two is exact, so it makes no difference whether
@@ -35,16 +43,23 @@ Word64 speech_bins_of(const Word32 *probabilities_q31) {
   return sum >> 31;
 }
 
-FrameMeasures measure(const VADINFO &vad) {
+/// The measures of the record's frame; the first frame of all counts as 0.
+Measures measure(const VADINFO &vad) {
+  if (vad.frameIndex < 1) return {};
   return {energy_of(vad.periodogram), std::fabs(energy_of(vad.smoothedPeriodogram)),
           energy_of(vad.minPower), speech_bins_of(vad.speechProb)};
+}
+
+Measures operator+(const Measures &a, const Measures &b) {
+  return {a.energy + b.energy, a.smoothed_energy + b.smoothed_energy,
+          a.minimum_energy + b.minimum_energy, a.speech_bins + b.speech_bins};
 }
 
 /// Learns how loud the start is; gives the smoothed energy to carry on. Frames that are too loud
 /// for a background count as their predecessor.
 float learn_startup(VADINFO &vad, float two_frames, float smoothed_energy) {
   constexpr float kLoudest = 30;
-  if (vad.frameIndex > kLastStartupFrame) return smoothed_energy;
+  if (vad.frameIndex < 1 || vad.frameIndex > kLastStartupFrame) return smoothed_energy;
   if (vad.frameIndex <= kLastSummedFrame) vad.startupFrameEnergy += two_frames;
   const float carried = smoothed_energy <= kLoudest ? smoothed_energy : vad.prevSmoothedEnergy;
   vad.startupSmoothedEnergy += carried;
@@ -60,46 +75,66 @@ float startup_scale(float startup_energy) {
 float energy_scale(const VADINFO &vad, float minimum_energy) {
   if (vad.frameIndex < kFirstSettledFrame) return 1;
   if (vad.calibrationEnable == 0) return startup_scale(vad.startupSmoothedEnergy);
-  return minimum_energy + vad.prevMinEnergy;
+  return minimum_energy;
 }
 
-/// A threshold that is not a number counts as none.
-float threshold_of(const VADINFO &vad) {
+Thresholds thresholds_of(const VADINFO &vad, const Measures &two_frames) {
+  constexpr float kMinSmoothedEnergy = 0.4F;
+  constexpr Word64 kSpeechBins = 40;
   const float floor = vad.lowThresholdSelect == 1 ? 0.097F : 0.1F;
-  return vad.energyThreshold > floor ? vad.energyThreshold : floor;
+  const float margin =
+      static_cast<float>(vad.energyMargin) * energy_scale(vad, two_frames.minimum_energy);
+  return {// A threshold that is not a number counts as none.
+          .energy = vad.energyThreshold > floor ? vad.energyThreshold : floor,
+          .smoothed_energy = margin < kMinSmoothedEnergy ? kMinSmoothedEnergy : margin,
+          .speech_bins = kSpeechBins};
 }
 
-bool is_speech(const VADINFO &vad, const FrameMeasures &frame, float two_frames, float scale) {
-  constexpr float kLeastSmoothedEnergy = 0.4F;
-  constexpr Word64 kSpeechBinsOfTwoFrames = 40;
-  const float smoothed_energy = frame.smoothed_energy + vad.prevSmoothedEnergy;
-  return two_frames > threshold_of(vad) &&
-         smoothed_energy > static_cast<float>(vad.energyMargin) * scale &&
-         smoothed_energy > kLeastSmoothedEnergy &&
-         frame.speech_bins + vad.prevSpeechBins > kSpeechBinsOfTwoFrames;
+bool is_speech(const VADINFO &vad, const Measures &two_frames, const Thresholds &thresholds) {
+  return vad.frameIndex >= 1 && two_frames.energy > thresholds.energy &&
+         two_frames.smoothed_energy > thresholds.smoothed_energy &&
+         two_frames.speech_bins > thresholds.speech_bins;
 }
 
 }  // namespace
 
 bool decide_frame(VADINFO &vad, float exponent) {
-  FrameMeasures frame;
-  float carried = 0;
-  bool decision = false;
-  if (vad.frameIndex >= 1) {
-    frame = measure(vad);
-    const float two_frames = frame.energy + vad.prevFrameEnergy;
-    carried = learn_startup(vad, two_frames, frame.smoothed_energy);
-    const float scale = energy_scale(vad, frame.minimum_energy);
-    const bool calibrates = vad.frameIndex >= kFirstSettledFrame && vad.calibrationEnable != 0 &&
-                            vad.calibrationMode == 1;
-    if (calibrates) calibrate_threshold(vad, frame.energy, exponent);
-    decision = is_speech(vad, frame, two_frames, scale);
-  }
+  const Measures frame = measure(vad);
+  const Measures previous = {vad.prevFrameEnergy, vad.prevSmoothedEnergy, vad.prevMinEnergy,
+                             vad.prevSpeechBins};
+  const Measures two_frames = frame + previous;
+  const float carried = learn_startup(vad, two_frames.energy, frame.smoothed_energy);
+  const bool calibrates = vad.frameIndex >= kFirstSettledFrame && vad.calibrationEnable != 0 &&
+                          vad.calibrationMode == 1;
+  if (calibrates) calibrate_threshold(vad, frame.energy, exponent);
   vad.prevMinEnergy = frame.minimum_energy;
   vad.prevFrameEnergy = frame.energy;
   vad.prevSmoothedEnergy = carried;
   vad.prevSpeechBins = frame.speech_bins;
-  return decision;
+  return is_speech(vad, two_frames, thresholds_of(vad, two_frames));
+}
+
+bool explain_frame(const VADINFO &vad, McraReasons &reasons) {
+  const Measures previous = {reasons.prevEnergy, reasons.prevSmoothedEnergy, reasons.prevMinEnergy,
+                             reasons.prevSpeechBins};
+  const Measures two_frames = measure(vad) + previous;
+  const Thresholds thresholds = thresholds_of(vad, two_frames);
+  const bool speech = is_speech(vad, two_frames, thresholds);
+  reasons = {.frameIndex = vad.frameIndex,
+             .answer = speech,
+             .energy = two_frames.energy,
+             .energyThreshold = thresholds.energy,
+             .smoothedEnergy = two_frames.smoothed_energy,
+             .smoothedThreshold = thresholds.smoothed_energy,
+             .minEnergy = two_frames.minimum_energy,
+             .frameSnr = static_cast<float>(vad.frameSnr) / 4096,
+             .speechBins = two_frames.speech_bins,
+             .speechBinsThreshold = thresholds.speech_bins,
+             .prevEnergy = vad.prevFrameEnergy,
+             .prevSmoothedEnergy = vad.prevSmoothedEnergy,
+             .prevMinEnergy = vad.prevMinEnergy,
+             .prevSpeechBins = vad.prevSpeechBins};
+  return speech;
 }
 
 }  // namespace orvalis

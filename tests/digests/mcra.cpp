@@ -25,6 +25,14 @@ struct Configuration {
   float exponent;
 };
 
+void configure(VADINFO &vad, const Configuration &configured) {
+  vad.historyUpdate = configured.history;
+  vad.calibrationMode = configured.calibration_mode;
+  vad.calibrationEnable = configured.calibration_enable;
+  vad.lowThresholdSelect = configured.low_threshold;
+  vad.energyMargin = configured.margin;
+}
+
 void run(Judge &judge, const Pcm &audio, const Configuration &configured, Random random,
          bool hostile) {
   Observer observer(judge);
@@ -36,11 +44,7 @@ void run(Judge &judge, const Pcm &audio, const Configuration &configured, Random
   observer.call();
   *vad = {};
   initialVADINFO(&vad);
-  vad->historyUpdate = configured.history;
-  vad->calibrationMode = configured.calibration_mode;
-  vad->calibrationEnable = configured.calibration_enable;
-  vad->lowThresholdSelect = configured.low_threshold;
-  vad->energyMargin = configured.margin;
+  configure(*vad, configured);
   for (std::size_t at = 0; at + 160 <= audio.size(); at += 160) {
     Pcm frame(audio.begin() + static_cast<long>(at), audio.begin() + static_cast<long>(at + 160));
     const auto oddity = hostile ? draw(random, 0, 199) : 199;
@@ -58,6 +62,24 @@ void run(Judge &judge, const Pcm &audio, const Configuration &configured, Random
     judge.take(frame);
     take_record(judge, *vad);
     observer.call();
+  }
+}
+
+/// The reasons of every frame, whose answer is that of the frame.
+void run_explained(Judge &judge, const Pcm &audio, const Configuration &configured) {
+  const auto record = std::make_unique<VADINFO>();
+  VADINFO *vad = record.get();
+  initialVADINFO(&vad);
+  configure(*vad, configured);
+  McraReasons reasons{};
+  for (std::size_t at = 0; at + 160 <= audio.size(); at += 160) {
+    Pcm frame(audio.begin() + static_cast<long>(at), audio.begin() + static_cast<long>(at + 160));
+    const std::int32_t answer = processVAD(&vad, frame.data(), 160, configured.exponent);
+    EXPECT_EQ(explainVAD(&vad, &reasons), answer);
+    judge.take(reasons.frameIndex, reasons.answer, reasons.energy, reasons.energyThreshold,
+               reasons.smoothedEnergy, reasons.smoothedThreshold, reasons.minEnergy,
+               reasons.frameSnr, reasons.speechBins, reasons.speechBinsThreshold);
+    judge.call();
   }
 }
 
@@ -81,6 +103,12 @@ TEST(Digests, Mcra) {
     ++seed;
     judge.sequence("hostile-" + std::to_string(seed), [&] {
       run(judge, hostile_signal(seed, 100000, sentence), configured, Random(seed), true);
+    });
+  }
+  for (const Configuration &configured : configurations) {
+    ++seed;
+    judge.sequence("reasons-" + std::to_string(seed), [&] {
+      run_explained(judge, hostile_signal(seed, 60000, sentence), configured);
     });
   }
   judge.sequence("calibration", [&] {
