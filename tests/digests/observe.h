@@ -34,6 +34,7 @@ std::string last_words(Call call) {
   const pid_t child = fork();
   if (child == 0) {
     dup2(ends[1], STDOUT_FILENO);
+    dup2(ends[1], STDERR_FILENO);
     call();
     std::puts("returned");
     std::exit(77);

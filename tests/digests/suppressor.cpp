@@ -112,6 +112,16 @@ TEST(Digests, OneMicrophone) {
     });
   }
   judge.sequence("no-microphone", [&] { run(judge, speech, 0, 3, Random(3), true); });
+  judge.sequence("default-log", [&] {
+    judge.take(last_words([] {
+      static NsInstance *const ns = InitializeDoNS(0, 1, 0);  // releases would log the handle
+      static EpdInstance *const epd = InitializeEPD(0, 0);
+      Pcm frame(160, 1000);
+      ProcessDoNSFrame(ns, frame.data(), 80, frame.data(), 80);
+      ResetEPDparams(epd);
+    }));
+    judge.call();
+  });
   judge.sequence("gain-floors", [&] {
     for (const Word16 mode : {0, 1, 2, 3, 4, -1}) {
       S1chnsState state{};
@@ -126,6 +136,11 @@ TEST(Digests, OneMicrophone) {
       const auto exhausted = ScriptedMalloc::failing();
       judge.take(InitializeDoNS(2, 1, 0) == nullptr);
     }
+    observer.call();
+    NsInstance *ns = InitializeDoNS(0, 1, 0);
+    observer.watch(ns);
+    judge.take(ProcessDoNSFrame(ns, nullptr, 0, nullptr, 0));
+    FreeMemoryNS(ns);
     observer.call();
     judge.take(FreeMemoryNS(nullptr));
     judge.take(FreeMemoryNS(reinterpret_cast<NsInstance *>(std::intptr_t{-1})));
