@@ -1,6 +1,6 @@
 # The Java methods in the library. They need jni.h to be built and nothing to run: the Java virtual
 # machine hands its functions in.
-set(java_sources jni/java_methods.cpp jni/java_safe_layer.cpp jni/java_strings.cpp)
+set(java_sources java/java_streams.cpp jni/java_methods.cpp jni/java_strings.cpp)
 target_sources(orvalis_objects PRIVATE ${java_sources})
 
 if(NOT ANDROID)  # the NDK has jni.h among the system's headers

@@ -5,7 +5,7 @@
 #include <new>
 #include <optional>
 
-#include "Voice_Engine/epd/frame_screening.h"
+#include "Voice_Engine/channel/frame_screening.h"
 #include "Voice_Engine/platform/export.h"
 #include "jni/orvalis.h"
 

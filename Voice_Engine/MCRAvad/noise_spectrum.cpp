@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <iterator>
 
+#include "Voice_Engine/MCRAvad/noscale_fft_kernel.h"
 #include "Voice_Engine/MCRAvad/rounding.h"
-#include "Voice_Engine/MCRAvad/unscaled_fft.h"
 #include "Voice_Engine/MCRAvad/windows.h"
 
 namespace orvalis {

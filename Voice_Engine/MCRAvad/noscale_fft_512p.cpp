@@ -3,7 +3,7 @@
 
 #include <cstdio>
 
-#include "Voice_Engine/MCRAvad/unscaled_fft.h"
+#include "Voice_Engine/MCRAvad/noscale_fft_kernel.h"
 #include "Voice_Engine/platform/export.h"
 
 using orvalis::FftDirection;

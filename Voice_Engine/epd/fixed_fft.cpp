@@ -1,6 +1,6 @@
 #include "Voice_Engine/epd/fixed_fft.h"
 
-#include "Voice_Engine/epd/transform.h"
+#include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 using orvalis::Direction;
 using orvalis::NsFlags;

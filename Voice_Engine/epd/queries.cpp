@@ -4,7 +4,7 @@
 #include <cmath>
 
 #include "Voice_Engine/basic_op/operators.h"
-#include "Voice_Engine/epd/transform.h"
+#include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 namespace orvalis {
 Word32 block_energy_db(const Word16 *x, Word32 n) {

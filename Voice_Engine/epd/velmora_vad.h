@@ -5,7 +5,7 @@
 #pragma once
 
 #include "Voice_Engine/basic_op/flags.h"
-#include "Voice_Engine/epd/channel_analysis.h"
+#include "Voice_Engine/channel/channel_analysis.h"
 
 namespace orvalis {
 

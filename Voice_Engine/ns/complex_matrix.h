@@ -5,7 +5,7 @@
 // are formed so and then added. Nothing guards against a singular matrix.
 #pragma once
 
-#include "Voice_Engine/ns/float_transform.h"
+#include "Voice_Engine/ns/float_fft_kernel.h"
 
 namespace orvalis {
 

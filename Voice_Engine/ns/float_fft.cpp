@@ -3,7 +3,7 @@
 #include <cstring>
 
 #include "Voice_Engine/basic_op/constexpr_math.h"
-#include "Voice_Engine/ns/float_transform.h"
+#include "Voice_Engine/ns/float_fft_kernel.h"
 #include "Voice_Engine/platform/export.h"
 
 namespace orvalis {

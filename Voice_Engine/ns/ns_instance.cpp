@@ -2,7 +2,7 @@
 
 #include <cstdlib>
 
-#include "Voice_Engine/epd/frame_screening.h"
+#include "Voice_Engine/channel/frame_screening.h"
 #include "Voice_Engine/platform/dump_file.h"
 #include "Voice_Engine/platform/log.h"
 #include "Voice_Engine/platform/version.h"

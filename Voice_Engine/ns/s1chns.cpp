@@ -3,8 +3,8 @@
 #include <algorithm>
 
 #include "Voice_Engine/basic_op/block_scaling.h"
-#include "Voice_Engine/epd/channel_tables.h"
-#include "Voice_Engine/epd/transform.h"
+#include "Voice_Engine/channel/channel_plans.h"
+#include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 namespace orvalis {
 namespace {

@@ -7,7 +7,7 @@
 #include <numeric>
 #include <random>
 
-#include "tests/epd/one_step.h"
+#include "tests/channel/one_step.h"
 #include "tests/support/level_jumps.h"
 
 namespace orvalis::test {

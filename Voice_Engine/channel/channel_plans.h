@@ -1,7 +1,7 @@
 // The plans of the channel analysis: the detector's two bands and the suppressor's one.
 #pragma once
 
-#include "Voice_Engine/epd/channel_analysis.h"
+#include "Voice_Engine/channel/channel_analysis.h"
 
 namespace orvalis {
 

@@ -10,9 +10,9 @@
 #include <string>
 
 #include "Voice_Engine/basic_op/block_scaling.h"
-#include "Voice_Engine/epd/channel_tables.h"
-#include "Voice_Engine/epd/transform.h"
-#include "tests/epd/channel_model.h"
+#include "Voice_Engine/channel/channel_plans.h"
+#include "Voice_Engine/channel/fixed_fft_kernel.h"
+#include "tests/channel/channel_model.h"
 
 namespace orvalis::test {
 

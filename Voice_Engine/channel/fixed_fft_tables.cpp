@@ -3,7 +3,7 @@
 
 #include "Voice_Engine/basic_op/constexpr_math.h"
 #include "Voice_Engine/basic_op/hidden_table.h"
-#include "Voice_Engine/epd/transform.h"
+#include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 namespace {
 

@@ -1,4 +1,4 @@
-#include "Voice_Engine/epd/transform.h"
+#include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 #include <utility>
 

@@ -1,4 +1,4 @@
-#include "Voice_Engine/MCRAvad/unscaled_fft.h"
+#include "Voice_Engine/MCRAvad/noscale_fft_kernel.h"
 
 #include <array>
 

@@ -5,7 +5,7 @@
 #include <cmath>
 #include <set>
 
-#include "Voice_Engine/epd/channel_tables.h"
+#include "Voice_Engine/channel/channel_plans.h"
 
 namespace orvalis::test {
 namespace {

@@ -1,4 +1,4 @@
-#include "tests/epd/channel_model.h"
+#include "tests/channel/channel_model.h"
 
 #include <algorithm>
 #include <cmath>

@@ -1,4 +1,4 @@
-#include "Voice_Engine/epd/channel_tables.h"
+#include "Voice_Engine/channel/channel_plans.h"
 
 #include <array>
 
