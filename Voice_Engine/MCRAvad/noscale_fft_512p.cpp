@@ -6,12 +6,12 @@
 #include "Voice_Engine/MCRAvad/noscale_fft_kernel.h"
 #include "Voice_Engine/platform/export.h"
 
-using orvalis::FftDirection;
+using orvalis::Direction;
 
 namespace {
 
-constexpr FftDirection direction_of(int32_t n) {
-  return n < 0 ? FftDirection::kInverse : FftDirection::kForward;
+constexpr Direction direction_of(int32_t n) {
+  return n < 0 ? Direction::kInverse : Direction::kForward;
 }
 
 template <int kPoints>
@@ -60,11 +60,11 @@ ORVALIS_EXPORT int32_t Noscale_FFT_256p_Frame_64bit_be(int32_t n, int32_t *re, i
 }
 
 ORVALIS_EXPORT void int_bitrev(int32_t n, int64_t *re, int64_t *im, const int16_t *table) {
-  orvalis::bit_reverse(n, re, im, table);
+  orvalis::reorder(n, re, im, table);
 }
 
 ORVALIS_EXPORT void int_bitrev_32bit(int32_t n, int32_t *re, int32_t *im, const int16_t *table) {
-  orvalis::bit_reverse(n, re, im, table);
+  orvalis::reorder(n, re, im, table);
 }
 
 }  // extern "C"

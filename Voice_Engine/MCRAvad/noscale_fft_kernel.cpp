@@ -1,6 +1,8 @@
 #include "Voice_Engine/MCRAvad/noscale_fft_kernel.h"
 
 #include <array>
+#include <numeric>
+#include <utility>
 
 #include "Voice_Engine/MCRAvad/wide_arithmetic.h"
 #include "Voice_Engine/basic_op/constexpr_math.h"
@@ -38,10 +40,9 @@ constexpr SineTable<kPoints> make_sines() {
 template <std::size_t kPoints>
 constexpr ReversalTable<kPoints> make_reversal() {
   ReversalTable<kPoints> table{};
-  for (std::size_t i = 1; i < kPoints; ++i) {
-    // What i / 2 reverses to moves a place down; the lowest bit of i becomes the highest.
-    table[i] = static_cast<Word16>(table[i / 2] / 2 + (i % 2) * (kPoints / 2));
-  }
+  std::iota(table.begin(), table.end(), Word16{0});
+  orvalis::for_each_bit_reversed_pair(
+      kPoints, [&table](std::size_t i, std::size_t j) { std::swap(table[i], table[j]); });
   return table;
 }
 
@@ -118,10 +119,10 @@ struct WorkingArrays {
 }  // namespace
 
 template <int kPoints>
-void unscaled_fft(FftDirection direction, Word64 *re, Word64 *im) {
+void unscaled_fft(Direction direction, Word64 *re, Word64 *im) {
   const UnscaledPlan plan = plan_of<kPoints>();
-  const bool inverse = direction == FftDirection::kInverse;
-  bit_reverse(kPoints, re, im, plan.reversal);
+  const bool inverse = direction == Direction::kInverse;
+  reorder(kPoints, re, im, plan.reversal);
   int step = kPoints / 2;
   for (int half = 1; half < kPoints; half *= 2, step /= 2) {
     for (int k = 0; k < half; ++k) {
@@ -144,12 +145,12 @@ template <int kPoints>
 void unscaled_spectrum(const Word16 *samples, Word32 length, Word32 *re, Word32 *im) {
   WorkingArrays<kPoints> work;
   for (Word32 i = 0; i < length; ++i) work.re[i] = q32(samples[i]);
-  unscaled_fft<kPoints>(FftDirection::kForward, work.re, work.im);
+  unscaled_fft<kPoints>(Direction::kForward, work.re, work.im);
   work.round_to(re, im);
 }
 
 template <int kPoints>
-void unscaled_fft_of_words(FftDirection direction, Word32 *re, Word32 *im) {
+void unscaled_fft_of_words(Direction direction, Word32 *re, Word32 *im) {
   WorkingArrays<kPoints> work;
   for (int i = 0; i < kPoints; ++i) {
     work.re[i] = q32(re[i]);
@@ -159,10 +160,10 @@ void unscaled_fft_of_words(FftDirection direction, Word32 *re, Word32 *im) {
   work.round_to(re, im);
 }
 
-template void unscaled_fft<512>(FftDirection, Word64 *, Word64 *);
-template void unscaled_fft<256>(FftDirection, Word64 *, Word64 *);
+template void unscaled_fft<512>(Direction, Word64 *, Word64 *);
+template void unscaled_fft<256>(Direction, Word64 *, Word64 *);
 template void unscaled_spectrum<512>(const Word16 *, Word32, Word32 *, Word32 *);
 template void unscaled_spectrum<256>(const Word16 *, Word32, Word32 *, Word32 *);
-template void unscaled_fft_of_words<256>(FftDirection, Word32 *, Word32 *);
+template void unscaled_fft_of_words<256>(Direction, Word32 *, Word32 *);
 
 }  // namespace orvalis

@@ -9,18 +9,10 @@ namespace {
 
 /// Reorders complex values by their bit-reversed index.
 void bit_reverse(Word16 *x, Word32 size) {
-  for (Word32 i = 0, j = 0; i < size - 2; i += 2) {
-    if (j > i) {
-      std::swap(x[i], x[j]);
-      std::swap(x[i + 1], x[j + 1]);
-    }
-    Word32 k = size / 2;
-    while (j >= k) {
-      j -= k;
-      k /= 2;
-    }
-    j += k;
-  }
+  for_each_bit_reversed_pair(static_cast<std::size_t>(size / 2), [x](std::size_t i, std::size_t j) {
+    std::swap(x[2 * i], x[2 * j]);
+    std::swap(x[2 * i + 1], x[2 * j + 1]);
+  });
 }
 
 constexpr Word16 saturated(Word32 x) {

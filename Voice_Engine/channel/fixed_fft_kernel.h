@@ -2,6 +2,7 @@
 // Source: TIA IS-127 (EVRC). Layout and scaling: fixed_fft.h.
 #pragma once
 
+#include "Voice_Engine/basic_op/fft.h"
 #include "Voice_Engine/basic_op/flags.h"
 
 namespace orvalis {
@@ -13,8 +14,6 @@ struct TransformPlan {
   const Word16 *twiddles;  ///< N values: cos, -sin in Q15
   const Word16 *steps;     ///< twiddle step of each stage
 };
-
-enum class Direction { kForward, kInverse };
 
 /// The plan of the detector's family: band 0 is 256 values, any other 128.
 TransformPlan epd_transform_plan(Word32 band);

@@ -3,9 +3,9 @@
 
 #include <array>
 #include <cmath>
-#include <complex>
 #include <utility>
 
+#include "Voice_Engine/basic_op/fft.h"
 #include "Voice_Engine/platform/fused.h"
 
 namespace orvalis {
@@ -42,17 +42,10 @@ constexpr Complex<float> rounded(Complex<double> a) {
 
 constexpr Complex<double> widened(Complex<float> a) { return {a.re, a.im}; }
 
-constexpr unsigned bit_reversed(unsigned index) {
-  unsigned reversed = 0;
-  for (unsigned bit = 1; bit < kTransformBins; bit *= 2)
-    reversed = 2 * reversed + ((index & bit) != 0);
-  return reversed;
-}
-
-ORVALIS_KERNEL void complex_transform(Spectrum &data, bool forward) {
-  for (unsigned i = 0; i < kTransformBins; ++i) {
-    if (const unsigned j = bit_reversed(i); i < j) std::swap(data[i], data[j]);
-  }
+ORVALIS_KERNEL void complex_transform(Spectrum &data, Direction direction) {
+  const bool forward = direction == Direction::kForward;
+  for_each_bit_reversed_pair(
+      kTransformBins, [&data](std::size_t i, std::size_t j) { std::swap(data[i], data[j]); });
   const float scale = forward ? 0.5F : 1.0F;  // at each of eight stages
   for (unsigned half = 1; half < kTransformBins; half *= 2) {
     for (unsigned j = 0; j < half; ++j) {
@@ -76,8 +69,9 @@ ORVALIS_KERNEL Complex<float> split(Complex<double> z, Complex<double> mirror,
   return rounded({0.5 * (z.re + mirror.re + turned.re), 0.5 * (z.im - mirror.im + turned.im)});
 }
 
-ORVALIS_KERNEL void real_transform(Spectrum &data, bool forward) {
-  if (forward) complex_transform(data, true);
+ORVALIS_KERNEL void real_transform(Spectrum &data, Direction direction) {
+  const bool forward = direction == Direction::kForward;
+  if (forward) complex_transform(data, direction);
   const float scale = forward ? 1.0F : 0.5F;
   data[0] = {(data[0].re + data[0].im) * scale, (data[0].re - data[0].im) * scale};
   for (unsigned k = 1; k <= kTransformBins / 2; ++k) {
@@ -91,7 +85,7 @@ ORVALIS_KERNEL void real_transform(Spectrum &data, bool forward) {
     data[k] = split(z, mirror, quarter_turned(twiddles[k]));
     data[mirrored] = split(mirror, z, quarter_turned(twiddles[mirrored]));
   }
-  if (!forward) complex_transform(data, false);
+  if (!forward) complex_transform(data, direction);
 }
 
 }  // namespace orvalis

@@ -73,7 +73,7 @@ ORVALIS_KERNEL Spectrum analyse(float *frame_history, const float *frame) {
   for (int i = 0; i < kWindow; ++i) analysis_frame[i] *= sqrt_hann_window[i];
   Spectrum spectrum;
   std::memcpy(spectrum.data(), analysis_frame, sizeof spectrum);
-  real_transform(spectrum, true);
+  real_transform(spectrum, Direction::kForward);
   return spectrum;
 }
 
@@ -87,7 +87,7 @@ Word16 to_word16(float sample) {
 
 /// Overlaps and adds the inverse transform of a spectrum; every sample goes to both channels.
 ORVALIS_KERNEL void synthesise(Spectrum &spectrum, float *overlap_tail, Word16 *out) {
-  real_transform(spectrum, false);
+  real_transform(spectrum, Direction::kInverse);
   float synthesis_buffer[kTransformSamples];
   std::memcpy(synthesis_buffer, spectrum.data(), sizeof synthesis_buffer);
   for (int i = 0; i < kWindow; ++i) synthesis_buffer[i] *= sqrt_hann_window[i];

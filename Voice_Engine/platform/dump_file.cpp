@@ -28,7 +28,7 @@ std::FILE *open_dump(const char *folder, const void *handle, const char *suffix)
   return std::fopen(path, "ab");
 }
 
-void write_dump(std::FILE *file, const Word16 *samples, int count) {
+void write_dump(std::FILE *file, const std::int16_t *samples, int count) {
   if (file == nullptr) return;
   [[maybe_unused]] const std::size_t written =
       std::fwrite(samples, sizeof *samples, static_cast<std::size_t>(count), file);

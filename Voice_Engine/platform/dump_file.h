@@ -4,8 +4,6 @@
 #include <cstdint>
 #include <cstdio>
 
-#include "Voice_Engine/basic_op/word.h"
-
 namespace orvalis {
 
 /// Folder of the end-point detector's and the noise suppressor's dump files.
@@ -23,7 +21,7 @@ std::FILE *open_dump(const char *folder, const void *handle, const char *suffix)
 
 /// Appends samples; does nothing without a file. A full disk loses samples silently: dumps are a
 /// diagnostic and must never disturb the audio path.
-void write_dump(std::FILE *file, const Word16 *samples, int count);
+void write_dump(std::FILE *file, const std::int16_t *samples, int count);
 
 /// Closes a file if there is one.
 void close_dump(std::FILE *file);
