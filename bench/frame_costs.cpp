@@ -85,7 +85,7 @@ public:
     S1CHNSInit(&state_, 2);
   }
   void hear(const Word16 *frame, int samples) {
-    NsFlags flags;
+    Flags flags;
     std::copy_n(frame, samples, buffer_);
     s1chns_C(flags, &state_, buffer_, buffer_);
     benchmark::DoNotOptimize(buffer_);
@@ -108,7 +108,7 @@ public:
     VelmoraVADInit(&state, band_);
   }
   void hear(const Word16 *frame, int /*samples*/) {
-    PlainFlags flags;
+    Flags flags;
     VelmoraVadState *state = &state_;
     benchmark::DoNotOptimize(VelmoraVAD(flags, &state, frame, band_));
   }

@@ -26,13 +26,13 @@ std::size_t script_at = 0;
 }  // namespace
 
 #define ORVALIS_DETECTOR(prefix) \
-  prefix##_ZN7orvalis17processVelmoraVADERNS_10PlainFlagsEPPNS_15VelmoraVadStateEPKsPKfi
+  prefix##_ZN7orvalis17processVelmoraVADERNS_5FlagsEPPNS_15VelmoraVadStateEPKsPKfi
 
-extern "C" std::int32_t ORVALIS_DETECTOR(__real_)(orvalis::PlainFlags &,
-                                                  orvalis::VelmoraVadState **, const std::int16_t *,
-                                                  const float *, std::int32_t);
+extern "C" std::int32_t ORVALIS_DETECTOR(__real_)(orvalis::Flags &, orvalis::VelmoraVadState **,
+                                                  const std::int16_t *, const float *,
+                                                  std::int32_t);
 
-extern "C" std::int32_t ORVALIS_DETECTOR(__wrap_)(orvalis::PlainFlags &flags,
+extern "C" std::int32_t ORVALIS_DETECTOR(__wrap_)(orvalis::Flags &flags,
                                                   orvalis::VelmoraVadState **state,
                                                   const std::int16_t *frame, const float *score,
                                                   std::int32_t band) {

@@ -100,7 +100,7 @@ ORVALIS_EXPORT int32_t ComputeEnergy(const int16_t *pcm, int32_t numSample, int3
 
 ORVALIS_EXPORT int32_t getSpectrum(const int16_t *pcm, int32_t *spectrum, int32_t samplingRate) {
   if (pcm == nullptr || spectrum == nullptr) return 0;
-  orvalis::PublishedFlags<orvalis::PlainFlags> flags;
+  orvalis::PublishedFlags<orvalis::PlainCopy> flags;
   return orvalis::getFrameSpectrum(*flags, pcm, spectrum, samplingRate == 16000 ? 0 : 1);
 }
 

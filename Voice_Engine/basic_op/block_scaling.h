@@ -17,8 +17,7 @@ constexpr Word16 largest_magnitude(const Word16 *data, Word32 length, Word16 flo
 /// Shifts a block in place, rounding, so that its largest sample keeps `headroom` spare bits.
 /// Returns the shift, left where positive; -headroom for a block of zeros.
 /// data[0] is read even where length < 1.
-template <class FlagSet>
-inline Word16 block_norm_AL(FlagSet &flags, Word16 *data, Word32 length, Word16 headroom) {
+inline Word16 block_norm_AL(Flags &flags, Word16 *data, Word32 length, Word16 headroom) {
   const Word16 largest = largest_magnitude(data, length, abs_s(data[0]));
   const Word16 shift = sub(flags, norm_s(largest), headroom);
   for (Word32 i = 0; i < length; ++i) data[i] = shift_r(flags, data[i], shift);
@@ -26,8 +25,7 @@ inline Word16 block_norm_AL(FlagSet &flags, Word16 *data, Word32 length, Word16 
 }
 
 /// The same over two blocks with one common shift, truncating instead of rounding.
-template <class FlagSet>
-inline Word16 block_norm2(FlagSet &flags, Word16 *a, Word16 *b, Word32 length, Word16 headroom) {
+inline Word16 block_norm2(Flags &flags, Word16 *a, Word16 *b, Word32 length, Word16 headroom) {
   const Word16 largest = largest_magnitude(b, length, largest_magnitude(a, length, 0));
   const Word16 shift = sub(flags, norm_s(largest), headroom);
   for (Word32 i = 0; i < length; ++i) a[i] = shl(flags, a[i], shift);
@@ -36,8 +34,7 @@ inline Word16 block_norm2(FlagSet &flags, Word16 *a, Word16 *b, Word32 length, W
 }
 
 /// Undoes a block shift on sign and magnitude, so that both signs truncate toward zero.
-template <class FlagSet>
-inline void block_denorm_AL(FlagSet &flags, Word16 *data, Word32 length, Word16 shift) {
+inline void block_denorm_AL(Flags &flags, Word16 *data, Word32 length, Word16 shift) {
   for (Word32 i = 0; i < length; ++i) {
     const Word16 magnitude = shl(flags, abs_s(data[i]), -shift);
     data[i] = data[i] < 0 ? negate(magnitude) : magnitude;

@@ -6,29 +6,25 @@
 namespace orvalis {
 
 /// Real part of a * b for Q15 parts, in Q31.
-template <class FlagSet>
-inline Word32 C2PREAL_SS(FlagSet &flags, Word16 ar, Word16 ai, Word16 br, Word16 bi) {
+inline Word32 C2PREAL_SS(Flags &flags, Word16 ar, Word16 ai, Word16 br, Word16 bi) {
   const Word32 first = L_mult(flags, ar, br);
   return L_sub(flags, first, L_mult(flags, ai, bi));
 }
 
 /// Imaginary part of a * b for Q15 parts, in Q31.
-template <class FlagSet>
-inline Word32 C2PIMAG_SS(FlagSet &flags, Word16 ar, Word16 ai, Word16 br, Word16 bi) {
+inline Word32 C2PIMAG_SS(Flags &flags, Word16 ar, Word16 ai, Word16 br, Word16 bi) {
   const Word32 first = L_mult(flags, ar, bi);
   return L_add(flags, first, L_mult(flags, ai, br));
 }
 
 /// Real part of a * b for a in Q31 and b in Q15, in Q31.
-template <class FlagSet>
-inline Word32 C2PREAL_LS(FlagSet &flags, Word32 ar, Word32 ai, Word16 br, Word16 bi) {
+inline Word32 C2PREAL_LS(Flags &flags, Word32 ar, Word32 ai, Word16 br, Word16 bi) {
   const Word32 first = L_mpy_ls(flags, ar, br);
   return L_sub(flags, first, L_mpy_ls(flags, ai, bi));
 }
 
 /// Imaginary part of a * b for a in Q31 and b in Q15, in Q31.
-template <class FlagSet>
-inline Word32 C2PIMAG_LS(FlagSet &flags, Word32 ar, Word32 ai, Word16 br, Word16 bi) {
+inline Word32 C2PIMAG_LS(Flags &flags, Word32 ar, Word32 ai, Word16 br, Word16 bi) {
   const Word32 first = L_mpy_ls(flags, ar, bi);
   return L_add(flags, first, L_mpy_ls(flags, ai, br));
 }
@@ -40,8 +36,7 @@ struct Complex32 {
 };
 
 /// a * b in Q31.
-template <class FlagSet>
-inline Complex32 complex_product(FlagSet &flags, Complex32 a, Complex32 b) {
+inline Complex32 complex_product(Flags &flags, Complex32 a, Complex32 b) {
   const Word32 rr = L_mpy_ll(flags, a.re, b.re);
   const Word32 re = L_sub(flags, rr, L_mpy_ll(flags, a.im, b.im));
   const Word32 ri = L_mpy_ll(flags, a.re, b.im);
@@ -49,16 +44,14 @@ inline Complex32 complex_product(FlagSet &flags, Complex32 a, Complex32 b) {
 }
 
 /// Real part of (a * b) * c in Q31.
-template <class FlagSet>
-inline Word32 C3PREAL(FlagSet &flags, Complex32 a, Complex32 b, Complex32 c) {
+inline Word32 C3PREAL(Flags &flags, Complex32 a, Complex32 b, Complex32 c) {
   const Complex32 ab = complex_product(flags, a, b);
   const Word32 first = L_mpy_ll(flags, ab.re, c.re);
   return L_sub(flags, first, L_mpy_ll(flags, ab.im, c.im));
 }
 
 /// Imaginary part of (a * b) * c in Q31.
-template <class FlagSet>
-inline Word32 C3PIMAG(FlagSet &flags, Complex32 a, Complex32 b, Complex32 c) {
+inline Word32 C3PIMAG(Flags &flags, Complex32 a, Complex32 b, Complex32 c) {
   const Complex32 ab = complex_product(flags, a, b);
   const Word32 first = L_mpy_ll(flags, ab.re, c.im);
   return L_add(flags, first, L_mpy_ll(flags, ab.im, c.re));

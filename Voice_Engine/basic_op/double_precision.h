@@ -12,35 +12,30 @@ struct DoubleWord {
   Word16 lo;
 };
 
-template <class FlagSet>
-inline DoubleWord L_Extract(FlagSet &flags, Word32 x) {
+inline DoubleWord L_Extract(Flags &flags, Word32 x) {
   const Word16 hi = extract_h(x);
   return {hi, extract_l(L_msu(flags, x >> 1, hi, 16384))};
 }
 
-template <class FlagSet>
-inline Word32 L_Comp(FlagSet &flags, DoubleWord x) {
+inline Word32 L_Comp(Flags &flags, DoubleWord x) {
   return L_mac(flags, L_deposit_h(x.hi), x.lo, 1);
 }
 
 /// Q31 x Q31 gives Q31.
-template <class FlagSet>
-inline Word32 Mpy_32(FlagSet &flags, DoubleWord a, DoubleWord b) {
+inline Word32 Mpy_32(Flags &flags, DoubleWord a, DoubleWord b) {
   Word32 product = L_mult(flags, a.hi, b.hi);
   product = L_mac(flags, product, mult(flags, a.hi, b.lo), 1);
   return L_mac(flags, product, mult(flags, a.lo, b.hi), 1);
 }
 
 /// Q31 x Q15 gives Q31.
-template <class FlagSet>
-inline Word32 Mpy_32_16(FlagSet &flags, DoubleWord a, Word16 b) {
+inline Word32 Mpy_32_16(Flags &flags, DoubleWord a, Word16 b) {
   const Word32 product = L_mult(flags, a.hi, b);
   return L_mac(flags, product, mult(flags, a.lo, b), 1);
 }
 
 /// Q31 quotient for 0 <= numerator < denominator, denominator normalised (hi >= 0x4000).
-template <class FlagSet>
-inline Word32 Div_32(FlagSet &flags, Word32 numerator, DoubleWord denominator) {
+inline Word32 Div_32(Flags &flags, Word32 numerator, DoubleWord denominator) {
   const Word16 approximation = div_s(flags, 0x3FFF, denominator.hi);
   Word32 reciprocal = Mpy_32_16(flags, denominator, approximation);
   reciprocal = L_sub(flags, MAX_32, reciprocal);

@@ -8,12 +8,12 @@
 #include "Voice_Engine/basic_op/operators.h"
 #include "Voice_Engine/basic_op/zolt_operators.h"
 
-using orvalis::NsFlags;
-using orvalis::PlainFlags;
+using orvalis::NsCopy;
+using orvalis::PlainCopy;
 using orvalis::PublishedFlags;
 using orvalis::Word16;
 using orvalis::Word32;
-using orvalis::ZoltFlags;
+using orvalis::ZoltCopy;
 
 #define EXPORTED extern "C" ORVALIS_EXPORT
 
@@ -32,9 +32,9 @@ using orvalis::ZoltFlags;
 #define BOTH_PURE(result, op, ns_name, parameters, ...) \
   PURE(result, op, op, parameters, __VA_ARGS__)         \
   PURE(result, ns_name, op, parameters, __VA_ARGS__)
-#define BOTH(result, op, ns_name, parameters, ...)               \
-  REPORTING(PlainFlags, result, op, op, parameters, __VA_ARGS__) \
-  REPORTING(NsFlags, result, ns_name, op, parameters, __VA_ARGS__)
+#define BOTH(result, op, ns_name, parameters, ...)              \
+  REPORTING(PlainCopy, result, op, op, parameters, __VA_ARGS__) \
+  REPORTING(NsCopy, result, ns_name, op, parameters, __VA_ARGS__)
 
 // clang-format off
 BOTH_PURE(Word16, abs_s,       ns_abs_s,       (Word16 x), x)
@@ -96,9 +96,9 @@ BOTH(Word32, fnExp10, ns_fnExp10, (Word32 x), x)
 BOTH(Word16, sqroot,  ns_sqroot,  (Word32 x), x)
 BOTH(Word32, L_Comp,  ns_L_Comp,  (Word16 hi, Word16 lo), {hi, lo})
 
-REPORTING(PlainFlags, Word32, Mpy_32,    Mpy_32,    (Word16 a_hi, Word16 a_lo, Word16 b_hi, Word16 b_lo), {a_hi, a_lo}, {b_hi, b_lo})
-REPORTING(PlainFlags, Word32, Mpy_32_16, Mpy_32_16, (Word16 a_hi, Word16 a_lo, Word16 b), {a_hi, a_lo}, b)
-REPORTING(PlainFlags, Word32, Div_32,    Div_32,    (Word32 a, Word16 b_hi, Word16 b_lo), a, {b_hi, b_lo})
+REPORTING(PlainCopy, Word32, Mpy_32,    Mpy_32,    (Word16 a_hi, Word16 a_lo, Word16 b_hi, Word16 b_lo), {a_hi, a_lo}, {b_hi, b_lo})
+REPORTING(PlainCopy, Word32, Mpy_32_16, Mpy_32_16, (Word16 a_hi, Word16 a_lo, Word16 b), {a_hi, a_lo}, b)
+REPORTING(PlainCopy, Word32, Div_32,    Div_32,    (Word32 a, Word16 b_hi, Word16 b_lo), a, {b_hi, b_lo})
 
 PURE(Word16, ZOLT_abs_s,       abs_s,       (Word16 x), x)
 PURE(Word16, ZOLT_negate,      negate,      (Word16 x), x)
@@ -113,36 +113,36 @@ PURE(Word16, ZOLT_norm_l,      norm_l,      (Word32 x), x)
 PURE(Word16, ZOLT_expadj_s,    expadj_s,    (Word16 x, Word16 max_shift), x, max_shift)
 PURE(Word16, ZOLT_div_l,       div_l,       (Word32 a, Word16 b), a, b)
 
-REPORTING(ZoltFlags, Word16, ZOLT_add,       add,       (Word16 a, Word16 b), a, b)
-REPORTING(ZoltFlags, Word16, ZOLT_sub,       sub,       (Word16 a, Word16 b), a, b)
-REPORTING(ZoltFlags, Word16, ZOLT_shr,       shr,       (Word16 x, Word16 n), x, n)
-REPORTING(ZoltFlags, Word16, ZOLT_S_round,   round_BOP, (Word32 x), x)
-REPORTING(ZoltFlags, Word16, ZOLT_mult_r,    mult_r,    (Word16 a, Word16 b), a, b)
-REPORTING(ZoltFlags, Word16, ZOLT_mac_r,     mac_r,     (Word32 sum, Word16 a, Word16 b), sum, a, b)
-REPORTING(ZoltFlags, Word16, ZOLT_msu_r,     msu_r,     (Word32 sum, Word16 a, Word16 b), sum, a, b)
-REPORTING(ZoltFlags, Word32, ZOLT_L_mac,     L_mac,     (Word32 sum, Word16 a, Word16 b), sum, a, b)
-REPORTING(ZoltFlags, Word32, ZOLT_L_msu,     L_msu,     (Word32 sum, Word16 a, Word16 b), sum, a, b)
-REPORTING(ZoltFlags, Word32, ZOLT_L_macNs,   L_macNs,   (Word32 sum, Word16 a, Word16 b), sum, a, b)
-REPORTING(ZoltFlags, Word32, ZOLT_L_msuNs,   L_msuNs,   (Word32 sum, Word16 a, Word16 b), sum, a, b)
-REPORTING(ZoltFlags, Word32, ZOLT_L_sub,     L_sub,     (Word32 a, Word32 b), a, b)
-REPORTING(ZoltFlags, Word32, ZOLT_L_add_c,   L_add_c,   (Word32 a, Word32 b), a, b)
-REPORTING(ZoltFlags, Word32, ZOLT_L_sub_c,   L_sub_c,   (Word32 a, Word32 b), a, b)
-REPORTING(ZoltFlags, Word32, ZOLT_L_sat,     L_sat,     (Word32 x), x)
-REPORTING(ZoltFlags, Word32, ZOLT_L_mls,     L_mls,     (Word32 a, Word16 b), a, b)
-REPORTING(ZoltFlags, Word16, ZOLT_short_sat, sature,    (Word32 x), x)
-REPORTING(ZoltFlags, Word16, ZOLT_div_s,     div_s,     (Word16 a, Word16 b), a, b)
+REPORTING(ZoltCopy, Word16, ZOLT_add,       add,       (Word16 a, Word16 b), a, b)
+REPORTING(ZoltCopy, Word16, ZOLT_sub,       sub,       (Word16 a, Word16 b), a, b)
+REPORTING(ZoltCopy, Word16, ZOLT_shr,       shr,       (Word16 x, Word16 n), x, n)
+REPORTING(ZoltCopy, Word16, ZOLT_S_round,   round_BOP, (Word32 x), x)
+REPORTING(ZoltCopy, Word16, ZOLT_mult_r,    mult_r,    (Word16 a, Word16 b), a, b)
+REPORTING(ZoltCopy, Word16, ZOLT_mac_r,     mac_r,     (Word32 sum, Word16 a, Word16 b), sum, a, b)
+REPORTING(ZoltCopy, Word16, ZOLT_msu_r,     msu_r,     (Word32 sum, Word16 a, Word16 b), sum, a, b)
+REPORTING(ZoltCopy, Word32, ZOLT_L_mac,     L_mac,     (Word32 sum, Word16 a, Word16 b), sum, a, b)
+REPORTING(ZoltCopy, Word32, ZOLT_L_msu,     L_msu,     (Word32 sum, Word16 a, Word16 b), sum, a, b)
+REPORTING(ZoltCopy, Word32, ZOLT_L_macNs,   L_macNs,   (Word32 sum, Word16 a, Word16 b), sum, a, b)
+REPORTING(ZoltCopy, Word32, ZOLT_L_msuNs,   L_msuNs,   (Word32 sum, Word16 a, Word16 b), sum, a, b)
+REPORTING(ZoltCopy, Word32, ZOLT_L_sub,     L_sub,     (Word32 a, Word32 b), a, b)
+REPORTING(ZoltCopy, Word32, ZOLT_L_add_c,   L_add_c,   (Word32 a, Word32 b), a, b)
+REPORTING(ZoltCopy, Word32, ZOLT_L_sub_c,   L_sub_c,   (Word32 a, Word32 b), a, b)
+REPORTING(ZoltCopy, Word32, ZOLT_L_sat,     L_sat,     (Word32 x), x)
+REPORTING(ZoltCopy, Word32, ZOLT_L_mls,     L_mls,     (Word32 a, Word16 b), a, b)
+REPORTING(ZoltCopy, Word16, ZOLT_short_sat, sature,    (Word32 x), x)
+REPORTING(ZoltCopy, Word16, ZOLT_div_s,     div_s,     (Word16 a, Word16 b), a, b)
 // clang-format on
 
 // The operators that the inline ones express with a pair, or with no name at all.
 EXPORTED void Log2(Word32 x, Word16 *exponent, Word16 *fraction) {
-  PublishedFlags<PlainFlags> flags;
+  PublishedFlags<PlainCopy> flags;
   const orvalis::Log2Result result = orvalis::Log2(*flags, x);
   *exponent = result.exponent;
   *fraction = result.fraction;
 }
 
 EXPORTED void L_Extract(Word32 x, Word16 *hi, Word16 *lo) {
-  PublishedFlags<PlainFlags> flags;
+  PublishedFlags<PlainCopy> flags;
   const orvalis::DoubleWord result = orvalis::L_Extract(*flags, x);
   *hi = result.hi;
   *lo = result.lo;

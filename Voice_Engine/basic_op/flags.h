@@ -5,6 +5,8 @@
 // next operator overwrites it, and publishes that pair once when an exported call returns.
 #pragma once
 
+#include <type_traits>
+
 #include "Voice_Engine/basic_op/word.h"
 #include "Voice_Engine/platform/export.h"
 
@@ -18,49 +20,62 @@ ORVALIS_EXPORT extern orvalis::Word16 Overflow_ZOLT, Carry_ZOLT;
 
 namespace orvalis {
 
-/// The flags of one call. `overflow` and `carry` hold 0 or 1, or what a host stored before.
+/// The flags of one call of the plain or the ns_ copy, which differ in where they are published
+/// only. `overflow` and `carry` hold 0 or 1, or what a host stored before.
 struct Flags {
   Word32 overflow = 0;
   Word32 carry = 0;
 };
 
-/// Flags of the plain copy: end-point detection, queries, dynamics control.
-struct PlainFlags : Flags {
-  static auto &published_overflow() { return ::Overflow; }
-  static auto &published_carry() { return ::Carry; }
+/// Flags of the ZOLT_ copy: extended mathematics. A type of its own, so that no code over Flags
+/// passes by its deviations, which stand in zolt_operators.h as overloads.
+struct ZoltFlags {
+  Word32 overflow = 0;
+  Word32 carry = 0;
 };
 
-/// Flags of the ns_ copy: the single-channel suppressor and its transform.
-struct NsFlags : Flags {
-  static auto &published_overflow() { return ::ns_Overflow; }
-  static auto &published_carry() { return ::ns_Carry; }
+static_assert(!std::is_convertible_v<ZoltFlags &, Flags &>);
+
+/// Publishes to the plain copy: end-point detection, queries, dynamics control.
+struct PlainCopy {
+  using Local = Flags;
+  static auto &overflow() { return ::Overflow; }
+  static auto &carry() { return ::Carry; }
 };
 
-/// Flags of the ZOLT_ copy: extended mathematics. Its deviations stand in zolt_operators.h.
-struct ZoltFlags : Flags {
-  static auto &published_overflow() { return ::Overflow_ZOLT; }
-  static auto &published_carry() { return ::Carry_ZOLT; }
+/// Publishes to the ns_ copy: the single-channel suppressor and its transform.
+struct NsCopy {
+  using Local = Flags;
+  static auto &overflow() { return ::ns_Overflow; }
+  static auto &carry() { return ::ns_Carry; }
+};
+
+/// Publishes to the ZOLT_ copy.
+struct ZoltCopy {
+  using Local = ZoltFlags;
+  static auto &overflow() { return ::Overflow_ZOLT; }
+  static auto &carry() { return ::Carry_ZOLT; }
 };
 
 /// The flags of one exported call: read when it begins, published when it returns, so that a value
 /// that no operator overwrites stays. Relaxed atomics keep concurrent instances free of data races
 /// on objects whose layout has to stay a plain integer.
-template <class FlagSet>
+template <class Copy>
 class PublishedFlags {
 public:
   PublishedFlags() {
-    flags_.overflow = __atomic_load_n(&FlagSet::published_overflow(), __ATOMIC_RELAXED);
-    flags_.carry = __atomic_load_n(&FlagSet::published_carry(), __ATOMIC_RELAXED);
+    flags_.overflow = __atomic_load_n(&Copy::overflow(), __ATOMIC_RELAXED);
+    flags_.carry = __atomic_load_n(&Copy::carry(), __ATOMIC_RELAXED);
   }
   ~PublishedFlags() {
-    store(FlagSet::published_overflow(), flags_.overflow);
-    store(FlagSet::published_carry(), flags_.carry);
+    store(Copy::overflow(), flags_.overflow);
+    store(Copy::carry(), flags_.carry);
   }
   PublishedFlags(const PublishedFlags &) = delete;
   PublishedFlags &operator=(const PublishedFlags &) = delete;
 
   /// The local pair that operators report to.
-  FlagSet &operator*() { return flags_; }
+  typename Copy::Local &operator*() { return flags_; }
 
 private:
   template <class Word>
@@ -68,7 +83,9 @@ private:
     __atomic_store_n(&published, static_cast<Word>(value), __ATOMIC_RELAXED);
   }
 
-  FlagSet flags_;
+  typename Copy::Local flags_;
 };
+
+static_assert(!std::is_convertible_v<PublishedFlags<NsCopy> &, PublishedFlags<PlainCopy> &>);
 
 }  // namespace orvalis

@@ -20,8 +20,7 @@ struct Log2Result {
 };
 
 /// log2(x) for x > 0 by table and linear interpolation; (0, 0) for x <= 0.
-template <class FlagSet>
-inline Log2Result Log2(FlagSet &flags, Word32 x) {
+inline Log2Result Log2(Flags &flags, Word32 x) {
   if (x <= 0) return {0, 0};
   const Word16 shift = norm_l(x);
   const Word16 exponent = sub(flags, 30, shift);
@@ -34,8 +33,7 @@ inline Log2Result Log2(FlagSet &flags, Word32 x) {
 }
 
 /// log2(x / 2^31) in Q26 for x > 0, hence never positive; MAX_32 for 0.
-template <class FlagSet>
-inline Word32 fnLog2(FlagSet &flags, Word32 x) {
+inline Word32 fnLog2(Flags &flags, Word32 x) {
   if (x == 0) return MAX_32;
   const Word16 shift = norm_l(x);
   const Word16 mantissa = extract_h(L_shl(flags, x, shift));
@@ -47,15 +45,13 @@ inline Word32 fnLog2(FlagSet &flags, Word32 x) {
 }
 
 /// log10(x / 2^31) in Q26 for x > 0; MAX_32 for 0.
-template <class FlagSet>
-inline Word32 fnLog10(FlagSet &flags, Word32 x) {
+inline Word32 fnLog10(Flags &flags, Word32 x) {
   constexpr Word16 kLog10Of2 = 9864;  // Q15
   return x == 0 ? MAX_32 : L_mpy_ls(flags, fnLog2(flags, x), kLog10Of2);
 }
 
 /// 2^x in Q31 for x <= 0 in Q26; larger arguments have no defined result.
-template <class FlagSet>
-inline Word32 fnExp2(FlagSet &flags, Word32 x) {
+inline Word32 fnExp2(Flags &flags, Word32 x) {
   const Word32 split = L_mult(flags, extract_h(x), 32);
   const Word16 exponent = sub(flags, -1, extract_h(split));
   const Word32 fraction = L_add(flags, split & 0xFFFF, L_deposit_h(-1)) >> 1;
@@ -67,8 +63,7 @@ inline Word32 fnExp2(FlagSet &flags, Word32 x) {
 }
 
 /// 10^x in Q31 for x <= 0 in Q26; larger arguments have no defined result.
-template <class FlagSet>
-inline Word32 fnExp10(FlagSet &flags, Word32 x) {
+inline Word32 fnExp10(Flags &flags, Word32 x) {
   constexpr Word16 kLog2Of10 = 27213;  // Q13
   return fnExp2(flags, L_shl(flags, L_mpy_ls(flags, x, kLog2Of10), 2));
 }
@@ -76,8 +71,7 @@ inline Word32 fnExp10(FlagSet &flags, Word32 x) {
 /// sqrt(x) in Q15 for a normalised x in Q31 (0.5 <= x < 1): the Taylor series of sqrt(1 + 2h) to
 /// the fifth order with h = (x - 1) / 2,
 /// 1 + h - h^2/2 + h^3/2 - 5 h^4/8 + 7 h^5/8. Every power is rounded before the next.
-template <class FlagSet>
-inline Word16 sqroot(FlagSet &flags, Word32 x) {
+inline Word16 sqroot(Flags &flags, Word32 x) {
   const Word32 half = L_sub(flags, L_shr(flags, x, 1), 0x40000000);
   const Word16 h = extract_h(half);
   Word32 sum = L_sub(flags, half, MIN_32);

@@ -3,10 +3,10 @@
 // Source: ITU-T G.191 Software Tool Library, basic operators, in their ITU-T G.729 form, and the
 // fixed-point helpers of TIA IS-127 (EVRC).
 //
-// Every operator is a template over the flag set that it reports to and takes that set first. An
-// operator without a flag parameter touches no flag. Word16 values are Q15 and Word32 values Q31
-// where they are fractions. Shift counts may have any size and give the mathematical result; a
-// negative count shifts the other way.
+// An operator takes the flags that it reports to first; one without that parameter touches none.
+// Operators are templates over Flags and ZoltFlags; what is built on them takes Flags. Word16
+// values are Q15 and Word32 values Q31 where they are fractions. Shift counts may have any size and
+// give the mathematical result; a negative count shifts the other way.
 #pragma once
 
 #include <bit>

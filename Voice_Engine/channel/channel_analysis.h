@@ -3,14 +3,13 @@
 // the decision whether the noise may be learnt from it.
 //
 // Source: TIA IS-127 (EVRC), noise suppression. Both widen it in their own way: what differs is
-// data in ChannelPlan, what is shared stands here once, as templates over the operators' flags.
+// data in ChannelPlan, what is shared stands here once.
 //
 // Energies are in units that do not depend on the block shift of a frame. Levels in dB are Q5,
 // relative to an energy of 256.
 #pragma once
 
-#include "Voice_Engine/basic_op/log_exp.h"
-#include "Voice_Engine/basic_op/operators.h"
+#include "Voice_Engine/basic_op/flags.h"
 
 namespace orvalis {
 
@@ -85,246 +84,48 @@ struct ChannelFindings {
   bool is_noise;            ///< the noise may be learnt from this frame
 };
 
-/// Contribution of a channel to the voice metric by its SNR index; IS-127's table.
-inline constexpr Word16 vm_tbl[90] = {
-    2,  2,  2,  2,  2,  2,  2,  2,  2,  2,  2,  3,  3,  3,  3,  3,  4,  4,  4,  5,  5,  5,  6,
-    6,  7,  7,  7,  8,  8,  9,  9,  10, 10, 11, 12, 12, 13, 13, 14, 15, 15, 16, 17, 17, 18, 19,
-    20, 20, 21, 22, 23, 24, 24, 25, 26, 27, 28, 28, 29, 30, 31, 32, 33, 34, 35, 36, 37, 37, 38,
-    39, 40, 41, 42, 43, 44, 45, 46, 47, 48, 49, 50, 50, 50, 50, 50, 50, 50, 50, 50, 50};
-
 // --- The frame ---------------------------------------------------------------------------------
 
 /// Lays out the transform buffer: the previous frame's overlap and this frame, pre-emphasised by
 /// 0.8, zeros behind. `x` is normalised by `shift`; overlap and memory are brought to that scale.
-template <class FlagSet>
-inline void assemble_frame(FlagSet &flags, const ChannelPlan &plan, const Word16 *x, Word16 shift,
-                           Word16 &prev_shift, Word16 &pre_emp_mem, Word16 *overlap,
-                           Word16 *buffer) {
-  constexpr Word16 kMinusPreEmphasis = -26214;  // -0.8 in Q15
-  const Word16 rescale = sub(flags, shift, prev_shift);
-  for (int i = 0; i < plan.overlap; ++i) buffer[i] = shift_r(flags, overlap[i], rescale);
-  Word16 previous = shift_r(flags, pre_emp_mem, rescale);
-  prev_shift = shift;
-  Word16 *out = buffer + plan.overlap;
-  for (int i = 0; i < plan.frame_samples; ++i) {
-    out[i] = add(flags, x[i], mult(flags, kMinusPreEmphasis, previous));
-    previous = x[i];
-  }
-  pre_emp_mem = previous;
-  const int used = plan.overlap + plan.frame_samples;
-  for (int i = used; i < plan.transform_size; ++i) buffer[i] = 0;
-  for (int i = 0; i < plan.overlap; ++i) overlap[i] = buffer[plan.frame_samples + i];
-}
+void assemble_frame(Flags &flags, const ChannelPlan &plan, const Word16 *x, Word16 shift,
+                    Word16 &prev_shift, Word16 &pre_emp_mem, Word16 *overlap, Word16 *buffer);
 
 /// Weights both ends of the assembled frame by the window's edge.
-template <class FlagSet>
-inline void window_edges(FlagSet &flags, const ChannelPlan &plan, Word16 *buffer) {
-  Word16 *last = buffer + plan.overlap + plan.frame_samples - 1;
-  for (int i = 0; i < plan.overlap; ++i) {
-    buffer[i] = mult_r(flags, buffer[i], plan.window_edge[i]);
-    last[-i] = mult_r(flags, last[-i], plan.window_edge[i]);
-  }
-}
+void window_edges(Flags &flags, const ChannelPlan &plan, Word16 *buffer);
 
-// --- Steps of the analysis -----------------------------------------------------------------------
-
-/// A Q15 factor times an energy, at the full precision of the energy's high half.
-template <class FlagSet>
-inline Word32 scaled_energy(FlagSet &flags, Word32 energy, Word16 factor_q15) {
-  const Word16 shift = norm_l(energy);
-  const Word16 high = extract_h(L_shl(flags, energy, shift));
-  return L_shr(flags, L_mult(flags, high, factor_q15), shift);
-}
-
-/// The same with a Q31 factor.
-template <class FlagSet>
-inline Word32 scaled_energy(FlagSet &flags, Word32 energy, Word32 factor_q31) {
-  const Word16 shift = norm_l(energy);
-  const Word16 high = extract_h(L_shl(flags, energy, shift));
-  return L_shr(flags, L_mpy_ls(flags, factor_q31, high), shift);
-}
-
-/// Mean power of a channel's bins, in the scale of the normalised frame.
-template <class FlagSet>
-inline Word32 channel_power(FlagSet &flags, const Word16 *spectrum, ChannelBins bins,
-                            ChannelScale scale) {
-  Word32 power = 0;
-  for (const Word16 *part = &spectrum[2 * bins.first]; part < &spectrum[2 * bins.last + 2];
-       ++part) {
-    power = L_mac(flags, power, *part, *part);
-  }
-  return scale.kind == ChannelScale::kShift ? L_shr(flags, power, scale.value)
-                                            : scaled_energy(flags, power, scale.value);
-}
-
-/// Updates the smoothed channel energies; returns their sum before the floor.
-template <class FlagSet>
-inline Word64 track_energies(FlagSet &flags, const ChannelPlan &plan, ChannelState &state,
-                             const Word16 *spectrum, Word16 shift) {
-  constexpr Word32 kKept = 0x3999999A;   // 0.45 in Q31
-  constexpr Word32 kTaken = 0x46666666;  // 0.55 in Q31
-  const Word32 unshift = 7 - 2 * shift;
-  Word64 sum = 0;
-  for (int i = 0; i < plan.channels; ++i) {
-    const Word32 power = channel_power(flags, spectrum, plan.bins[i], plan.scales[i]);
-    Word32 &energy = state.energy[i];
-    if (state.first_frame) {
-      energy = L_shl(flags, power, unshift);
-    } else {
-      const Word32 taken = plan.scale_then_smooth
-                               ? scaled_energy(flags, L_shl(flags, power, unshift), kTaken)
-                               : L_shl(flags, scaled_energy(flags, power, kTaken), unshift);
-      energy = L_add(flags, scaled_energy(flags, energy, kKept), taken);
-    }
-    sum += energy;
-    if (energy < plan.energy_floor) energy = plan.energy_floor;
-  }
-  return sum;
-}
-
-/// In the first frames the noise is whatever there is, but not less than 4096.
-inline void seed_noise(const ChannelPlan &plan, ChannelState &state) {
-  constexpr Word32 kLeastSeed = 4096;
-  if (state.frame_cnt > plan.seeding_frames) return;
-  for (int i = 0; i < plan.channels; ++i) {
-    state.noise[i] = state.energy[i] > kLeastSeed ? state.energy[i] : kLeastSeed;
-  }
-}
+// --- Its levels ----------------------------------------------------------------------------------
 
 /// 10 in the scale that turns a log10 in Q26 into dB in Q21, and its high half into Q5.
 inline constexpr Word16 kDecibels = 10270;
 
-/// Signal-to-noise ratio of a channel in steps of 3/8 dB, rounded, at least 0.
-template <class FlagSet>
-inline Word16 snr_index(FlagSet &flags, Word32 energy, Word32 noise) {
-  constexpr Word32 kLog10Of2To27 = 545448088;  // Q26: the ratio below is in Q4
-  constexpr Word32 kHalfStep = 0x60000;        // 3/16 dB in Q21
-  constexpr Word16 kOneTwelfth = 2731;         // Q15: 12 steps of 1/32 dB
-  const Word16 energy_shift = norm_l(energy);
-  const Word16 noise_shift = norm_l(noise);
-  const Word32 quotient =
-      L_divide(flags, L_shl(flags, energy, energy_shift - 1), L_shl(flags, noise, noise_shift));
-  Word32 ratio_q4 = L_shr(flags, quotient, energy_shift + 26 - noise_shift);
-  if (ratio_q4 == 0) ratio_q4 = 1;
-  const Word32 logarithm = L_add(flags, fnLog10(flags, ratio_q4), kLog10Of2To27);
-  Word32 level = L_mult(flags, kDecibels, extract_h(logarithm));
-  if (level < 0) level = 0;
-  return extract_h(L_mult(flags, extract_h(L_add(flags, level, kHalfStep)), kOneTwelfth));
-}
-
-template <class FlagSet>
-inline Word16 voice_metric(FlagSet &flags, const Word16 *snr, int channels) {
-  Word16 metric = 0;
-  for (int i = 0; i < channels; ++i) {
-    metric = add(flags, metric, vm_tbl[snr[i] < 89 ? snr[i] : 89]);
-  }
-  return metric;
-}
-
 /// log10(energy / 256) in Q26.
-template <class FlagSet>
-inline Word32 log10_energy(FlagSet &flags, Word32 energy) {
-  constexpr Word32 kLog10Of2To23 = 464640964;  // Q26
-  return L_add(flags, fnLog10(flags, energy), kLog10Of2To23);
-}
+Word32 log10_energy(Flags &flags, Word32 energy);
 
 /// Level of an energy in dB, Q5.
-template <class FlagSet>
-inline Word16 level_q5(FlagSet &flags, Word32 energy) {
-  return mult(flags, kDecibels, extract_h(log10_energy(flags, energy)));
-}
+Word16 level_q5(Flags &flags, Word32 energy);
 
-template <class FlagSet>
-inline Word32 sum_energies(FlagSet &flags, const Word32 *energy, int channels) {
-  Word32 sum = 0;
-  for (int i = 0; i < channels; ++i) sum = L_add(flags, sum, energy[i]);
-  return sum;
-}
-
-/// Share of the past in the long-term levels, Q15: 0.5 for loud frames, 0.99 for quiet ones.
-template <class FlagSet>
-inline Word16 long_term_share(FlagSet &flags, const ChannelPlan &plan, Word32 total) {
-  const Word16 below = sub(flags, plan.loud_level_q5, level_q5(flags, total));
-  const Word16 share_q10 = sub(flags, 1023, mult(flags, 803, shl(flags, below, 5)));
-  if (share_q10 >= 1024) return 32440;
-  if (share_q10 <= 510) return 16383;
-  return shl(flags, share_q10, 5);
-}
-
-/// Whether the noise may be learnt from a frame, with the counters that force it when the spectrum
-/// stays the same for 50 frames, and the hysteresis that forgets a broken count.
-template <class FlagSet>
-inline bool decide_noise(FlagSet &flags, const ChannelPlan &plan, ChannelState &state,
-                         const ChannelFindings &found) {
-  constexpr Word16 kFramesToForce = 49;
-  constexpr Word16 kFramesToForget = 6;
-  bool is_noise = false;
-  if (found.voice_metric <= plan.metric_noise) {
-    is_noise = true;
-    state.update_cnt = 0;
-  } else if (found.total_energy > plan.energy_silent && found.deviation_q5 < plan.deviation_voice) {
-    state.update_cnt = add(flags, state.update_cnt, 1);
-    is_noise = state.update_cnt > kFramesToForce;
-  }
-
-  const Word16 counted = state.update_cnt;
-  if (counted == state.last_update_cnt) {
-    state.hyster_cnt = add(flags, state.hyster_cnt, 1);
-    if (state.hyster_cnt > kFramesToForget) state.update_cnt = 0;
-  } else {
-    state.hyster_cnt = 0;
-  }
-  state.last_update_cnt = plan.remember_reset ? state.update_cnt : counted;
-  return is_noise;
-}
+Word32 sum_energies(Flags &flags, const Word32 *energy, int channels);
 
 // --- The analysis --------------------------------------------------------------------------------
 
+/// In the first frames the noise is whatever there is, but not less than 4096.
+void seed_noise(const ChannelPlan &plan, ChannelState &state);
+
+/// Share of the past in the long-term levels, Q15: 0.5 for loud frames, 0.99 for quiet ones.
+Word16 long_term_share(Flags &flags, const ChannelPlan &plan, Word32 total);
+
+/// Whether the noise may be learnt from a frame, with the counters that force it when the spectrum
+/// stays the same for 50 frames, and the hysteresis that forgets a broken count.
+bool decide_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state,
+                  const ChannelFindings &found);
+
 /// Analyses the spectrum of a frame that was normalised by `shift`: updates energies, long-term
 /// levels and counters, and, in the first frames, the noise.
-template <class FlagSet>
-inline ChannelFindings analyse_channels(FlagSet &flags, const ChannelPlan &plan,
-                                        ChannelState &state, const Word16 *spectrum, Word16 shift) {
-  ChannelFindings found;
-  found.unclamped_energy = track_energies(flags, plan, state, spectrum, shift);
-  seed_noise(plan, state);
-  for (int i = 0; i < plan.channels; ++i) {
-    found.snr[i] = snr_index(flags, state.energy[i], state.noise[i]);
-  }
-  found.voice_metric = voice_metric(flags, found.snr, plan.channels);
-  found.total_energy = sum_energies(flags, state.energy, plan.channels);
-
-  Word16 level[kMostChannels];
-  for (int i = 0; i < plan.channels; ++i) level[i] = level_q5(flags, state.energy[i]);
-  if (state.first_frame) {
-    for (int i = 0; i < plan.channels; ++i) state.long_term_q5[i] = level[i];
-  }
-  found.deviation_q5 = 0;
-  for (int i = 0; i < plan.channels; ++i) {
-    const Word16 distance = abs_s(sub(flags, state.long_term_q5[i], level[i]));
-    found.deviation_q5 = add(flags, found.deviation_q5, distance);
-  }
-
-  const Word16 share = long_term_share(flags, plan, found.total_energy);
-  const auto rest = static_cast<Word16>(MAX_16 - share);
-  for (int i = 0; i < plan.channels; ++i) {
-    const Word32 past = L_mult(flags, share, state.long_term_q5[i]);
-    state.long_term_q5[i] = extract_h(L_add(flags, L_mult(flags, rest, level[i]), past));
-  }
-  found.is_noise = decide_noise(flags, plan, state, found);
-  return found;
-}
+ChannelFindings analyse_channels(Flags &flags, const ChannelPlan &plan, ChannelState &state,
+                                 const Word16 *spectrum, Word16 shift);
 
 /// Learns the noise from a frame: 0.9 of the past and 0.1 of the present.
-template <class FlagSet>
-inline void track_noise(FlagSet &flags, const ChannelPlan &plan, ChannelState &state) {
-  constexpr Word16 kKept = 29490;
-  constexpr Word16 kTaken = 3277;
-  for (int i = 0; i < plan.channels; ++i) {
-    const Word32 kept = scaled_energy(flags, state.noise[i], kKept);
-    state.noise[i] = L_add(flags, kept, scaled_energy(flags, state.energy[i], kTaken));
-    if (state.noise[i] < plan.energy_floor) state.noise[i] = plan.energy_floor;
-  }
-}
+void track_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state);
 
 }  // namespace orvalis

@@ -61,14 +61,13 @@ Word32 complex_stages(Word16 *x, const TransformPlan &plan) {
   return last_sum;
 }
 
-template <class FlagSet>
-inline Word16 rounded_half(FlagSet &flags, Word32 a, Word32 b) {
+inline Word16 rounded_half(Flags &flags, Word32 a, Word32 b) {
   return round_BOP(flags, L_add(flags, a, b) >> 1);
 }
 
 /// Turns bins k and N/2 - k of the packed complex spectrum into those of the real one, or back.
-template <Direction kDirection, class FlagSet>
-inline void split_pair(FlagSet &flags, Word16 *low, Word16 *high, const Word16 *low_twiddle,
+template <Direction kDirection>
+inline void split_pair(Flags &flags, Word16 *low, Word16 *high, const Word16 *low_twiddle,
                        const Word16 *high_twiddle) {
   constexpr bool kForward = kDirection == Direction::kForward;
   const Word16 even_re = add(flags, low[0], high[0]);
@@ -97,8 +96,8 @@ inline void split_pair(FlagSet &flags, Word16 *low, Word16 *high, const Word16 *
   high[1] = rounded_half(flags, L_negate(im), mirrored);
 }
 
-template <Direction kDirection, class FlagSet>
-void split(FlagSet &flags, Word16 *x, const TransformPlan &plan) {
+template <Direction kDirection>
+void split(Flags &flags, Word16 *x, const TransformPlan &plan) {
   constexpr int kHalving = kDirection == Direction::kForward ? 0 : 1;
   const Word16 first = x[0];
   const Word16 second = x[1];
@@ -111,8 +110,7 @@ void split(FlagSet &flags, Word16 *x, const TransformPlan &plan) {
 
 }  // namespace
 
-template <class FlagSet>
-void complex_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
+void complex_fft(Flags &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
   if (direction == Direction::kForward) {
     sature(flags, complex_stages<Direction::kForward>(x, plan));
   } else {
@@ -120,8 +118,7 @@ void complex_fft(FlagSet &flags, Word16 *x, Direction direction, const Transform
   }
 }
 
-template <class FlagSet>
-void real_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
+void real_fft(Flags &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
   if (direction == Direction::kForward) {
     sature(flags, complex_stages<Direction::kForward>(x, plan));
     split<Direction::kForward>(flags, x, plan);
@@ -130,10 +127,5 @@ void real_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPla
     sature(flags, complex_stages<Direction::kInverse>(x, plan));
   }
 }
-
-template void complex_fft(PlainFlags &, Word16 *, Direction, const TransformPlan &);
-template void complex_fft(NsFlags &, Word16 *, Direction, const TransformPlan &);
-template void real_fft(PlainFlags &, Word16 *, Direction, const TransformPlan &);
-template void real_fft(NsFlags &, Word16 *, Direction, const TransformPlan &);
 
 }  // namespace orvalis

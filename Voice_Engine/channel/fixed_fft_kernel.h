@@ -1,4 +1,4 @@
-// The fixed-point FFT of both families: one body over an operator copy and a set of tables.
+// The fixed-point FFT of both families: one body over a set of tables.
 // Source: TIA IS-127 (EVRC). Layout and scaling: fixed_fft.h.
 #pragma once
 
@@ -21,12 +21,10 @@ TransformPlan epd_transform_plan(Word32 band);
 /// The plan of the suppressor's family: 256 values.
 TransformPlan ns_transform_plan();
 
-/// In-place complex transform of plan.size / 2 points. For PlainFlags and NsFlags.
-template <class FlagSet>
-void complex_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPlan &plan);
+/// In-place complex transform of plan.size / 2 points.
+void complex_fft(Flags &flags, Word16 *x, Direction direction, const TransformPlan &plan);
 
-/// In-place real transform of plan.size samples. For PlainFlags and NsFlags.
-template <class FlagSet>
-void real_fft(FlagSet &flags, Word16 *x, Direction direction, const TransformPlan &plan);
+/// In-place real transform of plan.size samples.
+void real_fft(Flags &flags, Word16 *x, Direction direction, const TransformPlan &plan);
 
 }  // namespace orvalis

@@ -27,14 +27,14 @@ constexpr Word16 kGainCurve[64] = {
 Word16 frame_length(Word32 samplingRate) { return samplingRate == kRate ? 160 : 80; }
 
 /// The gain for a peak, between two entries of the curve; its high half is Q11.
-Word32 target_gain(PlainFlags &flags, const Word16 *curve, Word16 peak) {
+Word32 target_gain(Flags &flags, const Word16 *curve, Word16 peak) {
   const DoubleWord at = L_Extract(flags, L_mult(flags, peak, 63));
   const Word32 upper = L_mult(flags, at.lo, curve[at.hi + 1]);
   return L_mac(flags, upper, sub(flags, MAX_16, at.lo), curve[at.hi]);
 }
 
 /// Moves the envelope towards the target sample by sample, and applies it.
-void follow(PlainFlags &flags, DrcInstance &drc, Word32 target, Word16 *frame) {
+void follow(Flags &flags, DrcInstance &drc, Word32 target, Word16 *frame) {
   Word32 envelope = drc.gainEnvelope;
   for (Word16 *sample = frame; sample != frame + drc.frameLength; ++sample) {
     const Word32 difference = L_sub(flags, target, envelope);
@@ -77,7 +77,7 @@ DrcInstance *initRecDynamicsControlParameter(Word32 samplingRate, Word16 frameLe
 
 Word32 process_drc(DrcInstance *drc, Word16 *pcm, Word32 count) {
   if (drc == nullptr) return -1;
-  PublishedFlags<PlainFlags> flags;
+  PublishedFlags<PlainCopy> flags;
   const Word32 length = frame_length(drc->samplingRate);
   bool loud = false;
   for (Word32 rest = count; rest > 0; rest -= length, pcm += length)
@@ -85,7 +85,7 @@ Word32 process_drc(DrcInstance *drc, Word16 *pcm, Word32 count) {
   return loud;
 }
 
-Word32 EnvBasedDynamicsControl(PlainFlags &flags, DrcInstance *drc, Word16 *frame) {
+Word32 EnvBasedDynamicsControl(Flags &flags, DrcInstance *drc, Word16 *frame) {
   if (drc == nullptr || drc->samplingRate != kRate) return -1;
   if (drc->firstCallLogged == 0) {
     log_line(kLogDebug, kLogTag, "TQE: with doDRC ... samplingRate = %d", drc->samplingRate);

@@ -38,7 +38,7 @@ Word32 process_drc(DrcInstance *drc, Word16 *pcm, Word32 count);
 /// Levels one frame of frameLength samples. 1 if more than 100 of the last ten frames' samples, the
 /// newest frame counted twice, exceed 8192; else 0. -1, with nothing done, for a null instance or a
 /// rate other than 16000.
-Word32 EnvBasedDynamicsControl(PlainFlags &flags, DrcInstance *drc, Word16 *frame);
+Word32 EnvBasedDynamicsControl(Flags &flags, DrcInstance *drc, Word16 *frame);
 
 /// Largest magnitude, 0 for a count below 1; counts the samples whose magnitude exceeds 8192.
 Word16 DetectPeakVal(const Word16 *samples, Word16 count, Word16 *loud);

@@ -72,7 +72,7 @@ void note_hangover(EpdInstance &epd, Word32 answer) {
 /// Judges one scaled frame and returns KEPD's answer. The decision hears the suppressed frame, the
 /// noise floor and the dump the unsuppressed one.
 Word32 answer_frame(EpdInstance *epd, Word16 *frame, bool suppresses, Word32 contentType,
-                    PlainFlags &flags, NsFlags &ns_flags) {
+                    Flags &flags, Flags &ns_flags) {
   const Word32 length = frame_length(*epd);
   Word16 unsuppressed[kMostFrameSamples];
   std::copy_n(frame, length, unsuppressed);
@@ -122,8 +122,8 @@ Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Wor
   if (epd == nullptr) return -1;
   log_format(*epd, numSample);
   const DumpFilesPresent dump_files(dumps(*epd), epd, kInputSuffix, kResultSuffix);
-  PublishedFlags<PlainFlags> flags;
-  PublishedFlags<NsFlags> ns_flags;
+  PublishedFlags<PlainCopy> flags;
+  PublishedFlags<NsCopy> ns_flags;
 
   const Word32 length = frame_length(*epd);
   Word32 running = epd->processedSamples;

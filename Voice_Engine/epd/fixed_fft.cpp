@@ -3,8 +3,8 @@
 #include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 using orvalis::Direction;
-using orvalis::NsFlags;
-using orvalis::PlainFlags;
+using orvalis::NsCopy;
+using orvalis::PlainCopy;
 using orvalis::PublishedFlags;
 
 namespace {
@@ -18,22 +18,22 @@ constexpr Direction direction_of(int16_t isign) {
 extern "C" {
 
 ORVALIS_EXPORT void c_fft_epd(int16_t *buffer, int16_t isign, int32_t band) {
-  PublishedFlags<PlainFlags> flags;
+  PublishedFlags<PlainCopy> flags;
   orvalis::complex_fft(*flags, buffer, direction_of(isign), orvalis::epd_transform_plan(band));
 }
 
 ORVALIS_EXPORT void r_fft_epd(int16_t *buffer, int16_t isign, int32_t band) {
-  PublishedFlags<PlainFlags> flags;
+  PublishedFlags<PlainCopy> flags;
   orvalis::real_fft(*flags, buffer, direction_of(isign), orvalis::epd_transform_plan(band));
 }
 
 ORVALIS_EXPORT void c_fft_ns(int16_t *buffer, int16_t isign) {
-  PublishedFlags<NsFlags> flags;
+  PublishedFlags<NsCopy> flags;
   orvalis::complex_fft(*flags, buffer, direction_of(isign), orvalis::ns_transform_plan());
 }
 
 ORVALIS_EXPORT void r_fft_ns(int16_t *buffer, int16_t isign) {
-  PublishedFlags<NsFlags> flags;
+  PublishedFlags<NsCopy> flags;
   orvalis::real_fft(*flags, buffer, direction_of(isign), orvalis::ns_transform_plan());
 }
 

@@ -119,7 +119,7 @@ Word32 InitNoiseEstimation(EpdInstance **handle) {
   return 0;
 }
 
-Word32 KEPDfunc(PlainFlags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type) {
+Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type) {
   if (*handle == nullptr) return -1;
   EpdInstance &epd = **handle;
   KepdState &kepd = epd.kepd;

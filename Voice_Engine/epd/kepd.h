@@ -47,7 +47,7 @@ Word32 InitNoiseEstimation(EpdInstance **handle);
 
 /// Answers one frame of the instance's length. Types from 2 on have the short timing. Returns -1
 /// for a null record.
-Word32 KEPDfunc(PlainFlags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type);
+Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type);
 
 /// Tracks the noise floor with the unsuppressed frame. The answer is not used. Returns 0.
 Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 answer);

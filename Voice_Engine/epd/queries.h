@@ -19,6 +19,6 @@ Word32 largest_energy_db(const Word16 *x, Word32 n, Word32 rate_hz);
 
 /// Power spectrum 2 re^2 + 2 im^2 of one frame of sample pairs. Flag 0 takes 160 samples to 128
 /// bins, any other 80 samples to 64. Returns 1.
-Word32 getFrameSpectrum(PlainFlags &flags, const Word16 *x, Word32 *out, Word32 flag);
+Word32 getFrameSpectrum(Flags &flags, const Word16 *x, Word32 *out, Word32 flag);
 
 }  // namespace orvalis

@@ -60,7 +60,7 @@ void VelmoraVADInit(VelmoraVadState **state, Word32 band) {
   vad.first_frame = 1;
 }
 
-Word32 VelmoraVAD(PlainFlags &flags, VelmoraVadState **state, const Word16 *frame, Word32 band) {
+Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Word32 band) {
   VelmoraVadState &vad = **state;
   const ChannelPlan &plan = plan_of(band);
   if (vad.vad_frame_cnt != MAX_16) vad.vad_frame_cnt += 1;
@@ -89,7 +89,7 @@ Word32 VelmoraVAD(PlainFlags &flags, VelmoraVadState **state, const Word16 *fram
   return vad.vad_flag;
 }
 
-Word32 processVelmoraVAD(PlainFlags &flags, VelmoraVadState **state, const Word16 *frame,
+Word32 processVelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame,
                          const float *score, Word32 band) {
   VelmoraVadState &vad = **state;
   if (VelmoraVAD(flags, state, frame, band) == 0) return 0;

@@ -38,10 +38,10 @@ struct VelmoraVadState {
 void VelmoraVADInit(VelmoraVadState **state, Word32 band);
 
 /// Judges one frame of 160 (band 0) or 80 samples: 1 for voice, else 0.
-Word32 VelmoraVAD(PlainFlags &flags, VelmoraVadState **state, const Word16 *frame, Word32 band);
+Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Word32 band);
 
 /// The same behind the energy gate, whose threshold is the speech level raised to `score`.
-Word32 processVelmoraVAD(PlainFlags &flags, VelmoraVadState **state, const Word16 *frame,
+Word32 processVelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame,
                          const float *score, Word32 band);
 
 }  // namespace orvalis

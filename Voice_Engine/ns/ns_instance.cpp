@@ -52,7 +52,7 @@ void initialise_suppressor(NsInstance *ns, S2chnsState &pair, Word16 suppressor_
 }
 
 /// Suppresses one frame; false if the instance suppresses nothing.
-bool suppress(NsInstance *ns, S2chnsState &pair, Word16 *in, Word16 *out, NsFlags &flags) {
+bool suppress(NsInstance *ns, S2chnsState &pair, Word16 *in, Word16 *out, Flags &flags) {
   if (ns->micCount == 1) {
     s1chns_C(flags, &ns->suppressor, in, out);
   } else if (ns->micCount == 2) {
@@ -101,7 +101,7 @@ Word32 DO_NS_Proc_Frame(NsInstance *ns, S2chnsState &pair, Word16 *in, Word32 nu
   if (ns->processedSamples == 0)
     log_line(kLogDebug, kLogTag, "TQE: with DoNS ... numInSample = %d ", numIn);
   const DumpFilesPresent dump_files(dumps(*ns), ns, kInputSuffix, kResultSuffix);
-  PublishedFlags<NsFlags> flags;
+  PublishedFlags<NsCopy> flags;
 
   const Word32 most_small_samples = 3 * length / 4;
   Word32 small_samples = 0;  // adds up over the frames of a call

@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "Voice_Engine/basic_op/block_scaling.h"
+#include "Voice_Engine/basic_op/log_exp.h"
 #include "Voice_Engine/channel/channel_plans.h"
 #include "Voice_Engine/channel/fixed_fft_kernel.h"
 
@@ -31,7 +32,7 @@ void calm_channels(Word16 *snr, Word16 voice_metric) {
 }
 
 /// Gain of a channel in Q15 from its SNR index and the overall gain in dB, Q21.
-Word16 channel_gain(NsFlags &flags, Word16 snr, Word32 base_q21, Word16 slope_q15) {
+Word16 channel_gain(Flags &flags, Word16 snr, Word32 base_q21, Word16 slope_q15) {
   constexpr Word16 kLeastSnr = 6;
   constexpr Word16 kGainPerStep = 14879;  // 0.454 dB, in Q21 after L_mult and L_shl
   const Word16 steps = sub(flags, std::max(snr, kLeastSnr), kLeastSnr);
@@ -43,7 +44,7 @@ Word16 channel_gain(NsFlags &flags, Word16 snr, Word32 base_q21, Word16 slope_q1
 }
 
 /// Sets the gains of all bins.
-void set_gains(NsFlags &flags, S1chnsState &ns, ChannelFindings &found) {
+void set_gains(Flags &flags, S1chnsState &ns, ChannelFindings &found) {
   const Word32 noise = sum_energies(flags, ns.ch_noise, kSuppressionChannels);
   const Word32 noise_level = L_negate(log10_energy(flags, noise));
   const Word32 base_q21 = std::max(L_mpy_ls(flags, noise_level, kDecibels), ns.min_gain_q21);
@@ -56,20 +57,20 @@ void set_gains(NsFlags &flags, S1chnsState &ns, ChannelFindings &found) {
 }
 
 /// Brings a spectrum that is scaled by 2^shift back to samples.
-void synthesise(NsFlags &flags, Word16 *buffer, Word16 shift) {
+void synthesise(Flags &flags, Word16 *buffer, Word16 shift) {
   const Word16 spectrum_shift =
       block_norm_AL(flags, buffer, kMostTransformSize, kSynthesisHeadroom);
   real_fft(flags, buffer, Direction::kInverse, ns_transform_plan());
   block_denorm_AL(flags, buffer, kMostTransformSize, add(flags, shift, spectrum_shift));
 }
 
-void overlap_add(NsFlags &flags, Word16 *buffer, Word16 *tail) {
+void overlap_add(Flags &flags, Word16 *buffer, Word16 *tail) {
   for (int i = 0; i < kSynthesisOverlap; ++i) buffer[i] = add(flags, buffer[i], tail[i]);
   std::copy_n(&buffer[kFrame], kSynthesisOverlap, tail);
 }
 
 /// Undoes the pre-emphasis. The first product truncates, the others round.
-void de_emphasise(NsFlags &flags, const Word16 *x, Word16 &memory, Word16 *in, Word16 *out) {
+void de_emphasise(Flags &flags, const Word16 *x, Word16 &memory, Word16 *in, Word16 *out) {
   Word16 feedback = mult(flags, kDeEmphasis, memory);
   for (int i = 0; i < kFrame; ++i) {
     if (i > 0) feedback = mult_r(flags, kDeEmphasis, memory);
@@ -103,7 +104,7 @@ Word32 S1CHNSInit(S1chnsState *state, Word16 mode) {
   return 0;
 }
 
-void s1chns_C(NsFlags &flags, S1chnsState *state, Word16 *in, Word16 *out) {
+void s1chns_C(Flags &flags, S1chnsState *state, Word16 *in, Word16 *out) {
   S1chnsState &ns = *state;
   const ChannelPlan &plan = kSuppression;
   if (ns.frame_cnt != MAX_16) ns.frame_cnt += 1;

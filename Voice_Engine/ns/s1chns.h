@@ -38,6 +38,6 @@ Word32 S1CHNSInit(S1chnsState *state, Word16 mode);
 
 /// Suppresses the noise of exactly 160 samples. `in` is overwritten with the output too, and may be
 /// the same buffer as `out`.
-void s1chns_C(NsFlags &flags, S1chnsState *state, Word16 *in, Word16 *out);
+void s1chns_C(Flags &flags, S1chnsState *state, Word16 *in, Word16 *out);
 
 }  // namespace orvalis

@@ -40,7 +40,7 @@ struct Channels {
   Word32 frame_cnt = 1000;
 
   bool decide(const Limits &limits, int metric, Word32 total, int deviation) {
-    PlainFlags flags;
+    Flags flags;
     ChannelState state = view();
     ChannelFindings found{};
     found.voice_metric = static_cast<Word16>(metric);
@@ -123,7 +123,7 @@ TEST_P(ChannelDecision, NoiseIsSeededInTheFirstFrames) {
 }
 
 TEST_P(ChannelDecision, ShareOfThePastFollowsItsCurve) {
-  PlainFlags flags;
+  Flags flags;
   std::set<int> seen;
   for (double total = 300; total < MAX_32; total *= 1.002) {
     const auto energy = static_cast<Word32>(total);

@@ -32,7 +32,7 @@ private:
 };
 
 /// A user of the channel analysis: its plans and what its state record calls by a name of its own.
-template <class State, class FlagSet>
+template <class State>
 struct Subject {
   const ChannelPlan &plan;
   const ModelPlan &model;
@@ -61,7 +61,7 @@ struct Subject {
 
   /// What the engine's analysis finds in a frame. `s` becomes the state before the noise update.
   ChannelFindings findings(State &s, const Word16 *frame) const {
-    FlagSet flags;
+    Flags flags;
     Word16 samples[kMostFrameSamples] = {}, buffer[kMostTransformSize];
     std::copy_n(frame, plan.frame_samples, samples);
     const Word16 shift = block_norm_AL(flags, samples, plan.frame_samples, 2);

@@ -217,8 +217,8 @@ struct DriverModel {
   EpdInstance record{};
   EpdInstance *handle = &record;
   const int length;
-  PlainFlags flags;
-  NsFlags ns_flags;
+  Flags flags;
+  Flags ns_flags;
   LogLines lines;
   Pcm dumped_input, dumped_answers;
 };

@@ -38,7 +38,7 @@ public:
   /// Judges a frame with the voice decision as it stands.
   Word32 judge(std::uint32_t type = 0) {
     static constexpr Word16 kFrame[160] = {};
-    PlainFlags flags;
+    Flags flags;
     return KEPDfunc(flags, &handle_, kFrame, type);
   }
 
@@ -159,7 +159,7 @@ TEST_F(KepdTest, FollowsTheAutomaton) {
 
 TEST_F(KepdTest, TellsANullRecord) {
   EpdInstance *none = nullptr;
-  PlainFlags flags;
+  Flags flags;
   EXPECT_EQ(InitKEPD(&none), -1);
   EXPECT_EQ(KEPDfunc(flags, &none, nullptr, 0), -1);
 }

@@ -14,7 +14,7 @@
 namespace orvalis::test {
 namespace {
 
-using DetectorSubject = Subject<VelmoraVadState, PlainFlags>;
+using DetectorSubject = Subject<VelmoraVadState>;
 
 DetectorSubject subject(Word32 band) {
   return {.plan = band == 0 ? kWideBandDetection : kNarrowBandDetection,
@@ -43,7 +43,7 @@ public:
   VelmoraVadState state;
 
 private:
-  PlainFlags flags_;
+  Flags flags_;
   VelmoraVadState *pointer_ = &state;
   Word32 band_;
 };

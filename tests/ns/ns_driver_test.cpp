@@ -114,7 +114,7 @@ struct Model {
   const int length;
   S2chnsState &both;  ///< of all instances with two microphones
   S1chnsState single{};
-  NsFlags flags;
+  Flags flags;
   Word32 heard = 0;
   int calm = 0;
   LogLines lines;

@@ -37,12 +37,12 @@ public:
   }
 
   S1chnsState state;
-  NsFlags flags;
+  Flags flags;
 };
 
 std::vector<Word16> speech() { return with_level_jumps(speech_16k("numbers.raw"), 8000); }
 
-Subject<S1chnsState, NsFlags> subject() {
+Subject<S1chnsState> subject() {
   return {.plan = kSuppression,
           .model = kSuppressorModel,
           .transform = ns_transform_plan(),

@@ -26,15 +26,12 @@ public:
 };
 
 #define ORVALIS_DETECTOR(prefix) \
-  prefix##_ZN7orvalis17processVelmoraVADERNS_10PlainFlagsEPPNS_15VelmoraVadStateEPKsPKfi
+  prefix##_ZN7orvalis17processVelmoraVADERNS_5FlagsEPPNS_15VelmoraVadStateEPKsPKfi
 
-extern "C" Word32 ORVALIS_DETECTOR(__real_)(PlainFlags &, VelmoraVadState **, const Word16 *,
+extern "C" Word32 ORVALIS_DETECTOR(__real_)(Flags &, VelmoraVadState **, const Word16 *,
                                             const float *, Word32);
-extern "C" __attribute__((used)) inline Word32 ORVALIS_DETECTOR(__wrap_)(PlainFlags &flags,
-                                                                         VelmoraVadState **state,
-                                                                         const Word16 *frame,
-                                                                         const float *score,
-                                                                         Word32 band) {
+extern "C" __attribute__((used)) inline Word32 ORVALIS_DETECTOR(__wrap_)(
+    Flags &flags, VelmoraVadState **state, const Word16 *frame, const float *score, Word32 band) {
   ScriptedVoice *script = ScriptedVoice::current;
   if (script == nullptr) return ORVALIS_DETECTOR(__real_)(flags, state, frame, score, band);
   script->heard_frame.assign(frame, frame + (band == 0 ? 160 : 80));
