@@ -1,5 +1,8 @@
 #include "Voice_Engine/channel/channel_analysis.h"
 
+#include <algorithm>
+
+#include "Voice_Engine/basic_op/block_scaling.h"
 #include "Voice_Engine/basic_op/log_exp.h"
 #include "Voice_Engine/basic_op/operators.h"
 
@@ -12,6 +15,45 @@ constexpr Word16 vm_tbl[90] = {
     6,  7,  7,  7,  8,  8,  9,  9,  10, 10, 11, 12, 12, 13, 13, 14, 15, 15, 16, 17, 17, 18, 19,
     20, 20, 21, 22, 23, 24, 24, 25, 26, 27, 28, 28, 29, 30, 31, 32, 33, 34, 35, 36, 37, 37, 38,
     39, 40, 41, 42, 43, 44, 45, 46, 47, 48, 49, 50, 50, 50, 50, 50, 50, 50, 50, 50, 50};
+
+/// Lays out the transform buffer: the previous frame's overlap and this frame, pre-emphasised by
+/// 0.8, zeros behind. Overlap and memory are brought to the scale of the normalised frame. Returns
+/// the shift that normalises it.
+inline Word16 assemble_frame(Flags &flags, const ChannelPlan &plan, ChannelState &state,
+                             const Word16 *frame, Word16 *buffer) {
+  constexpr Word16 kHeadroom = 2;
+  constexpr Word16 kMinusPreEmphasis = -26214;  // -0.8 in Q15
+  Word16 *const x = buffer + plan.overlap;
+  Word16 *const end = std::copy_n(frame, plan.frame_samples, x);
+  std::fill(end, buffer + plan.transform->size, Word16{0});
+  const Word16 shift = block_norm_AL(flags, x, plan.frame_samples, kHeadroom);
+
+  const Word16 rescale = sub(flags, shift, state.prev_shift);
+  for (int i = 0; i < plan.overlap; ++i) buffer[i] = shift_r(flags, state.overlap[i], rescale);
+  Word16 previous = shift_r(flags, state.pre_emp_mem, rescale);
+  for (Word16 *sample = x; sample != end; ++sample) {
+    const Word16 emphasised = add(flags, *sample, mult(flags, kMinusPreEmphasis, previous));
+    previous = *sample;
+    *sample = emphasised;
+  }
+  std::copy_n(buffer + plan.frame_samples, plan.overlap, state.overlap);
+  state.pre_emp_mem = previous;
+  state.prev_shift = shift;
+  return shift;
+}
+
+inline void apply_window(Flags &flags, const ChannelPlan &plan, Word16 *buffer) {
+  constexpr Word32 kOne_q15 = 32768;
+  Word16 *last = buffer + plan.overlap + plan.frame_samples - 1;
+  for (int i = 0; i < plan.overlap; ++i) {
+    buffer[i] = mult_r(flags, buffer[i], plan.window_edge[i]);
+    last[-i] = mult_r(flags, last[-i], plan.window_edge[i]);
+  }
+  if (plan.window_flat_q15 == kOne_q15) return;
+  const auto flat = static_cast<Word16>(plan.window_flat_q15);
+  for (int i = plan.overlap; i < plan.frame_samples; ++i)
+    buffer[i] = mult_r(flags, buffer[i], flat);
+}
 
 /// A Q15 factor times an energy, at the full precision of the energy's high half.
 inline Word32 scaled_energy(Flags &flags, Word32 energy, Word16 factor_q15) {
@@ -88,33 +130,40 @@ inline Word16 voice_metric(Flags &flags, const Word16 *snr, int channels) {
   return metric;
 }
 
+inline ChannelFindings analyse_spectrum(Flags &flags, const ChannelPlan &plan, ChannelState &state,
+                                        const Word16 *spectrum, Word16 shift) {
+  ChannelFindings found;
+  found.shift = shift;
+  found.unclamped_energy = track_energies(flags, plan, state, spectrum, shift);
+  seed_noise(plan, state);
+  for (int i = 0; i < plan.channels; ++i) {
+    found.snr[i] = snr_index(flags, state.energy[i], state.noise[i]);
+  }
+  found.voice_metric = voice_metric(flags, found.snr, plan.channels);
+  found.total_energy = sum_energies(flags, state.energy, plan.channels);
+
+  Word16 level[kMostChannels];
+  for (int i = 0; i < plan.channels; ++i) level[i] = level_q5(flags, state.energy[i]);
+  if (state.first_frame) {
+    for (int i = 0; i < plan.channels; ++i) state.long_term_q5[i] = level[i];
+  }
+  found.deviation_q5 = 0;
+  for (int i = 0; i < plan.channels; ++i) {
+    const Word16 distance = abs_s(sub(flags, state.long_term_q5[i], level[i]));
+    found.deviation_q5 = add(flags, found.deviation_q5, distance);
+  }
+
+  const Word16 share = long_term_share(flags, plan, found.total_energy);
+  const auto rest = static_cast<Word16>(MAX_16 - share);
+  for (int i = 0; i < plan.channels; ++i) {
+    const Word32 past = L_mult(flags, share, state.long_term_q5[i]);
+    state.long_term_q5[i] = extract_h(L_add(flags, L_mult(flags, rest, level[i]), past));
+  }
+  found.is_noise = decide_noise(flags, plan, state, found);
+  return found;
+}
+
 }  // namespace
-
-void assemble_frame(Flags &flags, const ChannelPlan &plan, const Word16 *x, Word16 shift,
-                    Word16 &prev_shift, Word16 &pre_emp_mem, Word16 *overlap, Word16 *buffer) {
-  constexpr Word16 kMinusPreEmphasis = -26214;  // -0.8 in Q15
-  const Word16 rescale = sub(flags, shift, prev_shift);
-  for (int i = 0; i < plan.overlap; ++i) buffer[i] = shift_r(flags, overlap[i], rescale);
-  Word16 previous = shift_r(flags, pre_emp_mem, rescale);
-  prev_shift = shift;
-  Word16 *out = buffer + plan.overlap;
-  for (int i = 0; i < plan.frame_samples; ++i) {
-    out[i] = add(flags, x[i], mult(flags, kMinusPreEmphasis, previous));
-    previous = x[i];
-  }
-  pre_emp_mem = previous;
-  const int used = plan.overlap + plan.frame_samples;
-  for (int i = used; i < plan.transform_size; ++i) buffer[i] = 0;
-  for (int i = 0; i < plan.overlap; ++i) overlap[i] = buffer[plan.frame_samples + i];
-}
-
-void window_edges(Flags &flags, const ChannelPlan &plan, Word16 *buffer) {
-  Word16 *last = buffer + plan.overlap + plan.frame_samples - 1;
-  for (int i = 0; i < plan.overlap; ++i) {
-    buffer[i] = mult_r(flags, buffer[i], plan.window_edge[i]);
-    last[-i] = mult_r(flags, last[-i], plan.window_edge[i]);
-  }
-}
 
 Word32 log10_energy(Flags &flags, Word32 energy) {
   constexpr Word32 kLog10Of2To23 = 464640964;  // Q26
@@ -171,36 +220,12 @@ bool decide_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state,
   return is_noise;
 }
 
-ChannelFindings analyse_channels(Flags &flags, const ChannelPlan &plan, ChannelState &state,
-                                 const Word16 *spectrum, Word16 shift) {
-  ChannelFindings found;
-  found.unclamped_energy = track_energies(flags, plan, state, spectrum, shift);
-  seed_noise(plan, state);
-  for (int i = 0; i < plan.channels; ++i) {
-    found.snr[i] = snr_index(flags, state.energy[i], state.noise[i]);
-  }
-  found.voice_metric = voice_metric(flags, found.snr, plan.channels);
-  found.total_energy = sum_energies(flags, state.energy, plan.channels);
-
-  Word16 level[kMostChannels];
-  for (int i = 0; i < plan.channels; ++i) level[i] = level_q5(flags, state.energy[i]);
-  if (state.first_frame) {
-    for (int i = 0; i < plan.channels; ++i) state.long_term_q5[i] = level[i];
-  }
-  found.deviation_q5 = 0;
-  for (int i = 0; i < plan.channels; ++i) {
-    const Word16 distance = abs_s(sub(flags, state.long_term_q5[i], level[i]));
-    found.deviation_q5 = add(flags, found.deviation_q5, distance);
-  }
-
-  const Word16 share = long_term_share(flags, plan, found.total_energy);
-  const auto rest = static_cast<Word16>(MAX_16 - share);
-  for (int i = 0; i < plan.channels; ++i) {
-    const Word32 past = L_mult(flags, share, state.long_term_q5[i]);
-    state.long_term_q5[i] = extract_h(L_add(flags, L_mult(flags, rest, level[i]), past));
-  }
-  found.is_noise = decide_noise(flags, plan, state, found);
-  return found;
+ChannelFindings analyse_frame(Flags &flags, const ChannelPlan &plan, ChannelState &state,
+                              const Word16 *frame, Word16 *spectrum) {
+  const Word16 shift = assemble_frame(flags, plan, state, frame, spectrum);
+  apply_window(flags, plan, spectrum);
+  real_fft(flags, spectrum, Direction::kForward, *plan.transform);
+  return analyse_spectrum(flags, plan, state, spectrum, shift);
 }
 
 void track_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state) {

@@ -10,6 +10,7 @@
 #pragma once
 
 #include "Voice_Engine/basic_op/flags.h"
+#include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 namespace orvalis {
 
@@ -34,11 +35,12 @@ struct ChannelScale {
 struct ChannelPlan {
   int channels;
   int frame_samples;
-  int overlap;         ///< samples of the previous frame that open the next one
-  int transform_size;  ///< 16-bit values in the transform buffer
+  int overlap;  ///< samples of the previous frame that open the next one
   const ChannelBins *bins;
   const ChannelScale *scales;
   const Word16 *window_edge;  ///< rising edge in Q15, `overlap` values
+  Word32 window_flat_q15;     ///< between the edges; 32768 is 1
+  const TransformPlan *transform;
   Word32 energy_floor;
   int seeding_frames;      ///< first frames in which the noise follows the signal
   bool scale_then_smooth;  ///< undo the block shift before, not after, the product with 0.55
@@ -54,6 +56,9 @@ struct ChannelState {
   Word32 *energy;
   Word32 *noise;
   Word16 *long_term_q5;
+  Word16 *overlap;
+  Word16 &pre_emp_mem;
+  Word16 &prev_shift;
   Word16 &update_cnt;
   Word16 &hyster_cnt;
   Word16 &last_update_cnt;
@@ -61,12 +66,15 @@ struct ChannelState {
   bool first_frame;
 };
 
-/// The analysed part of a state record whose fields have the names of the channel analysis.
+/// The analysed part of a state record whose other fields have the names of the channel analysis.
 template <class Record>
-inline ChannelState channels_of(Record &record, Word32 frame_cnt) {
+inline ChannelState channels_of(Record &record, Word16 *overlap, Word32 frame_cnt) {
   return {.energy = record.ch_enrg,
           .noise = record.ch_noise,
           .long_term_q5 = record.ch_enrg_long_db,
+          .overlap = overlap,
+          .pre_emp_mem = record.pre_emp_mem,
+          .prev_shift = record.prev_shift,
           .update_cnt = record.update_cnt,
           .hyster_cnt = record.hyster_cnt,
           .last_update_cnt = record.last_update_cnt,
@@ -76,6 +84,7 @@ inline ChannelState channels_of(Record &record, Word32 frame_cnt) {
 
 /// What one frame's analysis found.
 struct ChannelFindings {
+  Word16 shift;               ///< left shift that normalised the frame
   Word16 snr[kMostChannels];  ///< channel SNR in steps of 3/8 dB, from 0
   Word16 voice_metric;
   Word16 deviation_q5;
@@ -84,19 +93,10 @@ struct ChannelFindings {
   bool is_noise;            ///< the noise may be learnt from this frame
 };
 
-// --- The frame ---------------------------------------------------------------------------------
+// --- Levels --------------------------------------------------------------------------------------
 
-/// Lays out the transform buffer: the previous frame's overlap and this frame, pre-emphasised by
-/// 0.8, zeros behind. `x` is normalised by `shift`; overlap and memory are brought to that scale.
-void assemble_frame(Flags &flags, const ChannelPlan &plan, const Word16 *x, Word16 shift,
-                    Word16 &prev_shift, Word16 &pre_emp_mem, Word16 *overlap, Word16 *buffer);
-
-/// Weights both ends of the assembled frame by the window's edge.
-void window_edges(Flags &flags, const ChannelPlan &plan, Word16 *buffer);
-
-// --- Its levels ----------------------------------------------------------------------------------
-
-/// 10 in the scale that turns a log10 in Q26 into dB in Q21, and its high half into Q5.
+/// 10 log10 as IS-127 has it, 10.03 in Q10: turns a log10 in Q26 into dB in Q21, and its high half
+/// into Q5.
 inline constexpr Word16 kDecibels = 10270;
 
 /// log10(energy / 256) in Q26.
@@ -120,10 +120,11 @@ Word16 long_term_share(Flags &flags, const ChannelPlan &plan, Word32 total);
 bool decide_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state,
                   const ChannelFindings &found);
 
-/// Analyses the spectrum of a frame that was normalised by `shift`: updates energies, long-term
-/// levels and counters, and, in the first frames, the noise.
-ChannelFindings analyse_channels(Flags &flags, const ChannelPlan &plan, ChannelState &state,
-                                 const Word16 *spectrum, Word16 shift);
+/// Analyses a frame of plan.frame_samples: normalises it, puts the previous frame's overlap before
+/// it, pre-emphasises, windows and transforms it to a `spectrum` of plan.transform->size values.
+/// Updates energies, long-term levels and counters and, in the first frames, the noise.
+ChannelFindings analyse_frame(Flags &flags, const ChannelPlan &plan, ChannelState &state,
+                              const Word16 *frame, Word16 *spectrum);
 
 /// Learns the noise from a frame: 0.9 of the past and 0.1 of the present.
 void track_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state);

@@ -52,7 +52,8 @@ constexpr std::array<Word16, kLength> make_window_edge(double full_scale) {
   return edge;
 }
 
-// Only the wide-band detector's edge is made from 32768.
+// Only the wide-band detector's edge is made from 32768. Between its edges a detector's window is
+// 32767, not 1, which takes one unit off samples beyond half scale.
 constexpr auto window_vad_WB = make_window_edge<48>(32768);
 constexpr auto window_vad_NB = make_window_edge<24>(32767);
 constexpr auto window = make_window_edge<48>(32767);
@@ -63,10 +64,11 @@ constinit const ChannelPlan kWideBandDetection = {
     .channels = 21,
     .frame_samples = 160,
     .overlap = 48,
-    .transform_size = 256,
     .bins = ch_tbl_vad_WB,
     .scales = ch_tbl_sh_vad_WB,
     .window_edge = window_vad_WB.data(),
+    .window_flat_q15 = 32767,
+    .transform = &kWideTransform,
     .energy_floor = 12,
     .seeding_frames = 10,
     .scale_then_smooth = false,
@@ -81,10 +83,11 @@ constinit const ChannelPlan kNarrowBandDetection = {
     .channels = 16,
     .frame_samples = 80,
     .overlap = 24,
-    .transform_size = 128,
     .bins = ch_tbl_vad_NB,
     .scales = ch_tbl_sh_vad_NB,
     .window_edge = window_vad_NB.data(),
+    .window_flat_q15 = 32767,
+    .transform = &kNarrowTransform,
     .energy_floor = 16,
     .seeding_frames = 10,
     .scale_then_smooth = false,
@@ -99,10 +102,11 @@ constinit const ChannelPlan kSuppression = {
     .channels = 20,
     .frame_samples = 160,
     .overlap = 48,
-    .transform_size = 256,
     .bins = ch_tbl,
     .scales = ch_tbl_sh,
     .window_edge = window.data(),
+    .window_flat_q15 = 32768,
+    .transform = &kSuppressionTransform,
     .energy_floor = 16,
     .seeding_frames = 4,
     .scale_then_smooth = true,

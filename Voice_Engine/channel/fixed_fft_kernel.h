@@ -15,11 +15,14 @@ struct TransformPlan {
   const Word16 *steps;     ///< twiddle step of each stage
 };
 
-/// The plan of the detector's family: band 0 is 256 values, any other 128.
-TransformPlan epd_transform_plan(Word32 band);
+extern const TransformPlan kWideTransform;         ///< of the detector: 256 values
+extern const TransformPlan kNarrowTransform;       ///< of the detector: 128 values
+extern const TransformPlan kSuppressionTransform;  ///< of the suppressor: 256 values
 
-/// The plan of the suppressor's family: 256 values.
-TransformPlan ns_transform_plan();
+/// The detector's plan: band 0 is wide, any other narrow.
+inline const TransformPlan &epd_transform_plan(Word32 band) {
+  return band == 0 ? kWideTransform : kNarrowTransform;
+}
 
 /// In-place complex transform of plan.size / 2 points.
 void complex_fft(Flags &flags, Word16 *x, Direction direction, const TransformPlan &plan);

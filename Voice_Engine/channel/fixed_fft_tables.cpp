@@ -68,13 +68,11 @@ ORVALIS_EXPORT_TABLE(BandPointers, ii_table);
 
 namespace orvalis {
 
-TransformPlan epd_transform_plan(Word32 band) {
-  const bool narrow = band != 0;
-  return {narrow ? 128 : 256, narrow ? 6 : 7, orvalis_phs_tbl[narrow], orvalis_ii_table[narrow]};
-}
-
-TransformPlan ns_transform_plan() {
-  return {256, 7, orvalis_phs_tbl_256.data(), orvalis_ii_table_256.data()};
-}
+constinit const TransformPlan kWideTransform = {256, 7, orvalis_phs_tbl_WB.data(),
+                                                orvalis_ii_table_WB.data()};
+constinit const TransformPlan kNarrowTransform = {128, 6, orvalis_phs_tbl_NB.data(),
+                                                  orvalis_ii_table_NB.data()};
+constinit const TransformPlan kSuppressionTransform = {256, 7, orvalis_phs_tbl_256.data(),
+                                                       orvalis_ii_table_256.data()};
 
 }  // namespace orvalis

@@ -29,12 +29,12 @@ ORVALIS_EXPORT void r_fft_epd(int16_t *buffer, int16_t isign, int32_t band) {
 
 ORVALIS_EXPORT void c_fft_ns(int16_t *buffer, int16_t isign) {
   PublishedFlags<NsCopy> flags;
-  orvalis::complex_fft(*flags, buffer, direction_of(isign), orvalis::ns_transform_plan());
+  orvalis::complex_fft(*flags, buffer, direction_of(isign), orvalis::kSuppressionTransform);
 }
 
 ORVALIS_EXPORT void r_fft_ns(int16_t *buffer, int16_t isign) {
   PublishedFlags<NsCopy> flags;
-  orvalis::real_fft(*flags, buffer, direction_of(isign), orvalis::ns_transform_plan());
+  orvalis::real_fft(*flags, buffer, direction_of(isign), orvalis::kSuppressionTransform);
 }
 
 }  // extern "C"

@@ -34,7 +34,7 @@ Word32 largest_energy_db(const Word16 *x, Word32 n, Word32 rate_hz) {
 
 Word32 getFrameSpectrum(Flags &flags, const Word16 *x, Word32 *out, Word32 flag) {
   const Word32 band = flag == 0 ? 0 : 1;
-  const TransformPlan plan = epd_transform_plan(band);
+  const TransformPlan &plan = epd_transform_plan(band);
   const int samples = band == 0 ? 160 : 80;
   Word16 buffer[256];
   std::fill(std::copy_n(x, samples, buffer), buffer + plan.size, Word16{0});

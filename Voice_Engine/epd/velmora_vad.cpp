@@ -3,14 +3,11 @@
 #include <algorithm>
 #include <cmath>
 
-#include "Voice_Engine/basic_op/block_scaling.h"
 #include "Voice_Engine/channel/channel_plans.h"
-#include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 namespace orvalis {
 namespace {
 
-constexpr Word16 kHeadroom = 2;
 constexpr Word32 kLeastVoiceEnergy = 300000;
 constexpr Word32 kFramesPerBlock = 25;
 constexpr Word32 kMostBlocks = 6;
@@ -65,20 +62,9 @@ Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Wo
   const ChannelPlan &plan = plan_of(band);
   if (vad.vad_frame_cnt != MAX_16) vad.vad_frame_cnt += 1;
 
-  Word16 samples[kMostFrameSamples] = {};
-  std::copy_n(frame, plan.frame_samples, samples);
-  const Word16 shift = block_norm_AL(flags, samples, plan.frame_samples, kHeadroom);
-
-  Word16 buffer[kMostTransformSize];
-  assemble_frame(flags, plan, samples, shift, vad.prev_shift, vad.pre_emp_mem, vad.overlap, buffer);
-  window_edges(flags, plan, buffer);
-  // The flat part of this window is 32767, not 1: it takes one unit off samples beyond half scale.
-  for (int i = plan.overlap; i < plan.frame_samples; ++i)
-    buffer[i] = mult_r(flags, buffer[i], MAX_16);
-  real_fft(flags, buffer, Direction::kForward, epd_transform_plan(band));
-
-  ChannelState channels = channels_of(vad, vad.vad_frame_cnt);
-  const ChannelFindings found = analyse_channels(flags, plan, channels, buffer, shift);
+  ChannelState channels = channels_of(vad, vad.overlap, vad.vad_frame_cnt);
+  Word16 spectrum[kMostTransformSize];
+  const ChannelFindings found = analyse_frame(flags, plan, channels, frame, spectrum);
   vad.tot_enrg = found.unclamped_energy;
   if (vad.vad_frame_cnt <= plan.seeding_frames) {
     std::copy_n(vad.ch_enrg, plan.channels, vad.ch_enrg_init);

@@ -5,7 +5,6 @@
 #include "Voice_Engine/basic_op/block_scaling.h"
 #include "Voice_Engine/basic_op/log_exp.h"
 #include "Voice_Engine/channel/channel_plans.h"
-#include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 namespace orvalis {
 namespace {
@@ -13,7 +12,6 @@ namespace {
 constexpr int kFrame = 160;
 constexpr int kSynthesisOverlap = 96;
 constexpr int kBins = 128;
-constexpr Word16 kAnalysisHeadroom = 2;
 // Room for a spectrum whose parts add up; impulses may still saturate in the inverse transform.
 constexpr Word16 kSynthesisHeadroom = 4;
 constexpr Word16 kDeEmphasis = 26214;  // 0.8 in Q15
@@ -60,7 +58,7 @@ void set_gains(Flags &flags, S1chnsState &ns, ChannelFindings &found) {
 void synthesise(Flags &flags, Word16 *buffer, Word16 shift) {
   const Word16 spectrum_shift =
       block_norm_AL(flags, buffer, kMostTransformSize, kSynthesisHeadroom);
-  real_fft(flags, buffer, Direction::kInverse, ns_transform_plan());
+  real_fft(flags, buffer, Direction::kInverse, *kSuppression.transform);
   block_denorm_AL(flags, buffer, kMostTransformSize, add(flags, shift, spectrum_shift));
 }
 
@@ -109,15 +107,9 @@ void s1chns_C(Flags &flags, S1chnsState *state, Word16 *in, Word16 *out) {
   const ChannelPlan &plan = kSuppression;
   if (ns.frame_cnt != MAX_16) ns.frame_cnt += 1;
 
-  const Word16 shift = block_norm_AL(flags, in, kFrame, kAnalysisHeadroom);
+  ChannelState channels = channels_of(ns, ns.analysis_overlap, ns.frame_cnt);
   Word16 buffer[kMostTransformSize];
-  assemble_frame(flags, plan, in, shift, ns.prev_shift, ns.pre_emp_mem, ns.analysis_overlap,
-                 buffer);
-  window_edges(flags, plan, buffer);
-  real_fft(flags, buffer, Direction::kForward, ns_transform_plan());
-
-  ChannelState channels = channels_of(ns, ns.frame_cnt);
-  ChannelFindings found = analyse_channels(flags, plan, channels, buffer, shift);
+  ChannelFindings found = analyse_frame(flags, plan, channels, in, buffer);
   set_gains(flags, ns, found);
   if (found.is_noise) track_noise(flags, plan, channels);
 
@@ -125,7 +117,7 @@ void s1chns_C(Flags &flags, S1chnsState *state, Word16 *in, Word16 *out) {
     buffer[2 * k] = mult(flags, buffer[2 * k], ns.bin_gain_q15[k]);
     buffer[2 * k + 1] = mult(flags, buffer[2 * k + 1], ns.bin_gain_q15[k]);
   }
-  synthesise(flags, buffer, shift);
+  synthesise(flags, buffer, found.shift);
   overlap_add(flags, buffer, ns.synthesis_overlap);
   de_emphasise(flags, buffer, ns.de_emp_mem, in, out);
   ns.first_frame = 0;

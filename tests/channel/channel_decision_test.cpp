@@ -36,7 +36,7 @@ constexpr Limits kLimits[] = {
 struct Channels {
   Word32 energy[kMostChannels] = {}, noise[kMostChannels] = {};
   Word16 long_term_q5[kMostChannels] = {};
-  Word16 update_cnt = 30, hyster_cnt = 0, last_update_cnt = 30;
+  Word16 update_cnt = 30, hyster_cnt = 0, last_update_cnt = 30, unused = 0;
   Word32 frame_cnt = 1000;
 
   bool decide(const Limits &limits, int metric, Word32 total, int deviation) {
@@ -49,7 +49,17 @@ struct Channels {
     return decide_noise(flags, *limits.plan, state, found);
   }
   ChannelState view() {
-    return {energy, noise, long_term_q5, update_cnt, hyster_cnt, last_update_cnt, frame_cnt, false};
+    return {.energy = energy,
+            .noise = noise,
+            .long_term_q5 = long_term_q5,
+            .overlap = nullptr,
+            .pre_emp_mem = unused,
+            .prev_shift = unused,
+            .update_cnt = update_cnt,
+            .hyster_cnt = hyster_cnt,
+            .last_update_cnt = last_update_cnt,
+            .frame_cnt = frame_cnt,
+            .first_frame = false};
   }
 };
 

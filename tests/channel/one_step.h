@@ -9,9 +9,7 @@
 #include <map>
 #include <string>
 
-#include "Voice_Engine/basic_op/block_scaling.h"
 #include "Voice_Engine/channel/channel_plans.h"
-#include "Voice_Engine/channel/fixed_fft_kernel.h"
 #include "tests/channel/channel_model.h"
 
 namespace orvalis::test {
@@ -36,7 +34,6 @@ template <class State>
 struct Subject {
   const ChannelPlan &plan;
   const ModelPlan &model;
-  TransformPlan transform;
   Word16 (State::*overlap)[kMostOverlap];
   Word32 State::*frame_cnt;
   int frames = 0, crowded = 0;  ///< frames held, and those without headroom
@@ -62,17 +59,9 @@ struct Subject {
   /// What the engine's analysis finds in a frame. `s` becomes the state before the noise update.
   ChannelFindings findings(State &s, const Word16 *frame) const {
     Flags flags;
-    Word16 samples[kMostFrameSamples] = {}, buffer[kMostTransformSize];
-    std::copy_n(frame, plan.frame_samples, samples);
-    const Word16 shift = block_norm_AL(flags, samples, plan.frame_samples, 2);
-    assemble_frame(flags, plan, samples, shift, s.prev_shift, s.pre_emp_mem, s.*overlap, buffer);
-    window_edges(flags, plan, buffer);
-    if (!plan.remember_reset)  // only the detector weighs the flat part of its window
-      for (int i = plan.overlap; i < plan.frame_samples; ++i)
-        buffer[i] = mult_r(flags, buffer[i], MAX_16);
-    real_fft(flags, buffer, Direction::kForward, transform);
-    ChannelState channels = channels_of(s, s.*frame_cnt);
-    return analyse_channels(flags, plan, channels, buffer, shift);
+    Word16 spectrum[kMostTransformSize];
+    ChannelState channels = channels_of(s, s.*overlap, s.*frame_cnt);
+    return analyse_frame(flags, plan, channels, frame, spectrum);
   }
 
   struct Step {

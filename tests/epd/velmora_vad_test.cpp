@@ -19,7 +19,6 @@ using DetectorSubject = Subject<VelmoraVadState>;
 DetectorSubject subject(Word32 band) {
   return {.plan = band == 0 ? kWideBandDetection : kNarrowBandDetection,
           .model = band == 0 ? kWideModel : kNarrowModel,
-          .transform = epd_transform_plan(band),
           .overlap = &VelmoraVadState::overlap,
           .frame_cnt = &VelmoraVadState::vad_frame_cnt};
 }

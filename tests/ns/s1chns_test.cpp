@@ -45,7 +45,6 @@ std::vector<Word16> speech() { return with_level_jumps(speech_16k("numbers.raw")
 Subject<S1chnsState> subject() {
   return {.plan = kSuppression,
           .model = kSuppressorModel,
-          .transform = ns_transform_plan(),
           .overlap = &S1chnsState::analysis_overlap,
           .frame_cnt = &S1chnsState::frame_cnt};
 }
