@@ -6,6 +6,7 @@
 #include <optional>
 
 #include "Voice_Engine/channel/frame_screening.h"
+#include "Voice_Engine/epd/kepd.h"
 #include "Voice_Engine/platform/export.h"
 #include "jni/orvalis.h"
 
@@ -14,7 +15,6 @@ namespace {
 constexpr int32_t kLongestFrame = 160;
 constexpr int32_t kFramesPerSecond = 100;
 constexpr int32_t kMsPerFrame = 1000 / kFramesPerSecond;
-constexpr int32_t kRefusedAnswers = 19;  // a shorter utterance is one that the detector refused
 // A frame decides at most two utterances and so does the flush, beyond those that may wait.
 constexpr int32_t kQueueSlots = UTTERANCE_QUEUE_LENGTH + 4;
 
@@ -27,11 +27,9 @@ struct DecisionDelay {
 bool has_short_timing(int32_t content_type) { return static_cast<uint32_t>(content_type) >= 2; }
 
 DecisionDelay decision_delay(const UtteranceSettings &settings, int32_t frame_samples) {
-  const bool is_short = has_short_timing(settings.content_type);
-  const int32_t confirmation = is_short ? 3 : 5;
-  const int32_t pause = is_short ? 14 : 25;
-  const int32_t end_delay = settings.rate_hz == 16000 ? 0 : 3;
-  return {int64_t{confirmation} * frame_samples, int64_t{pause + end_delay} * frame_samples};
+  const orvalis::KepdTiming timing =
+      orvalis::timing_of(static_cast<uint32_t>(settings.content_type), settings.rate_hz == 8000);
+  return {int64_t{timing.start_lag()} * frame_samples, int64_t{timing.end_lag()} * frame_samples};
 }
 
 bool is_valid(const UtteranceSettings &settings) {
@@ -119,7 +117,7 @@ private:
   void hear_speech(UtteranceQueue &queue) {
     if (!running_) begin_piece();
     answers_ += 1;
-    if (answers_ > kRefusedAnswers) is_undecided_ = false;
+    if (answers_ > orvalis::kShortUtterance) is_undecided_ = false;
     open_->ended = heard_;
     if (closed_ && !is_undecided_) hand_out((open_->start - closed_->end) / 2, queue);
   }
@@ -149,7 +147,7 @@ private:
     const bool goes_on = is_interrupted_;
     if (!goes_on) answers_ = 0;
     if (!goes_on || !open_) before_piece_ = open_;
-    is_undecided_ = may_refuse_ && answers_ <= kRefusedAnswers;
+    is_undecided_ = may_refuse_ && answers_ <= orvalis::kShortUtterance;
     is_interrupted_ = false;
     running_ = true;
     const int64_t frame_start = heard_ - frame_samples_;

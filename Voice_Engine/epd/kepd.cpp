@@ -8,18 +8,10 @@
 namespace orvalis {
 namespace {
 
-constexpr Word32 kDeafFrames = 39;      // the first frames never count as voice
-constexpr Word32 kShortUtterance = 19;  // frames up to which an utterance is refused
+constexpr Word32 kDeafFrames = 39;  // the first frames never count as voice
 constexpr Word32 kVoicedToForgetPause = 4;
 constexpr Word32 kTrackedFrames = 45;  // frames of the noise history and of the speech mean
 constexpr float kGateScore = 0.84F;
-
-struct Timing {
-  Word32 onset;        ///< voiced frames that open an utterance
-  Word32 pause_limit;  ///< pause frames that close it
-};
-
-Timing timing_of(std::uint32_t type) { return type < 2 ? Timing{6, 25} : Timing{4, 14}; }
 
 void close_utterance(KepdState &kepd) {
   kepd.onset_cnt = 0;
@@ -49,24 +41,6 @@ void count_frame(KepdState &kepd, bool voiced, Word32 onset) {
     kepd.voiced_run = 0;
     kepd.pause_cnt = 0;
   }
-}
-
-/// The answer of one frame from its voice decision.
-Word32 decide(KepdState &kepd, bool voiced, Timing timing, Word32 end_delay) {
-  count_frame(kepd, voiced, timing.onset);
-  if (kepd.pause_cnt >= timing.pause_limit) {
-    if (kepd.speech_frames <= kShortUtterance) {
-      close_utterance(kepd);
-      return kNoSpeech;
-    }
-    kepd.long_speech = 1;
-  }
-  if (kepd.in_speech != 1) return kNoSpeech;
-  count_up(kepd.speech_frames);
-  if (kepd.long_speech == 1) kepd.end_cnt += 1;
-  if (kepd.end_cnt < end_delay) return kSpeech;
-  close_utterance(kepd);
-  return kEndOfSpeech;
 }
 
 /// Appends a frame's energy to the history and renews the noise floor. The old floor is part of
@@ -119,21 +93,36 @@ Word32 InitNoiseEstimation(EpdInstance **handle) {
   return 0;
 }
 
+Word32 decide(KepdState &kepd, bool voiced, std::uint32_t content_type, bool narrow_band) {
+  const KepdTiming timing = timing_of(content_type, narrow_band);
+  count_up(kepd.frame_cnt);
+  count_frame(kepd, voiced && kepd.frame_cnt > kDeafFrames, timing.onset);
+  if (kepd.pause_cnt >= timing.pause_limit) {
+    if (kepd.speech_frames <= kShortUtterance) {
+      close_utterance(kepd);
+      return kNoSpeech;
+    }
+    kepd.long_speech = 1;
+  }
+  if (kepd.in_speech != 1) return kNoSpeech;
+  count_up(kepd.speech_frames);
+  if (kepd.long_speech == 1) kepd.end_cnt += 1;
+  if (kepd.end_cnt < timing.end_delay) return kSpeech;
+  close_utterance(kepd);
+  return kEndOfSpeech;
+}
+
 Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type) {
   if (*handle == nullptr) return -1;
   EpdInstance &epd = **handle;
-  KepdState &kepd = epd.kepd;
-  count_up(kepd.frame_cnt);
   VelmoraVadState *vad = &epd.vad;
-  const Word32 voice = processVelmoraVAD(flags, &vad, frame, &kepd.EnergyTHscore, epd.rateMode);
+  const Word32 voice = processVelmoraVAD(flags, &vad, frame, &epd.kepd.EnergyTHscore, epd.rateMode);
   if (epd.noise_floor.speech_frames_ne == kTrackedFrames) {
     epd.noise_floor.speech_frames_ne += 1;
-    kepd.EnergyTHscore = kGateScore;
+    epd.kepd.EnergyTHscore = kGateScore;
     log_line(kLogInfo, kLogTag, "TQE: EnergyTHscore: %f", 0.84);
   }
-  const bool voiced = voice == 1 && kepd.frame_cnt > kDeafFrames;
-  const Word32 end_delay = epd.rateMode == 0 ? 1 : 4;
-  return decide(kepd, voiced, timing_of(type), end_delay);
+  return decide(epd.kepd, voice == 1, type, epd.rateMode != 0);
 }
 
 Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 /*answer*/) {

@@ -15,6 +15,26 @@ inline constexpr Word32 kNoSpeech = 0;
 inline constexpr Word32 kSpeech = 1;
 inline constexpr Word32 kEndOfSpeech = 2;
 
+/// Frames up to which an utterance is refused.
+inline constexpr Word32 kShortUtterance = 19;
+
+/// When an utterance begins and ends, in frames of 10 ms.
+struct KepdTiming {
+  Word32 onset;        ///< voiced frames in a row that open it
+  Word32 pause_limit;  ///< pause frames that close it
+  Word32 end_delay;    ///< frames that closing takes; the last is answered with end of speech
+
+  /// By how many frames the first and the last answer of speech come late.
+  constexpr Word32 start_lag() const { return onset - 1; }
+  constexpr Word32 end_lag() const { return pause_limit + end_delay - 1; }
+};
+
+/// Content types from 2 on have the short timing.
+constexpr KepdTiming timing_of(std::uint32_t content_type, bool narrow_band) {
+  const Word32 end_delay = narrow_band ? 4 : 1;
+  return content_type < 2 ? KepdTiming{6, 25, end_delay} : KepdTiming{4, 14, end_delay};
+}
+
 /// Decision state, part of the EPD instance.
 struct KepdState {
   Word32 onset_cnt;      ///< voiced frames in a row
@@ -45,8 +65,11 @@ Word32 InitKEPD(EpdInstance **handle);
 /// Clears the noise-floor state. Returns 0.
 Word32 InitNoiseEstimation(EpdInstance **handle);
 
-/// Answers one frame of the instance's length. Types from 2 on have the short timing. Returns -1
-/// for a null record.
+/// The answer of one frame from its voice decision, which does not count in the first 39 frames.
+Word32 decide(KepdState &kepd, bool voiced, std::uint32_t content_type, bool narrow_band);
+
+/// Detects the voice in one frame of the instance's length, and decides. Returns -1 for a null
+/// record.
 Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type);
 
 /// Tracks the noise floor with the unsuppressed frame. The answer is not used. Returns 0.

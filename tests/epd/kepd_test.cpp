@@ -1,160 +1,111 @@
-// The end-point decision on scripted voice, and the noise floor.
+// The end-point decision over runs of voice decisions, and the noise floor.
 #include "Voice_Engine/epd/kepd.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
 #include <array>
+#include <bit>
 #include <cmath>
 #include <cstring>
 #include <memory>
 #include <numeric>
+#include <sstream>
+#include <string>
 #include <vector>
 
 #include "Voice_Engine/epd/epd_instance.h"
 #include "tests/support/log_capture.h"
 #include "tests/support/random.h"
-#include "tests/support/scripted_voice.h"
 
 namespace orvalis::test {
 namespace {
 
 const LogLine kOnsetLine = info_line("TQE: Onset of voice ... VAD_communication_flag ");
 
-/// KEPD over a record of its own.
-class Kepd {
-public:
-  explicit Kepd(Word32 rate_mode = 0) {
-    record->rateMode = rate_mode;
-    InitKEPD(&handle_);
-    InitNoiseEstimation(&handle_);
-  }
-
-  Word32 answer(bool voiced, std::uint32_t type) {
-    voice.says(voiced);
-    return judge(type);
-  }
-
-  /// Judges a frame with the voice decision as it stands.
-  Word32 judge(std::uint32_t type = 0) {
-    static constexpr Word16 kFrame[160] = {};
-    Flags flags;
-    return KEPDfunc(flags, &handle_, kFrame, type);
-  }
-
-  void track_noise(const Word16 *frame) { KEPDfunc_NoiseEstimation(&handle_, frame, 0); }
-  void reset() { EXPECT_EQ(KEPDfunc_Reset(&handle_), 0); }
-
-  ScriptedVoice voice;
-  std::unique_ptr<EpdInstance> record = std::make_unique<EpdInstance>();
-
-private:
-  EpdInstance *handle_ = record.get();
-};
-
 class KepdTest : public testing::Test {
 protected:
   LogCapture log;
 };
 
-/// The decision once more, written as the list of its steps.
-struct Automaton {
-  enum { kOnset, kPause, kInSpeech, kLong, kEnd, kRun, kSpeech, kFrame };
-  std::array<Word32, 8> state{};
-  int onsets = 0;
-  int refusals = 0;
-  int resets = 0;
-
-  void reset() {
-    ++resets;
-    close(0);
-    state[kRun] = 0;
+/// The answers to voice decisions, both as runs like "45n 26s 1e": voiced or unvoiced frames in,
+/// none, speech or end of speech out.
+std::string answers(const std::string &runs, std::uint32_t type, bool narrow_band) {
+  KepdState kepd{};
+  std::istringstream in(runs);
+  std::string given;
+  int frames = 0;
+  for (char kind = 0; in >> frames >> kind;) {
+    for (; frames > 0; --frames) given += "nse"[decide(kepd, kind == 'v', type, narrow_band)];
   }
-
-  Word32 close(Word32 answer) {
-    for (const int field : {kOnset, kPause, kInSpeech, kLong, kEnd, kSpeech}) state[field] = 0;
-    return answer;
+  std::ostringstream folded;
+  for (std::size_t at = 0, end = 0; at < given.size(); at = end) {
+    end = std::min(given.find_first_not_of(given[at], at), given.size());
+    folded << (at == 0 ? "" : " ") << end - at << given[at];
   }
+  return folded.str();
+}
 
-  Word32 judge(int r, std::uint32_t type, Word32 rate_mode) {
-    const int onset = type < 2 ? 6 : 4;
-    const int pause_limit = type < 2 ? 25 : 14;
-    const int end_delay = rate_mode == 0 ? 1 : 4;
-    if (++state[kFrame] <= 39) r = 0;
-    if (r == 0) {
-      state[kOnset] = 0;
-    } else if (++state[kOnset] >= onset) {
-      state[kInSpeech] = 1;
-      if (state[kOnset] == onset) ++onsets;
-      goto voiced;
+TEST_F(KepdTest, AnswersRunsOfVoiceAndPause) {
+  const struct {
+    const char *runs, *wide, *narrow;
+  } long_timing[] =
+      {
+          {"300u", "300n", "300n"},
+          {"100v 40u", "44n 80s 1e 15n", "44n 83s 1e 12n"},  // deaf at first
+          {"39u 5v 1u 6v 10u", "50n 11s", "50n 11s"},
+          {"45v 60u", "44n 25s 1e 35n", "44n 28s 1e 32n"},  // never too short
+          {"100v 25u 10v", "44n 80s 1e 5n 5s", "44n 83s 1e 5n 2s"},
+          // Four voiced frames in a row forget the pause.
+          {"50v 20u 3v 5u", "44n 33s 1e", "44n 34s"},
+          {"50v 20u 4v 24u 4u", "44n 54s 1e 3n", "44n 57s 1e"},
+          {"50v 10u 2v 1u 2v 14u", "44n 34s 1e", "44n 35s"},
+      },
+    short_timing[] = {
+        {"60v 20u", "42n 31s 1e 6n", "42n 34s 1e 3n"},
+        {"39u 3v 1u 4v 20u", "46n 14s 7n", "46n 14s 7n"},
+        // Refused at the limit of the pause, and all is forgotten.
+        {"48v 20u", "42n 19s 7n", "42n 19s 7n"},
+        {"49v 20u", "42n 20s 1e 6n", "42n 23s 1e 3n"},
+        {"48v 20u 60v 14u", "42n 19s 10n 70s 1e", "42n 19s 10n 71s"},
+    };
+  for (const std::uint32_t type : {0U, 1U}) {
+    for (const auto &[runs, wide, narrow] : long_timing) {
+      EXPECT_EQ(answers(runs, type, false), wide) << runs;
+      EXPECT_EQ(answers(runs, type, true), narrow) << runs;
     }
-    if (state[kInSpeech] == 1 && r == 1) goto voiced;
-    if (state[kInSpeech] == 1) state[kPause] += 1;
-    state[kRun] = 0;
-    goto pause;
-  voiced:
-    state[kRun] += 1;
-    if (state[kRun] > 3) {
-      state[kPause] = 0;
-      state[kRun] = 0;
-      goto count;
-    }
-  pause:
-    if (state[kPause] >= pause_limit) {
-      if (state[kSpeech] <= 19) {
-        ++refusals;
-        return close(0);
-      }
-      state[kLong] = 1;
-    }
-  count:
-    if (state[kInSpeech] != 1) return 0;
-    state[kSpeech] += 1;
-    if (state[kLong] == 1) state[kEnd] += 1;
-    return state[kEnd] < end_delay ? 1 : close(2);
   }
-};
+  for (const std::uint32_t type : {2U, 9U, 0xFFFFFFFFU}) {
+    for (const auto &[runs, wide, narrow] : short_timing) {
+      EXPECT_EQ(answers(runs, type, false), wide) << runs;
+      EXPECT_EQ(answers(runs, type, true), narrow) << runs;
+    }
+  }
+  log.take();
+  answers("60v 10u 5v 10u 20v", 0, false);
+  EXPECT_EQ(log.take(), (LogLines{kOnsetLine, kOnsetLine}));
+}
 
-TEST_F(KepdTest, FollowsTheAutomaton) {
-  auto random = seeded_generator();
-  const auto up_to = [&](int limit) { return static_cast<int>(random() % limit); };
-  constexpr std::uint32_t kTypes[] = {0, 1, 2, 3, 0xFFFFFFFF};
-  int ends = 0;
-  int refusals = 0;
-  for (int sequence = 0; sequence < 3000; ++sequence) {
-    const Word32 rate_mode = std::array{0, 1, -1}[up_to(3)];
-    Kepd kepd(rate_mode);
-    Automaton model;
-    std::uint32_t type = kTypes[up_to(5)];
-    const bool type_changes = up_to(4) == 0;
-    const int longest_run[] = {2 + up_to(40), 2 + up_to(20)};
-    int run = 0;
-    bool voiced = false;
-    for (int frame = 0; frame < 400; ++frame) {
-      if (run-- == 0) {
-        voiced = !voiced;
-        run = up_to(longest_run[voiced]);
-        if (type_changes) type = kTypes[up_to(5)];
-      }
-      const Word32 answer = model.judge(voiced, type, rate_mode);
-      ASSERT_EQ(kepd.answer(voiced, type), answer) << "sequence " << sequence << ", " << frame;
-      ends += answer == 2;
-      if (up_to(300) == 0) {
-        kepd.reset();
-        model.reset();
-      }
-      const KepdState &s = kepd.record->kepd;
-      const std::array state{s.onset_cnt, s.pause_cnt,  s.in_speech,     s.long_speech,
-                             s.end_cnt,   s.voiced_run, s.speech_frames, s.frame_cnt};
-      ASSERT_EQ(state, model.state) << "sequence " << sequence << ", " << frame;
-    }
-    const LogLines lines = log.take();
-    ASSERT_EQ(std::count(lines.begin(), lines.end(), kOnsetLine), model.onsets);
-    ASSERT_EQ(std::ssize(lines), model.onsets + model.resets);
-    refusals += model.refusals;
-  }
-  EXPECT_GT(ends, 1000);
-  EXPECT_GT(refusals, 1000);
+TEST_F(KepdTest, ForgetsTheOpenUtteranceButNotItsOwnAge) {
+  const auto record = std::make_unique<EpdInstance>();
+  EpdInstance *handle = record.get();
+  KepdState &kepd = record->kepd;
+  kepd.EnergyTHscore = 0.84F;
+  for (int frame = 1; frame <= 126; ++frame) decide(kepd, frame <= 100 || frame == 126, 0, true);
+  for (const Word32 field : std::bit_cast<std::array<Word32, 9>>(kepd)) EXPECT_NE(field, 0);
+  log.take();
+  EXPECT_EQ(KEPDfunc_Reset(&handle), 0);
+  EXPECT_EQ(log.take(), LogLines{info_line("TQE: reset KEPDfunc params")});
+  KepdState forgotten{};
+  forgotten.frame_cnt = 126;
+  forgotten.EnergyTHscore = 0.84F;
+  EXPECT_EQ(std::memcmp(&kepd, &forgotten, sizeof kepd), 0);
+
+  kepd.in_speech = 1;
+  kepd.onset_cnt = kepd.speech_frames = kepd.frame_cnt = MAX_32;
+  EXPECT_EQ(decide(kepd, true, 0, false), kSpeech);
+  for (const Word32 age : {kepd.onset_cnt, kepd.speech_frames, kepd.frame_cnt})
+    EXPECT_EQ(age, MAX_32) << "counters stop at their end";
 }
 
 TEST_F(KepdTest, TellsANullRecord) {
@@ -164,7 +115,22 @@ TEST_F(KepdTest, TellsANullRecord) {
   EXPECT_EQ(KEPDfunc(flags, &none, nullptr, 0), -1);
 }
 
-using NoiseFloor = KepdTest;
+class NoiseFloor : public KepdTest {
+protected:
+  NoiseFloor() {
+    InitKEPD(&handle);
+    InitNoiseEstimation(&handle);
+  }
+
+  /// Tracks a frame that the detector took for voice, or not.
+  void track(bool voiced, const Word16 *frame) {
+    record->vad.vad_flag = voiced;
+    EXPECT_EQ(KEPDfunc_NoiseEstimation(&handle, frame, 0), 0);
+  }
+
+  const std::unique_ptr<EpdInstance> record = std::make_unique<EpdInstance>();
+  EpdInstance *handle = record.get();
+};
 
 TEST_F(NoiseFloor, MeasuresMeanSquares) {
   auto random = seeded_generator();
@@ -184,8 +150,7 @@ TEST_F(NoiseFloor, MeasuresMeanSquares) {
 
 TEST_F(NoiseFloor, KeepsHistoryAndFeedsTheFloorBack) {
   auto random = seeded_generator();
-  Kepd kepd;
-  const NoiseFloorState &floor = kepd.record->noise_floor;
+  const NoiseFloorState &floor = record->noise_floor;
   std::vector<double> history(45, 0.0);
   double noise = 0;
   double speech = 0;
@@ -197,8 +162,7 @@ TEST_F(NoiseFloor, KeepsHistoryAndFeedsTheFloorBack) {
     const auto level = static_cast<Word16>(10 * (random() % 200));
     const double energy = level * level / 100;
     std::vector<Word16> frame(160, level);
-    kepd.record->vad.vad_flag = voiced;
-    kepd.track_noise(frame.data());
+    track(voiced, frame.data());
     if (voiced) {
       ++speech_frames;
       speech += energy;
@@ -219,38 +183,40 @@ TEST_F(NoiseFloor, KeepsHistoryAndFeedsTheFloorBack) {
 
   const NoiseFloorState finished = floor;
   const std::vector<Word16> loud(160, 30000);
-  for (const Word32 voiced : {0, 1}) {
-    kepd.record->vad.vad_flag = voiced;
-    kepd.track_noise(loud.data());
+  for (const bool voiced : {false, true}) {
+    track(voiced, loud.data());
     EXPECT_EQ(std::memcmp(&floor, &finished, sizeof finished), 0);
   }
 }
 
 TEST_F(NoiseFloor, SwitchesTheGateOnAfterFortyFiveSpeechFrames) {
-  Kepd kepd;
-  kepd.voice.flag = 1;
-  kepd.voice.answer = 0;  // voice that the gate refuses is speech to the noise floor
   const Word16 silence[160] = {};
   for (int frame = 1; frame <= 45; ++frame) {
-    kepd.judge();
-    kepd.track_noise(silence);
+    EXPECT_EQ(record->noise_floor.speech_frames_ne, frame - 1);
+    track(true, silence);
   }
-  EXPECT_TRUE(std::isnan(kepd.record->noise_floor.speech_noise_ratio));
-  EXPECT_EQ(kepd.record->kepd.EnergyTHscore, 0.0F);
-  EXPECT_EQ(log.take(), LogLines{});
+  EXPECT_TRUE(std::isnan(record->noise_floor.speech_noise_ratio));
 
-  kepd.judge();
-  EXPECT_EQ(kepd.voice.heard_score, 0.0F) << "the detector heard of it too early";
-  EXPECT_EQ(kepd.record->kepd.EnergyTHscore, 0.84F);
-  EXPECT_EQ(kepd.record->noise_floor.speech_frames_ne, 46);
+  // A voice frame, by the energy that is left in a channel, that completes a block of the gate.
+  VelmoraVadState &vad = record->vad;
+  vad.first_frame = 0;
+  vad.vad_frame_cnt = 100;
+  vad.ch_enrg[0] = 4000000;
+  std::ranges::fill(vad.ch_noise, 100);
+  const auto threshold_after = [&](Word32 blocks) {
+    vad.blk_count = blocks;
+    vad.blk_frames = 24;
+    Flags flags;
+    EXPECT_EQ(KEPDfunc(flags, &handle, silence, 0), kNoSpeech);
+    EXPECT_EQ(vad.blk_count, blocks + 1);
+    return vad.energy_th;
+  };
+  EXPECT_EQ(threshold_after(1), 1) << "the detector heard of it too early";
+  EXPECT_EQ(record->kepd.EnergyTHscore, 0.84F);
+  EXPECT_EQ(record->noise_floor.speech_frames_ne, 46);
   EXPECT_EQ(log.take(), LogLines{info_line("TQE: EnergyTHscore: 0.840000")});
-
-  kepd.reset();
-  EXPECT_EQ(log.take(), LogLines{info_line("TQE: reset KEPDfunc params")});
-  kepd.judge();
-  EXPECT_EQ(kepd.voice.heard_score, 0.84F);
-  EXPECT_EQ(kepd.record->kepd.frame_cnt, 47);
-  EXPECT_EQ(log.take(), LogLines{});
+  EXPECT_GT(threshold_after(2), 1000);
+  EXPECT_EQ(log.take(), LogLines{}) << "once is enough";
 }
 
 }  // namespace
