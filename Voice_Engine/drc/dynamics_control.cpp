@@ -59,19 +59,15 @@ DrcInstance *create_drc(Word32 samplingRate, Word32 pcmDumpEnabled) {
 
 DrcInstance *initRecDynamicsControlParameter(Word32 samplingRate, Word16 frameLength,
                                              Word16 outputScale, Word32 pcmDumpEnabled) {
-  auto *drc = static_cast<DrcInstance *>(std::malloc(sizeof(DrcInstance)));
+  auto *drc = static_cast<DrcInstance *>(std::calloc(1, sizeof(DrcInstance)));
   if (drc == nullptr) return nullptr;
-  *drc = {.firstCallLogged = 0,
-          .pcmDumpEnabled = pcmDumpEnabled,
-          .loudRingIndex = 0,
-          .loudRing = {},
-          .samplingRate = samplingRate,
-          .frameLength = frameLength,
-          .gainEnvelope = 0,
-          .outputScale = outputScale,
-          .riseCoefficient = 164,
-          .fallCoefficient = 10,
-          .gainCurve = kGainCurve};
+  drc->pcmDumpEnabled = pcmDumpEnabled;
+  drc->samplingRate = samplingRate;
+  drc->frameLength = frameLength;
+  drc->outputScale = outputScale;
+  drc->riseCoefficient = 164;
+  drc->fallCoefficient = 10;
+  drc->gainCurve = kGainCurve;
   return drc;
 }
 

@@ -93,7 +93,7 @@ Word32 answer_frame(EpdInstance *epd, Word16 *frame, bool suppresses, Word32 con
 }  // namespace
 
 EpdInstance *EPD_Create(Word32 mode, Word32 pcmDumpEnabled) {
-  auto *epd = static_cast<EpdInstance *>(std::malloc(sizeof(EpdInstance)));
+  auto *epd = static_cast<EpdInstance *>(std::calloc(1, sizeof(EpdInstance)));
   if (epd != nullptr) {
     if (mode == 4) S1CHNSInit(&epd->secondary_suppressor, 0);
     S1CHNSInit(&epd->suppressor, 2);
@@ -102,8 +102,6 @@ EpdInstance *EPD_Create(Word32 mode, Word32 pcmDumpEnabled) {
     epd->epdMode = mode % 1000;
     epd->inputGainMode = mode / 10000;
     epd->HANGframe = -1;
-    epd->processedSamples = 0;
-    epd->abnormalCheckCount = 0;
     epd->hangLogEnabled = 1;
     epd->pcmDumpEnabled = pcmDumpEnabled;
     InitKEPD(&epd);

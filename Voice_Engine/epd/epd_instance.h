@@ -8,8 +8,7 @@
 #include "Voice_Engine/epd/velmora_vad.h"
 #include "Voice_Engine/ns/s1chns.h"
 
-/// Everything that one end-point detector knows. Allocated uncleared: creation sets each field
-/// before it is read.
+/// Everything that one end-point detector knows. All zero but for what creation sets.
 struct EpdInstance {
   orvalis::Word32 pcmDumpEnabled;      ///< dump files are written only when this is 1
   orvalis::Word32 epdMode;             ///< sub-mode, 0..3

@@ -66,7 +66,7 @@ bool suppress(NsInstance *ns, S2chnsState &pair, Word16 *in, Word16 *out, Flags 
 }  // namespace
 
 NsInstance *DoNS_Create(Word32 mode, Word32 micCount, S2chnsState &pair) {
-  auto *ns = static_cast<NsInstance *>(std::malloc(sizeof(NsInstance)));
+  auto *ns = static_cast<NsInstance *>(std::calloc(1, sizeof(NsInstance)));
   if (ns == nullptr) {
     log_version(0);
     return nullptr;

@@ -8,7 +8,7 @@
 #include "Voice_Engine/ns/s2chns.h"
 
 /// Everything that one noise suppressor knows but for the record of two microphones, which belongs
-/// to the caller. Allocated uncleared: creation sets each field before it is read.
+/// to the caller. All zero but for what creation sets.
 struct NsInstance {
   orvalis::Word32 pcmDumpEnabled;      ///< 0: no caller can ask for dump files
   orvalis::Word32 rateMode;            ///< rate digit of the mode

@@ -41,7 +41,6 @@ std::int32_t judge_samples(EpdInstance *epd, const std::int16_t *pcm, std::int32
 void run(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t dump, Random random,
          bool hostile) {
   Observer observer(judge);
-  const auto zeroed = ScriptedMalloc::filling(0);  // what the mode does not use counts too
   EpdInstance *epd = InitializeEPD(mode, dump);
   observer.watch(epd);
   const auto frame = static_cast<std::size_t>(epd->rateMode == 0 ? 160 : 80);

@@ -27,7 +27,6 @@ void take_record(Judge &judge, const S2chnsState &state) {
 void run(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t microphones, Random random,
          bool hostile) {
   Observer observer(judge);
-  const auto zeroed = ScriptedMalloc::filling(0);  // what the mode does not use counts too
   NsInstance *ns =
       InitializeDoNS(mode, microphones, static_cast<std::int32_t>(draw(random, -1, 1)));
   observer.watch(ns);

@@ -134,9 +134,7 @@ TEST_F(NsDriver, FollowsItsSteps) {
     SCOPED_TRACE(sequence);
     const Mode &mode = one_of(kModes);
     const Word32 mics = one_in(3) ? one_of(kMicCounts) : 1 + static_cast<Word32>(random() % 2);
-    const int dirt = one_of(std::array{0x00, 0xA5, 0xFF});
     const auto create = [&] {
-      const auto memory = ScriptedMalloc::filling(dirt);
       return Suppressor(InitializeDoNS(mode.mode, mics, static_cast<int32_t>(random())));
     };
     Suppressor ns = create();
@@ -174,12 +172,6 @@ TEST_F(NsDriver, FollowsItsSteps) {
         create();  // starts the suppressor of all afresh
         log.take();
       }
-    }
-    if (mics != 1) {
-      const auto *bytes = reinterpret_cast<const unsigned char *>(&ns->suppressor);
-      EXPECT_TRUE(std::all_of(bytes, bytes + sizeof ns->suppressor, [&](int byte) {
-        return byte == dirt;
-      })) << "it is not used";
     }
     const long id = reinterpret_cast<std::intptr_t>(ns.get());
     ns.reset();
