@@ -13,7 +13,7 @@
 
 namespace {
 
-// Exported names may be interposed by a host, so they never call one another.
+// What the three frame calls of the detector have in common.
 int32_t process_frames(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
                        int32_t contentType) {
   if (pcm == nullptr && numSample > 0) return -1;

@@ -46,8 +46,14 @@ complain_if_any "the library needs more than libc and libm:" unwanted
 readelf -lW "$library" | awk '$1 == "LOAD" && $NF != "0x4000"' >misaligned
 complain_if_any "segments that are not aligned to 16 KB:" misaligned
 
+# A host may define any of these names: no call of the library itself may then end there.
+nm -D --defined-only "$library" | awk '$2 == "T" {print $3}' | sort >functions
+readelf -rW "$library" | awk '{print $5}' | sort -u >relocated
+comm -12 functions relocated >interposable
+complain_if_any "functions of its own that the library calls by their exported names:" interposable
+
 # Every check above passes on nothing at all.
-for list in exported declared needed; do
+for list in exported declared needed functions relocated; do
   if [ ! -s $list ]; then
     echo "nothing $list: the tools that read the library have failed"
     failed=1
