@@ -110,7 +110,8 @@ public:
   void hear(const Word16 *frame, int /*samples*/) {
     Flags flags;
     VelmoraVadState *state = &state_;
-    benchmark::DoNotOptimize(VelmoraVAD(flags, &state, frame, band_));
+    EpdReasons reasons;
+    benchmark::DoNotOptimize(VelmoraVAD(flags, &state, frame, band_, reasons));
   }
 
 private:

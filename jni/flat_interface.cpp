@@ -13,11 +13,14 @@
 
 namespace {
 
-// What the three frame calls of the detector have in common.
-int32_t process_frames(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
-                       int32_t contentType) {
+// What the frame calls of the detector have in common.
+int32_t process_frames(EpdInstance *epd, const int16_t *pcm, int32_t numSample, int32_t contentType,
+                       EpdReasons *wanted = nullptr) {
   if (pcm == nullptr && numSample > 0) return -1;
-  return orvalis::EPD_Proc_Frame(epd, pcm, numSample, contentType);
+  EpdReasons reasons;
+  const int32_t result = orvalis::EPD_Proc_Frame(epd, pcm, numSample, contentType, reasons);
+  if (wanted != nullptr) *wanted = reasons;
+  return result;
 }
 
 constinit orvalis::S2chnsState process_wide_pair{};  // of all suppressors of two microphones
@@ -48,6 +51,12 @@ ORVALIS_EXPORT int32_t ProcessEPDFrameByCnttype(EpdInstance *epd, const int16_t 
 ORVALIS_EXPORT int32_t ProcessEPDFrameByMode(EpdInstance *epd, const int16_t *pcm,
                                              int32_t numSample, int32_t mode) {
   return process_frames(epd, pcm, numSample, mode);
+}
+
+ORVALIS_EXPORT int32_t ProcessEPDFrameExplained(EpdInstance *epd, const int16_t *pcm,
+                                                int32_t numSample, int32_t contentType,
+                                                EpdReasons *reasons) {
+  return process_frames(epd, pcm, numSample, contentType, reasons);
 }
 
 ORVALIS_EXPORT int32_t ProcessEPDFrame(EpdInstance *epd, const int16_t *pcm, int32_t numSample) {

@@ -63,6 +63,8 @@
 #include <stddef.h>
 #include <stdint.h>
 
+#include "epd_reasons.h"
+
 #ifdef __cplusplus
 extern "C" {
 #endif
@@ -141,6 +143,14 @@ int32_t ProcessEPDFrameByCnttype(EpdInstance *epd, const int16_t *pcm, int32_t n
 /* Identical to ProcessEPDFrameByCnttype; `mode` is the content type. */
 int32_t ProcessEPDFrameByMode(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
                               int32_t mode);
+
+/*
+ * The same as ProcessEPDFrameByCnttype, and why: `reasons` is set to those of the last frame of the
+ * buffer that was judged (see epd_reasons.h), or left alone if the call returns -1 because pcm is
+ * NULL. It may be NULL.
+ */
+int32_t ProcessEPDFrameExplained(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
+                                 int32_t contentType, EpdReasons *reasons);
 
 /*
  * Forgets the utterance in progress and turns hangover log lines on again. What the detector has

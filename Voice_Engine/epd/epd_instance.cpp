@@ -72,15 +72,18 @@ void note_hangover(EpdInstance &epd, Word32 answer) {
 /// Judges one scaled frame and returns KEPD's answer. The decision hears the suppressed frame, the
 /// noise floor and the dump the unsuppressed one.
 Word32 answer_frame(EpdInstance *epd, Word16 *frame, bool suppresses, Word32 contentType,
-                    Flags &flags, Flags &ns_flags) {
+                    Flags &flags, Flags &ns_flags, EpdReasons &reasons) {
   const Word32 length = frame_length(*epd);
   Word16 unsuppressed[kMostFrameSamples];
   std::copy_n(frame, length, unsuppressed);
   if (suppresses) s1chns_C(ns_flags, &epd->suppressor, frame, frame);
   if (dumps(*epd)) write_dump(epd->inputDumpFile, unsuppressed, length);
 
-  const Word32 answer = KEPDfunc(flags, &epd, frame, static_cast<std::uint32_t>(contentType));
+  const Word32 answer =
+      KEPDfunc(flags, &epd, frame, static_cast<std::uint32_t>(contentType), reasons);
   KEPDfunc_NoiseEstimation(&epd, unsuppressed, answer);
+  reasons.judged += 1;
+  reasons.noiseFloor = epd->noise_floor.noise_energy;
   note_hangover(*epd, answer);
   if (dumps(*epd)) {
     Word16 result[kMostFrameSamples];
@@ -116,7 +119,9 @@ EpdInstance *EPD_Create(Word32 mode, Word32 pcmDumpEnabled) {
   return epd;
 }
 
-Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Word32 contentType) {
+Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Word32 contentType,
+                      EpdReasons &reasons) {
+  reasons = {};
   if (epd == nullptr) return -1;
   log_format(*epd, numSample);
   const DumpFilesPresent dump_files(dumps(*epd), epd, kInputSuffix, kResultSuffix);
@@ -141,8 +146,9 @@ Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Wor
     const bool settled = audio_settled(abnormal_check_count, running, length,
                                        small_samples < kMostSmallSamples, kSettlingTexts);
     const bool suppresses = settled && epd->rateMode == 0;
-    if (answer_frame(epd, frame, suppresses, contentType, *flags, *ns_flags) != kNoSpeech)
-      result = 1;
+    const Word32 answer =
+        answer_frame(epd, frame, suppresses, contentType, *flags, *ns_flags, reasons);
+    if (answer != kNoSpeech) result = 1;
   }
   epd->processedSamples = running;
   epd->abnormalCheckCount = abnormal_check_count;

@@ -34,7 +34,9 @@ EpdInstance *EPD_Create(Word32 mode, Word32 pcmDumpEnabled);
 
 /// Judges a buffer of whole frames: 1 if one was answered with speech or end of speech, else 0;
 /// 0 without storing the count if the buffer ends in a partial frame; -1 for a null instance.
-Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Word32 contentType);
+/// `reasons` are set to those of the last frame that was judged.
+Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Word32 contentType,
+                      EpdReasons &reasons);
 
 /// Forgets the open utterance and turns hangover lines on. Returns 0, or -1 for a null instance.
 Word32 reset_ALL_EPDparams(EpdInstance *epd);

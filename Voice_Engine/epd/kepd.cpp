@@ -43,6 +43,23 @@ void count_frame(KepdState &kepd, bool voiced, Word32 onset) {
   }
 }
 
+/// The answer of one frame whose voice decision has been counted.
+Word32 conclude(KepdState &kepd, const KepdTiming &timing) {
+  if (kepd.pause_cnt >= timing.pause_limit) {
+    if (kepd.speech_frames <= kShortUtterance) {
+      close_utterance(kepd);
+      return kNoSpeech;
+    }
+    kepd.long_speech = 1;
+  }
+  if (kepd.in_speech != 1) return kNoSpeech;
+  count_up(kepd.speech_frames);
+  if (kepd.long_speech == 1) kepd.end_cnt += 1;
+  if (kepd.end_cnt < timing.end_delay) return kSpeech;
+  close_utterance(kepd);
+  return kEndOfSpeech;
+}
+
 /// Appends a frame's energy to the history and renews the noise floor. The old floor is part of
 /// the new mean.
 void track_noise_floor(NoiseFloorState &floor, float energy) {
@@ -93,36 +110,33 @@ Word32 InitNoiseEstimation(EpdInstance **handle) {
   return 0;
 }
 
-Word32 decide(KepdState &kepd, bool voiced, std::uint32_t content_type, bool narrow_band) {
+Word32 decide(KepdState &kepd, bool voiced, std::uint32_t content_type, bool narrow_band,
+              EpdReasons &reasons) {
   const KepdTiming timing = timing_of(content_type, narrow_band);
   count_up(kepd.frame_cnt);
-  count_frame(kepd, voiced && kepd.frame_cnt > kDeafFrames, timing.onset);
-  if (kepd.pause_cnt >= timing.pause_limit) {
-    if (kepd.speech_frames <= kShortUtterance) {
-      close_utterance(kepd);
-      return kNoSpeech;
-    }
-    kepd.long_speech = 1;
-  }
-  if (kepd.in_speech != 1) return kNoSpeech;
-  count_up(kepd.speech_frames);
-  if (kepd.long_speech == 1) kepd.end_cnt += 1;
-  if (kepd.end_cnt < timing.end_delay) return kSpeech;
-  close_utterance(kepd);
-  return kEndOfSpeech;
+  reasons.voice = voiced && kepd.frame_cnt > kDeafFrames;
+  count_frame(kepd, reasons.voice != 0, timing.onset);
+  reasons.onset = kepd.onset_cnt;
+  reasons.onsetFrames = timing.onset;
+  reasons.pause = kepd.pause_cnt;
+  reasons.pauseFrames = timing.pause_limit;
+  reasons.answer = conclude(kepd, timing);
+  return reasons.answer;
 }
 
-Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type) {
+Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type,
+                EpdReasons &reasons) {
   if (*handle == nullptr) return -1;
   EpdInstance &epd = **handle;
   VelmoraVadState *vad = &epd.vad;
-  const Word32 voice = processVelmoraVAD(flags, &vad, frame, &epd.kepd.EnergyTHscore, epd.rateMode);
+  const Word32 voice =
+      processVelmoraVAD(flags, &vad, frame, &epd.kepd.EnergyTHscore, epd.rateMode, reasons);
   if (epd.noise_floor.speech_frames_ne == kTrackedFrames) {
     epd.noise_floor.speech_frames_ne += 1;
     epd.kepd.EnergyTHscore = kGateScore;
     log_line(kLogInfo, kLogTag, "TQE: EnergyTHscore: %f", 0.84);
   }
-  return decide(epd.kepd, voice == 1, type, epd.rateMode != 0);
+  return decide(epd.kepd, voice == 1, type, epd.rateMode != 0, reasons);
 }
 
 Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 /*answer*/) {

@@ -5,6 +5,7 @@
 #include <cstdint>
 
 #include "Voice_Engine/basic_op/flags.h"
+#include "Voice_Engine/epd/epd_reasons.h"
 
 struct EpdInstance;
 
@@ -66,11 +67,14 @@ Word32 InitKEPD(EpdInstance **handle);
 Word32 InitNoiseEstimation(EpdInstance **handle);
 
 /// The answer of one frame from its voice decision, which does not count in the first 39 frames.
-Word32 decide(KepdState &kepd, bool voiced, std::uint32_t content_type, bool narrow_band);
+/// `reasons` takes the decision and the counts that led to it.
+Word32 decide(KepdState &kepd, bool voiced, std::uint32_t content_type, bool narrow_band,
+              EpdReasons &reasons);
 
 /// Detects the voice in one frame of the instance's length, and decides. Returns -1 for a null
 /// record.
-Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type);
+Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type,
+                EpdReasons &reasons);
 
 /// Tracks the noise floor with the unsuppressed frame. The answer is not used. Returns 0.
 Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 answer);

@@ -57,7 +57,8 @@ void VelmoraVADInit(VelmoraVadState **state, Word32 band) {
   vad.first_frame = 1;
 }
 
-Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Word32 band) {
+Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Word32 band,
+                  EpdReasons &reasons) {
   VelmoraVadState &vad = **state;
   const ChannelPlan &plan = plan_of(band);
   if (vad.vad_frame_cnt != MAX_16) vad.vad_frame_cnt += 1;
@@ -72,14 +73,25 @@ Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Wo
   if (found.is_noise) track_noise(flags, plan, channels);
   vad.first_frame = 0;
   vad.vad_flag = !found.is_noise && found.total_energy >= kLeastVoiceEnergy;
+
+  reasons.noise = found.is_noise;
+  reasons.voiceMetric = found.voice_metric;
+  reasons.voiceMetricThreshold = plan.metric_noise;
+  reasons.spectralDeviation = found.deviation_q5;
+  reasons.spectralDeviationThreshold = plan.deviation_voice;
+  reasons.channelEnergy = found.total_energy;
+  reasons.minChannelEnergy = kLeastVoiceEnergy;
+  reasons.energy = vad.tot_enrg;
+  reasons.energyGate = vad.energy_th;
   return vad.vad_flag;
 }
 
 Word32 processVelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame,
-                         const float *score, Word32 band) {
+                         const float *score, Word32 band, EpdReasons &reasons) {
   VelmoraVadState &vad = **state;
-  if (VelmoraVAD(flags, state, frame, band) == 0) return 0;
+  if (VelmoraVAD(flags, state, frame, band, reasons) == 0) return 0;
   learn_speech_level(vad, *score);
+  reasons.energyGate = vad.energy_th;
   return vad.energy_th <= vad.tot_enrg;
 }
 

@@ -6,6 +6,7 @@
 
 #include "Voice_Engine/basic_op/flags.h"
 #include "Voice_Engine/channel/channel_analysis.h"
+#include "Voice_Engine/epd/epd_reasons.h"
 
 namespace orvalis {
 
@@ -37,11 +38,12 @@ struct VelmoraVadState {
 /// 8 kHz.
 void VelmoraVADInit(VelmoraVadState **state, Word32 band);
 
-/// Judges one frame of 160 (band 0) or 80 samples: 1 for voice, else 0.
-Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Word32 band);
+/// Judges one frame of 160 (band 0) or 80 samples: 1 for voice, else 0. `reasons` tells why.
+Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Word32 band,
+                  EpdReasons &reasons);
 
 /// The same behind the energy gate, whose threshold is the speech level raised to `score`.
 Word32 processVelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame,
-                         const float *score, Word32 band);
+                         const float *score, Word32 band, EpdReasons &reasons);
 
 }  // namespace orvalis

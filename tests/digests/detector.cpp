@@ -74,6 +74,29 @@ void run(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t dump, R
   observer.take_dumps();
 }
 
+/// The reasons of every frame, and that asking for them changes no answer.
+void run_explained(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t type) {
+  Observer observer(judge);
+  EpdInstance *epd = InitializeEPD(mode, 0);
+  EpdInstance *unasked = InitializeEPD(mode, 0);
+  const std::int32_t frame = epd->rateMode == 0 ? 160 : 80;
+  for (std::size_t at = 0; at + 480 <= audio.size();) {
+    const std::int32_t count = frame * static_cast<std::int32_t>(1 + at % 3);
+    EpdReasons why;
+    judge.take(ProcessEPDFrameExplained(epd, &audio[at], count, type, &why));
+    judge.take(why.judged, why.answer, why.voice, why.noise, why.voiceMetric,
+               why.voiceMetricThreshold, why.spectralDeviation, why.spectralDeviationThreshold,
+               why.channelEnergy, why.minChannelEnergy, why.energy, why.energyGate, why.noiseFloor,
+               why.onset, why.onsetFrames, why.pause, why.pauseFrames);
+    judge.call();
+    ProcessEPDFrameByCnttype(unasked, &audio[at], count, type);
+    at += static_cast<std::size_t>(count);
+  }
+  EXPECT_EQ(std::memcmp(&epd->kepd, &unasked->kepd, sizeof epd->kepd), 0);
+  FreeMemoryEPD(epd);
+  FreeMemoryEPD(unasked);
+}
+
 TEST(Digests, Detector) {
   Judge judge("detector");
   judge.sequence("sentence",
@@ -99,6 +122,16 @@ TEST(Digests, Detector) {
           hostile_signal(static_cast<std::uint64_t>(seed), samples, is_narrow ? narrow : wide),
           mode, seed % 3, Random(static_cast<std::uint64_t>(seed)), true);
     });
+  }
+
+  for (const std::int32_t mode : {0, 1000, 20000, 21000}) {
+    const Pcm &speech = mode % 10000 == 0 ? wide : narrow;
+    for (const std::int32_t type : {0, 2}) {
+      judge.sequence("reasons-mode" + std::to_string(mode) + "-type" + std::to_string(type), [&] {
+        const auto drawn = static_cast<std::uint64_t>(50 + mode / 1000 + type);
+        run_explained(judge, hostile_signal(drawn, 90000, speech), mode, type);
+      });
+    }
   }
 
   judge.sequence("refusals", [&] {

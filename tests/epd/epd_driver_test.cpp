@@ -180,7 +180,7 @@ struct DriverModel {
                 is_normal ? " wait few more frame ..." : ""));
     }
     const Word32 answer =
-        KEPDfunc(flags, &handle, suppressed.data(), static_cast<std::uint32_t>(type));
+        KEPDfunc(flags, &handle, suppressed.data(), static_cast<std::uint32_t>(type), reasons);
     for (const LogLine &said : log.take()) keep(said);
     KEPDfunc_NoiseEstimation(&handle, frame.data(), answer);
     dumped_input.insert(dumped_input.end(), frame.begin(), frame.end());
@@ -216,6 +216,7 @@ struct DriverModel {
   EpdInstance *handle = &record;
   const int length;
   Flags flags;
+  EpdReasons reasons{};
   Flags ns_flags;
   LogLines lines;
   Pcm dumped_input, dumped_answers;

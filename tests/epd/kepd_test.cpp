@@ -26,17 +26,22 @@ const LogLine kOnsetLine = info_line("TQE: Onset of voice ... VAD_communication_
 class KepdTest : public testing::Test {
 protected:
   LogCapture log;
+  EpdReasons reasons{};
 };
 
 /// The answers to voice decisions, both as runs like "45n 26s 1e": voiced or unvoiced frames in,
 /// none, speech or end of speech out.
 std::string answers(const std::string &runs, std::uint32_t type, bool narrow_band) {
   KepdState kepd{};
+  EpdReasons reasons{};
   std::istringstream in(runs);
   std::string given;
   int frames = 0;
   for (char kind = 0; in >> frames >> kind;) {
-    for (; frames > 0; --frames) given += "nse"[decide(kepd, kind == 'v', type, narrow_band)];
+    for (; frames > 0; --frames) {
+      given += "nse"[decide(kepd, kind == 'v', type, narrow_band, reasons)];
+      EXPECT_EQ("nse"[reasons.answer], given.back());
+    }
   }
   std::ostringstream folded;
   for (std::size_t at = 0, end = 0; at < given.size(); at = end) {
@@ -91,7 +96,8 @@ TEST_F(KepdTest, ForgetsTheOpenUtteranceButNotItsOwnAge) {
   EpdInstance *handle = record.get();
   KepdState &kepd = record->kepd;
   kepd.EnergyTHscore = 0.84F;
-  for (int frame = 1; frame <= 126; ++frame) decide(kepd, frame <= 100 || frame == 126, 0, true);
+  for (int frame = 1; frame <= 126; ++frame)
+    decide(kepd, frame <= 100 || frame == 126, 0, true, reasons);
   for (const Word32 field : std::bit_cast<std::array<Word32, 9>>(kepd)) EXPECT_NE(field, 0);
   log.take();
   EXPECT_EQ(KEPDfunc_Reset(&handle), 0);
@@ -103,7 +109,7 @@ TEST_F(KepdTest, ForgetsTheOpenUtteranceButNotItsOwnAge) {
 
   kepd.in_speech = 1;
   kepd.onset_cnt = kepd.speech_frames = kepd.frame_cnt = MAX_32;
-  EXPECT_EQ(decide(kepd, true, 0, false), kSpeech);
+  EXPECT_EQ(decide(kepd, true, 0, false, reasons), kSpeech);
   for (const Word32 age : {kepd.onset_cnt, kepd.speech_frames, kepd.frame_cnt})
     EXPECT_EQ(age, MAX_32) << "counters stop at their end";
 }
@@ -112,7 +118,7 @@ TEST_F(KepdTest, TellsANullRecord) {
   EpdInstance *none = nullptr;
   Flags flags;
   EXPECT_EQ(InitKEPD(&none), -1);
-  EXPECT_EQ(KEPDfunc(flags, &none, nullptr, 0), -1);
+  EXPECT_EQ(KEPDfunc(flags, &none, nullptr, 0, reasons), -1);
 }
 
 class NoiseFloor : public KepdTest {
@@ -207,7 +213,7 @@ TEST_F(NoiseFloor, SwitchesTheGateOnAfterFortyFiveSpeechFrames) {
     vad.blk_count = blocks;
     vad.blk_frames = 24;
     Flags flags;
-    EXPECT_EQ(KEPDfunc(flags, &handle, silence, 0), kNoSpeech);
+    EXPECT_EQ(KEPDfunc(flags, &handle, silence, 0, reasons), kNoSpeech);
     EXPECT_EQ(vad.blk_count, blocks + 1);
     return vad.energy_th;
   };

@@ -33,9 +33,11 @@ public:
     state.blk_frames = state.blk_count = 0;
     state.energy_th = state.blk_acc = state.blk_mean = state.speech_level = 0;
   }
-  Word32 judge(const Word16 *frame) { return VelmoraVAD(flags_, &pointer_, frame, band_); }
+  Word32 judge(const Word16 *frame) {
+    return VelmoraVAD(flags_, &pointer_, frame, band_, reasons_);
+  }
   Word32 gated(const Word16 *frame, float score) {
-    return processVelmoraVAD(flags_, &pointer_, frame, &score, band_);
+    return processVelmoraVAD(flags_, &pointer_, frame, &score, band_, reasons_);
   }
   int samples() const { return band_ == 0 ? 160 : 80; }
 
@@ -44,6 +46,7 @@ public:
 private:
   Flags flags_;
   VelmoraVadState *pointer_ = &state;
+  EpdReasons reasons_{};
   Word32 band_;
 };
 
