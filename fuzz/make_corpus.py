@@ -149,6 +149,30 @@ def utterance_stream():
     yield "refused_padding", detector + settings(before=-1) + speech
 
 
+def enhancement_stream():
+    chunk = lambda audio, room=AUDIO: bytes([room]) + audio
+    speech = [constant(400, 3), noise(3000), voice(4000), constant(800, 0), voice(4000, period=80),
+              noise(2000), voice(2000, 32767), literal(1, 2, 3, 4)]
+    # Bits of a choice: level, microphones - 1, which suppression, aligned.
+    choice = lambda db, mics=1, level=0, aligned=1: level + 2 * (mics - 1) + 4 * db + 12 * aligned
+    for name, settings in {"one": choice(1), "strong": choice(2, level=1), "passed": choice(0),
+                           "levelled": choice(0, level=1), "late": choice(1, aligned=0),
+                           "late_level": choice(1, 1, 1, 0), "two": choice(1, 2),
+                           "two_level": choice(1, 2, 1), "two_late": choice(1, 2, 0, 0),
+                           "first_of_two": choice(0, 2), "refused": choice(2, 2)}.items():
+        yield name, bytes([settings, 99]) + b"".join(map(chunk, speech))
+    yield "full_scale", bytes([choice(1, 2, 1), 0]) + b"".join(map(chunk, [
+        constant(4000, -32768), noise(4000, 32767), literal(*[32767, -32768] * 120)]))
+    tiny = [literal(*range(1, n)) for n in (2, 2, 1, 160, 3, 200, 100, 48, 113)] * 3
+    for mics in (1, 2):
+        yield f"tiny_{mics}", bytes([choice(1, mics, 1), 7]) + b"".join(
+            chunk(audio, 47 * i % 256) for i, audio in enumerate(tiny))
+    yield "short", bytes([choice(1), 0]) + chunk(literal(1000))
+    yield "half_a_pair", bytes([choice(1, 2), 255]) + chunk(literal(1000))
+    yield "nothing", bytes([choice(1, 2, 1, 0), 0])
+    yield "any_settings", b"\xff" + b"".join(map(number, [1, 13, 2, 1]))
+
+
 def wav(data, code=1, channels=1, rate=16000, bits=16, promised=None):
     block = channels * bits // 8
     form = struct.pack("<HHIIHH", code, channels, rate, rate * block % (1 << 32), block, bits)
@@ -189,7 +213,7 @@ def audio_source():
 
 
 corpus = pathlib.Path(__file__).parent / "corpus"
-for target in (epd_frame, mcra_frame, ns_frame, utterance_stream, audio_source):
+for target in (enhancement_stream, epd_frame, mcra_frame, ns_frame, utterance_stream, audio_source):
     folder = corpus / target.__name__
     folder.mkdir(parents=True, exist_ok=True)
     for name, content in target():

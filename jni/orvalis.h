@@ -13,7 +13,8 @@
  *
  * ONE TWO-MICROPHONE SUPPRESSOR A PROCESS: all instances created with micCount 2 share one state.
  * Creating a second one starts the first one afresh, and their calls must not be interleaved or
- * overlap. Every other instance is independent of all others.
+ * overlap. Every other instance is independent of all others, and so is each enhancement stream
+ * (enhancement_stream.h), with two microphones too.
  *
  *
  * A worked example: feed a recording frame by frame, print where the answer changes
@@ -194,6 +195,8 @@ NsInstance *InitializeDoNS(int32_t mode, int32_t micCount, int32_t unused);
 
 /*
  * Suppresses the noise of numIn samples, whole frames. numOut must be equal to numIn.
+ *
+ * The enhancement stream of enhancement_stream.h does by itself what is asked of the caller here.
  *
  * Fill `out` before the call, as a rule with the input delayed as above: a frame that is not
  * suppressed leaves its part of `out` as it is. These are frames with more than 60 zero samples in

@@ -1,0 +1,136 @@
+// The enhancement stream: any settings, cuts, rooms and audio.
+#include "stream/enhancement_stream.h"
+
+#include <algorithm>
+#include <cstring>
+#include <type_traits>
+
+#include "fuzz/input.h"
+#include "jni/orvalis.h"
+
+namespace {
+
+using orvalis::fuzz::Input;
+using orvalis::fuzz::require;
+using Samples = std::vector<std::int16_t>;
+
+constexpr std::size_t kMostSamples = 24000;
+constexpr std::int16_t kGuard = 12345;
+
+/// A stream with all that came out of it.
+class Enhancer {
+public:
+  explicit Enhancer(const EnhancementSettings &settings)
+      : settings_(settings), stream_(OpenEnhancementStream(&settings)) {
+    require(stream_ != nullptr, "valid settings open a stream");
+  }
+  ~Enhancer() { require(CloseEnhancementStream(stream_) == 0, "a stream is released"); }
+  Enhancer(const Enhancer &) = delete;
+  Enhancer &operator=(const Enhancer &) = delete;
+
+  const Samples &output() const { return output_; }
+
+  EnhancementCounts counts() const {
+    EnhancementCounts counts;
+    require(GetEnhancementCounts(stream_, &counts) == 0, "counts are told");
+    return counts;
+  }
+
+  /// Tries little room first.
+  void push(const Samples &audio, std::int32_t room) {
+    const auto count = static_cast<std::int32_t>(audio.size());
+    const auto into = [&](std::int16_t *out, std::int32_t size) {
+      return PushEnhancementAudio(stream_, audio.data(), count, out, size);
+    };
+    if (!gives(room, into))
+      require(gives(count / settings_.microphones + 160, into), "a push has the room it needs");
+    pushed_ += count;
+  }
+
+  void flush(std::int32_t room) {
+    const auto into = [&](std::int16_t *out, std::int32_t size) {
+      return FlushEnhancementStream(stream_, out, size);
+    };
+    if (pushed_ % settings_.microphones != 0) {
+      require(!gives(ENHANCEMENT_HELD_BACK, into), "half a pair is not flushed");
+      push({1}, 0);
+    }
+    if (!gives(room, into))
+      require(gives(ENHANCEMENT_HELD_BACK, into), "a flush has the room it needs");
+    require(gives(0, into), "nothing is left after a flush");
+    const std::int16_t sample = 1;
+    require(PushEnhancementAudio(stream_, &sample, 1, nullptr, 0) == -1,
+            "no audio is taken after the flush");
+    const std::int64_t n = pushed_ / settings_.microphones;
+    const std::int64_t front = settings_.aligned == 1 || n == 0 ? 0 : EnhancementDelay(stream_);
+    require(static_cast<std::int64_t>(output_.size()) == n + front,
+            "the output has the length of the input");
+  }
+
+private:
+  /// False if the room was refused, in which nothing may have been written then.
+  template <class Into>
+  bool gives(std::int32_t room, Into into) {
+    Samples out(static_cast<std::size_t>(room) + 1, kGuard);
+    const std::int32_t ready = into(out.data(), room);
+    require(ready >= -1 && ready <= room, "no more comes out than there is room");
+    require(
+        std::all_of(out.begin() + std::max(ready, 0), out.end(), [](int x) { return x == kGuard; }),
+        "nothing is written beyond what is told");
+    if (ready < 0) return false;
+    output_.insert(output_.end(), out.begin(), out.begin() + ready);
+    return true;
+  }
+
+  EnhancementSettings settings_;
+  EnhancementStream *stream_;
+  std::int64_t pushed_ = 0;
+  Samples output_;
+};
+
+/// One byte for all that is valid, and some that is not; 255 for any.
+EnhancementSettings read_settings(Input &input) {
+  constexpr std::int32_t kSuppressions[] = {0, 13, 18};
+  const std::uint8_t choice = input.byte();
+  if (choice == 255) return {input.number(), input.number(), input.number(), input.number()};
+  return {1 + choice / 2 % 2, kSuppressions[choice / 4 % 3], choice % 2, choice / 12 % 2};
+}
+
+bool is_valid(const EnhancementSettings &settings) {
+  const auto is_one_of = [](std::int32_t value, std::initializer_list<std::int32_t> values) {
+    return std::find(values.begin(), values.end(), value) != values.end();
+  };
+  return is_one_of(settings.microphones, {1, 2}) &&
+         is_one_of(settings.suppression_db, {0, 13, settings.microphones == 1 ? 18 : 0}) &&
+         is_one_of(settings.level, {0, 1}) && is_one_of(settings.aligned, {0, 1});
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
+  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  Input input(bytes, size);
+  const EnhancementSettings settings = read_settings(input);
+  if (!is_valid(settings)) {
+    require(OpenEnhancementStream(&settings) == nullptr, "settings out of range are refused");
+    return 0;
+  }
+
+  Enhancer cut(settings), whole(settings);
+  Samples heard;
+  const std::uint8_t room_at_end = input.byte();
+  while (!input.is_empty() && heard.size() < kMostSamples) {
+    const std::uint8_t room = input.byte();
+    const Samples audio = input.audio();
+    heard.insert(heard.end(), audio.begin(), audio.end());
+    cut.push(audio, room);
+  }
+  cut.flush(room_at_end);
+  whole.push(heard, 0);
+  whole.flush(0);
+  require(cut.output() == whole.output(), "no sample is lost or depends on the cut");
+  static_assert(std::has_unique_object_representations_v<EnhancementCounts>);
+  const EnhancementCounts counts = cut.counts(), expected = whole.counts();
+  require(std::memcmp(&counts, &expected, sizeof counts) == 0, "no count depends on the cut");
+  return 0;
+}
