@@ -24,7 +24,7 @@ namespace {
 
 struct EnhanceOptions {
   std::vector<std::string> inputs;  ///< The last one is the output, until the work begins
-  EnhancementSettings work;
+  PathSettings work;
   std::string format;
   std::string report = "table";
   std::size_t jobs = 1;
@@ -32,7 +32,7 @@ struct EnhanceOptions {
 };
 
 int run(EnhanceOptions &options) {
-  EnhancementSettings &work = options.work;
+  PathSettings &work = options.work;
   std::string destination = options.inputs.back();
   options.inputs.pop_back();
   if (destination == "/dev/stdout") destination = "-";  // what is printed must not get between
@@ -48,14 +48,9 @@ int run(EnhanceOptions &options) {
   }
   SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
   work.audio.wide_only = true;
-  work.audio.pair = work.noise.microphones == 2;
-  work.noise.aligned = !options.not_aligned;
+  work.audio.pair = work.enhancement.microphones == 2;
+  work.enhancement.aligned = options.not_aligned ? 0 : 1;
   work.split.replace = work.replace;
-  if (work.audio.pair && options.jobs > 1 && options.inputs.size() > 1) {
-    print_error("with --mics 2 one file comes after the other: there is one such suppressor");
-    options.jobs = 1;
-  }
-
   return work_files(options.inputs, {.jobs = options.jobs},
                     [&](std::size_t job, Turn &turn, const Advanced &advanced) {
                       const std::string &name = options.inputs[job];
@@ -118,7 +113,7 @@ CLI::App *add_command(CLI::App &app, const char *name, const char *summary, cons
                       const std::shared_ptr<EnhanceOptions> &options, int &exit_status) {
   CLI::App *command = app.add_subcommand(name, summary);
   command->footer(std::string(kInputAndOutput).substr(1) + notes);
-  EnhancementSettings &work = options->work;
+  PathSettings &work = options->work;
   command
       ->add_option("FILE", options->inputs,
                    "Inputs, \"-\" for standard input; then the output:\n"
@@ -139,22 +134,22 @@ CLI::App *add_command(CLI::App &app, const char *name, const char *summary, cons
   CLI::Option *channel =
       add_audio_options(*command, work.audio, "Channel to work on, from 1, of several");
   command->add_flag("--mix", work.mix, "Work on the mean of several channels")->excludes(channel);
-  if (work.denoise) {
+  if (work.enhancement.suppression_db > 0) {
     command
-        ->add_option("--level", work.noise.level_db,
+        ->add_option("--level", work.enhancement.suppression_db,
                      "Suppression of one microphone in dB: 13 or 18")
         ->check(CLI::IsMember({13, 18}).description(""))
         ->type_name("DB")
         ->capture_default_str();
     command
-        ->add_option("--mics", work.noise.microphones,
+        ->add_option("--mics", work.enhancement.microphones,
                      "Microphones, 1 or 2; two are two channels,\nand the first one is cleaned")
         ->check(from_to(1, 2))
         ->type_name("N")
         ->capture_default_str();
   }
   command->callback([options, command, &exit_status] {
-    if (options->work.noise.microphones == 2)
+    if (options->work.enhancement.microphones == 2)
       for (const char *of_one : {"--level", "--channel", "--mix"})
         if (command->count(of_one) > 0) throw CLI::ExcludesError("--mics 2", of_one);
     exit_status = run(*options);
@@ -166,18 +161,19 @@ CLI::App *add_command(CLI::App &app, const char *name, const char *summary, cons
 
 void add_enhance_commands(CLI::App &app, int &exit_status) {
   const auto denoise = std::make_shared<EnhanceOptions>();
-  denoise->work.denoise = true;
   add_command(app, "denoise", "Take the noise from speech", kDenoiseNotes, denoise, exit_status)
       ->add_flag("--no-align", denoise->not_aligned,
                  "Keep the suppressor's delay: 48 samples,\n160 with two microphones");
 
   const auto level = std::make_shared<EnhanceOptions>();
-  level->work.level = true;
+  level->work.enhancement.suppression_db = 0;
+  level->work.enhancement.level = 1;
   add_command(app, "level", "Level recorded speech: dynamics control", kLevelNotes, level,
               exit_status);
 
   const auto process = std::make_shared<EnhanceOptions>();
-  process->work.denoise = process->work.level = process->work.detect = true;
+  process->work.enhancement.level = 1;
+  process->work.detect = true;
   CLI::App *command =
       add_command(app, "process", "Denoise, level, and find the utterances of the result",
                   kProcessNotes, process, exit_status);

@@ -9,8 +9,7 @@
 
 #include "cli/audio_output.h"
 #include "cli/audio_source.h"
-#include "cli/clipping_meter.h"
-#include "cli/level_stage.h"
+#include "cli/enhancement_stage.h"
 #include "cli/rate_stage.h"
 
 namespace orvalis::cli {
@@ -18,40 +17,38 @@ namespace {
 
 constexpr int kEngineRate = 16000;
 
-struct Findings {
-  Occurrences clipped_in, loud_frames, clipped_out;
-};
-
-void refuse_unclear_channels(const AudioSource &source, const EnhancementSettings &settings) {
+void refuse_unclear_channels(const AudioSource &source, const PathSettings &settings) {
   const int channels = source.source_channels();
   if (channels == 1 || settings.audio.pair || settings.audio.channel > 0 || settings.mix) return;
-  throw AudioError(
-      fmt::format("there are {} channels: average them with --mix, or pick one with "
-                  "--channel N{}",
-                  channels, settings.denoise ? ", or clean two microphones with --mics 2" : ""));
+  throw AudioError(fmt::format(
+      "there are {} channels: average them with --mix, or pick one with "
+      "--channel N{}",
+      channels,
+      settings.enhancement.suppression_db > 0 ? ", or clean two microphones with --mics 2" : ""));
 }
 
 double seconds(std::int64_t samples) { return static_cast<double>(samples) / kEngineRate; }
 
-void tell_findings(const Findings &found, const std::function<void(const std::string &)> &tell) {
-  const auto tell_clipped = [&](const Occurrences &clipped, const char *where) {
+void tell_counts(const EnhancementCounts &counts,
+                 const std::function<void(const std::string &)> &tell) {
+  const auto tell_clipped = [&](const EnhancementCount &clipped, const char *where) {
     if (clipped.count > 0)
       tell(fmt::format("samples of the {} at full scale: {}, the first at {:.3f} s", where,
                        clipped.count, seconds(clipped.first)));
   };
-  tell_clipped(found.clipped_in, "input");
-  if (found.loud_frames.count > 0)
+  tell_clipped(counts.clipped_in, "input");
+  if (counts.loud_frames.count > 0)
     tell(fmt::format("loud for {:.2f} s, first at {:.2f} s",
-                     static_cast<double>(found.loud_frames.count) / 100,
-                     seconds(found.loud_frames.first)));
-  tell_clipped(found.clipped_out, "output");
+                     static_cast<double>(counts.loud_frames.count) / 100,
+                     seconds(counts.loud_frames.first)));
+  tell_clipped(counts.clipped_out, "output");
 }
 
 }  // namespace
 
-void enhance(const std::string &input, const PlannedOutput &output,
-             const EnhancementSettings &settings, Report &report,
-             const std::function<void(const std::string &)> &tell, const Advanced &advanced) {
+void enhance(const std::string &input, const PlannedOutput &output, const PathSettings &settings,
+             Report &report, const std::function<void(const std::string &)> &tell,
+             const Advanced &advanced) {
   const auto began = Progress::Clock::now();
   AudioSource source(input, settings.audio);
   refuse_unclear_channels(source, settings);
@@ -62,15 +59,10 @@ void enhance(const std::string &input, const PlannedOutput &output,
     tell(fmt::format("written at {} Hz, converted from {} Hz (--keep-rate converts back)", rate,
                      own_rate));
 
-  Findings found;
   Chain chain;
-  if (settings.level)
-    chain.add(std::make_unique<ClippingMeter>(settings.audio.pair ? 2 : 1, found.clipped_in));
-  if (settings.denoise) chain.add(std::make_unique<DenoiseStage>(settings.noise));
-  if (settings.level) {
-    chain.add(std::make_unique<LevelStage>(found.loud_frames));
-    chain.add(std::make_unique<ClippingMeter>(1, found.clipped_out));
-  }
+  auto stage = std::make_unique<EnhancementStage>(settings.enhancement);
+  const EnhancementStage &enhancement = *stage;
+  chain.add(std::move(stage));
   if (settings.detect) {
     auto excerpts = settings.split.folder.empty() ? nullptr : make_heard_excerpts(kEngineRate);
     chain.add(std::make_unique<DetectorStage>(input, settings.detector, settings.split,
@@ -94,7 +86,7 @@ void enhance(const std::string &input, const PlannedOutput &output,
   // Before the output has its name: what is made of a part must not pass for the whole.
   source.check_complete();
   file->commit();
-  tell_findings(found, tell);
+  if (settings.enhancement.level == 1) tell_counts(enhancement.counts(), tell);
 }
 
 }  // namespace orvalis::cli

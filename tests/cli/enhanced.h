@@ -1,10 +1,10 @@
 // Audio for the commands that give audio, and what is to come of it.
 #pragma once
 
+#include <enhancement_stream.h>
 #include <orvalis.h>
-#include <algorithm>
 
-#include <array>
+#include <algorithm>
 #include <string>
 #include <vector>
 
@@ -53,47 +53,21 @@ inline Pcm noisy_pairs() {
   return pairs;
 }
 
-/// Where in audio of that length a sample beyond its end comes from: mirrored, again and again.
-inline std::size_t mirrored(std::size_t at, std::size_t length) {
-  const std::size_t folded = at % (2 * length);
-  return folded < length ? folded : 2 * length - 1 - folded;
-}
-
-/// What the library gives frame by frame, cut to the input's length from sample `skip` on.
-inline Pcm suppressed(const Pcm &input, std::size_t mics, int mode, std::size_t skip) {
-  const std::size_t length = input.size() / mics, delay = mics == 2 ? 160 : 48;
-  NsInstance *ns = InitializeDoNS(mode, static_cast<std::int32_t>(mics), 0);
-  Pcm output;
-  const auto sample = [&](std::size_t at, std::size_t channel) {
-    return input[mirrored(at, length) * mics + channel];
-  };
-  for (std::size_t at = 0; output.size() < (length > 0 ? length + skip : 0); at += 160) {
-    Pcm in, out;
-    for (std::size_t i = 0; i < 160 * mics; ++i) {
-      in.push_back(sample(at + i / mics, i % mics));
-      const std::size_t now = at + i / mics;
-      out.push_back(now < delay ? std::int16_t{0} : sample(now - delay, 0));
-    }
-    const auto count = static_cast<std::int32_t>(in.size());
-    ProcessDoNSFrame(ns, in.data(), count, out.data(), count);
-    for (std::size_t i = 0; i < out.size(); i += mics) output.push_back(out[i]);
-  }
-  FreeMemoryNS(ns);
-  output.erase(output.begin(), output.begin() + static_cast<std::ptrdiff_t>(length > 0 ? skip : 0));
-  output.resize(length);
+/// What the library's stream gives.
+inline Pcm enhanced(const EnhancementSettings &settings, const Pcm &input) {
+  EnhancementStream *stream = OpenEnhancementStream(&settings);
+  Pcm output(input.size() + ENHANCEMENT_HELD_BACK);
+  const auto room = static_cast<std::int32_t>(output.size());
+  const auto count = static_cast<std::int32_t>(input.size());
+  std::int32_t ready = PushEnhancementAudio(stream, input.data(), count, output.data(), room);
+  ready += FlushEnhancementStream(stream, output.data() + ready, room - ready);
+  CloseEnhancementStream(stream);
+  output.resize(static_cast<std::size_t>(ready));
   return output;
 }
 
-/// What dynamics control gives.
-inline Pcm levelled(Pcm samples) {
-  const std::int64_t drc = InitializeDRC(16000, 0);
-  const std::size_t length = samples.size();
-  while (samples.size() % 160 != 0) samples.push_back(samples[mirrored(samples.size(), length)]);
-  for (std::size_t at = 0; at < samples.size(); at += 160) ProcessDRC(drc, &samples[at], 160);
-  FreeMemoryDRC(drc);
-  samples.resize(length);
-  return samples;
-}
+constexpr EnhancementSettings kDenoise = ENHANCEMENT_SETTINGS_DEFAULT, kStrong = {1, 18, 0, 1},
+                              kLate = {1, 13, 0, 0}, kTwo = {2, 13, 0, 1}, kLevel = {1, 0, 1, 1};
 
 class Enhanced : public Tool {
 protected:

@@ -27,7 +27,7 @@ TEST_F(Outputs, FormatFollowsNameOrOption) {
                 {"a.opus", "", SF_FORMAT_OGG | SF_FORMAT_OPUS},
                 {"b", "--format flac ", SF_FORMAT_FLAC | SF_FORMAT_PCM_16},
                 {"b.wav", "--format au ", SF_FORMAT_AU | SF_FORMAT_PCM_16}};
-  const Pcm expected = levelled(load_recording(kWide));
+  const Pcm expected = enhanced(kLevel, load_recording(kWide));
   for (const auto &[name, options, format] : kCases) {
     const std::string file = folder_ / name;
     EXPECT_EQ(run("level " + std::string(options) + kWide + " " + file).status, 0) << name;
