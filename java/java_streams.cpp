@@ -1,5 +1,5 @@
-// The natives behind the safe Java classes: the utterance stream, and log lines on their way to
-// Java. Registered when the library is loaded, so that no name of them is exported.
+// The natives behind the safe Java classes: both streams, and log lines on their way to Java.
+// Registered when the library is loaded, so that no name of them is exported.
 #include <jni.h>
 
 #include <algorithm>
@@ -8,6 +8,7 @@
 
 #include "Voice_Engine/platform/log.h"
 #include "jni/orvalis.h"
+#include "stream/enhancement_stream.h"
 #include "stream/utterance_stream.h"
 
 namespace {
@@ -30,15 +31,21 @@ jlong JNICALL open_stream(JNIEnv *, jclass, jint rate_hz, jint input_gain, jint 
   return reinterpret_cast<intptr_t>(OpenUtteranceStream(&settings));
 }
 
+/// Samples that cross from Java at a time.
+constexpr jint kPiece = 1024;
+
+bool holds(JNIEnv *env, jshortArray pcm, jint offset, jint count) {
+  return pcm != nullptr && offset >= 0 && count >= 0 && offset <= env->GetArrayLength(pcm) - count;
+}
+
 /// How many of the samples were taken; -1 if they are not all in the array, or after the flush.
 jint JNICALL push_audio(JNIEnv *env, jclass, jlong stream, jshortArray pcm, jint offset,
                         jint count) {
-  if (pcm == nullptr || offset < 0 || count < 0 || offset > env->GetArrayLength(pcm) - count)
-    return -1;
-  jshort piece[1024];
+  if (!holds(env, pcm, offset, count)) return -1;
+  jshort piece[kPiece];
   jint done = 0;
   while (done < count) {
-    const jint samples = std::min<jint>(count - done, std::size(piece));
+    const jint samples = std::min(count - done, kPiece);
     env->GetShortArrayRegion(pcm, offset + done, samples, piece);
     const jint taken = PushUtteranceAudio(stream_of(stream), piece, samples);
     if (taken < 0) return -1;
@@ -66,6 +73,61 @@ jint JNICALL flush_stream(JNIEnv *, jclass, jlong stream) {
 
 jint JNICALL close_stream(JNIEnv *, jclass, jlong stream) {
   return CloseUtteranceStream(stream_of(stream));
+}
+
+EnhancementStream *enhancement_of(jlong handle) {
+  return reinterpret_cast<EnhancementStream *>(static_cast<intptr_t>(handle));
+}
+
+jlong JNICALL open_enhancement(JNIEnv *, jclass, jint microphones, jint suppression_db,
+                               jboolean level, jboolean aligned) {
+  const EnhancementSettings settings = {.microphones = microphones,
+                                        .suppression_db = suppression_db,
+                                        .level = level,
+                                        .aligned = aligned};
+  return reinterpret_cast<intptr_t>(OpenEnhancementStream(&settings));
+}
+
+jint JNICALL enhancement_delay(JNIEnv *, jclass, jlong stream) {
+  return EnhancementDelay(enhancement_of(stream));
+}
+
+/// How many samples of output there were; -1 if the samples are not all in the array, or after the
+/// flush.
+jint JNICALL enhance(JNIEnv *env, jclass, jlong stream, jshortArray pcm, jint offset, jint count,
+                     jshortArray output) {
+  if (!holds(env, pcm, offset, count)) return -1;
+  jshort in[kPiece], out[kPiece + ENHANCEMENT_HELD_BACK];
+  jint done = 0, ready = 0;
+  do {
+    const jint samples = std::min(count - done, kPiece);
+    env->GetShortArrayRegion(pcm, offset + done, samples, in);
+    const jint given =
+        PushEnhancementAudio(enhancement_of(stream), in, samples, out, std::size(out));
+    if (given < 0) return -1;
+    env->SetShortArrayRegion(output, ready, given, out);
+    done += samples;
+    ready += given;
+  } while (done < count);
+  return ready;
+}
+
+/// How many samples of output were left; -1 if half a pair waits.
+jint JNICALL flush_enhancement(JNIEnv *env, jclass, jlong stream, jshortArray output) {
+  jshort out[ENHANCEMENT_HELD_BACK];
+  const jint ready = FlushEnhancementStream(enhancement_of(stream), out, std::size(out));
+  if (ready > 0) env->SetShortArrayRegion(output, 0, ready, out);
+  return ready;
+}
+
+jboolean JNICALL is_loud(JNIEnv *, jclass, jlong stream) {
+  EnhancementCounts counts = {};
+  GetEnhancementCounts(enhancement_of(stream), &counts);
+  return counts.is_loud == 1;
+}
+
+jint JNICALL close_enhancement(JNIEnv *, jclass, jlong stream) {
+  return CloseEnhancementStream(enhancement_of(stream));
 }
 
 // Where lines go that are meant for Java. Set before the first of them, and then kept.
@@ -140,6 +202,12 @@ extern "C" JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *machine, void *) {
       native("nextUtterance", "(J[J)I", address(next_utterance)),
       native("flushStream", "(J)I", address(flush_stream)),
       native("closeStream", "(J)I", address(close_stream)),
+      native("openEnhancement", "(IIZZ)J", address(open_enhancement)),
+      native("enhancementDelay", "(J)I", address(enhancement_delay)),
+      native("enhance", "(J[SII[S)I", address(enhance)),
+      native("flushEnhancement", "(J[S)I", address(flush_enhancement)),
+      native("isLoud", "(J)Z", address(is_loud)),
+      native("closeEnhancement", "(J)I", address(close_enhancement)),
       native("setLogDestination", "(I)V", address(set_log_destination)),
   };
   // An application that brings a Loquent of its own, without the safe classes, is served all the

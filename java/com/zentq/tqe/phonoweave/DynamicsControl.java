@@ -9,23 +9,14 @@ package com.zentq.tqe.phonoweave;
  * is forgotten rather than closed is released when another one is made.
  */
 public final class DynamicsControl implements AutoCloseable {
-  private static final int RATE_HZ = 16000;
-  private static final int FRAME = 160;
-
-  private final NativeHandle handle;
-  private final FrameCutter cutter = new FrameCutter(FRAME, 1);
-  private boolean loud;
+  private final EnhancementStream stream = new EnhancementStream(this, 1, 0, true, true);
 
   /**
    * Creates a dynamics control.
    *
    * @throws IllegalStateException if memory runs out
    */
-  public DynamicsControl() {
-    NativeLibrary.load();
-    NativeHandle.releaseForgotten();
-    handle = new NativeHandle(this, Loquent.initializeDRC(RATE_HZ, 0), Loquent::freeMemoryDRC);
-  }
+  public DynamicsControl() {}
 
   /** As {@link #push(short[], int, int)} with the whole array. */
   public short[] push(short[] pcm) {
@@ -40,10 +31,7 @@ public final class DynamicsControl implements AutoCloseable {
    * @throws IllegalStateException after the flush or after close
    */
   public short[] push(short[] pcm, int offset, int count) {
-    synchronized (handle) {
-      handle.address();
-      return cutter.push(pcm, offset, count, this::level);
-    }
+    return stream.push(pcm, offset, count);
   }
 
   /**
@@ -52,10 +40,7 @@ public final class DynamicsControl implements AutoCloseable {
    * @throws IllegalStateException after close
    */
   public short[] flush() {
-    synchronized (handle) {
-      handle.address();
-      return cutter.flush(0, this::level);
-    }
+    return stream.flush();
   }
 
   /**
@@ -63,19 +48,12 @@ public final class DynamicsControl implements AutoCloseable {
    * ten frames, the newest counted twice, beyond a quarter of full scale.
    */
   public boolean isLoud() {
-    synchronized (handle) {
-      return loud;
-    }
+    return stream.isLoud();
   }
 
   /** Releases the dynamics control. Does nothing the second time. */
   @Override
   public void close() {
-    handle.close();
-  }
-
-  private void level(short[] audio, int at, short[] out) {
-    System.arraycopy(audio, at, out, 0, out.length);
-    loud = Loquent.processDRC(handle.address(), out, out.length) == 1;
+    stream.close();
   }
 }

@@ -122,7 +122,7 @@ public final class EndPointDetector implements AutoCloseable {
    * @throws IllegalStateException after the flush or after close
    */
   public List<Utterance> push(short[] pcm, int offset, int count) {
-    FrameCutter.checkRange(pcm, offset, count);
+    SafeLayer.checkRange(pcm, offset, count);
     synchronized (handle) {
       long stream = handle.address();
       if (flushed) throw new IllegalStateException("pushed after the flush");

@@ -86,8 +86,8 @@ public final class Loquent {
   public static native int freeMemoryEPD(long handle);
 
   /**
-   * Creates a noise suppressor for 16 kHz. All suppressors of two microphones share one state: have
-   * only one of them.
+   * Creates a noise suppressor for 16 kHz. All suppressors of two microphones that are made here share
+   * one state: have only one of them, or use {@link NoiseSuppressor}.
    *
    * @param mode for one microphone 0 (13 dB) or 2 (18.4 dB); not used for two
    * @param microphones 1: frames of 160 samples, output 48 samples late; 2: frames of 160 pairs,

@@ -1,7 +1,5 @@
 package com.zentq.tqe.phonoweave;
 
-import java.util.concurrent.atomic.AtomicBoolean;
-
 /**
  * Suppresses the noise of 16 kHz audio that comes in pieces of any length. The output, taken
  * together, does not depend on how the audio was cut.
@@ -27,33 +25,23 @@ public final class NoiseSuppressor implements AutoCloseable {
   /** How much one microphone's noise is lowered. */
   public enum Strength {
     /** By 13 dB. */
-    NORMAL(0),
+    NORMAL(13),
     /** By 18.4 dB. */
-    STRONG(2);
+    STRONG(18);
 
-    private final int mode;
+    private final int db;
 
-    Strength(int mode) {
-      this.mode = mode;
+    Strength(int db) {
+      this.db = db;
     }
   }
 
-  private static final int FRAME = 160;
+  private final EnhancementStream stream;
+  private final int microphones;
 
-  /** The engine has one state for all suppressors of two microphones. */
-  private static final AtomicBoolean TWO_MICROPHONES = new AtomicBoolean();
-
-  private final NativeHandle handle;
-  private final FrameCutter cutter;
-  private final int delay;
-  private final short[] in;
-
-  private NoiseSuppressor(
-      int mode, int microphones, int delayPerMicrophone, NativeHandle.Release release) {
-    handle = new NativeHandle(this, Loquent.initializeDoNS(mode, microphones, 0), release);
-    cutter = new FrameCutter(FRAME * microphones, microphones);
-    delay = delayPerMicrophone * microphones;
-    in = new short[FRAME * microphones];
+  private NoiseSuppressor(int microphones, int suppressionDb) {
+    this.stream = new EnhancementStream(this, microphones, suppressionDb, false, false);
+    this.microphones = microphones;
   }
 
   /**
@@ -63,43 +51,22 @@ public final class NoiseSuppressor implements AutoCloseable {
    */
   public static NoiseSuppressor forOneMicrophone(Strength strength) {
     if (strength == null) throw new IllegalArgumentException("no strength");
-    NativeLibrary.load();
-    NativeHandle.releaseForgotten();
-    return new NoiseSuppressor(strength.mode, 1, 48, Loquent::freeMemoryDoNS);
+    return new NoiseSuppressor(1, strength.db);
   }
 
   /**
-   * The suppressor for two microphones, whose samples are interleaved. Both channels of suppressed
-   * audio are the same.
+   * A suppressor for two microphones, whose samples are interleaved. Both channels of its output are
+   * the same: the first one, cleaned.
    *
-   * @throws IllegalStateException if memory runs out, or if there is one already: only one may be
-   *     open in a process
+   * @throws IllegalStateException if memory runs out
    */
   public static NoiseSuppressor forTwoMicrophones() {
-    NativeLibrary.load();
-    NativeHandle.releaseForgotten();
-    if (!TWO_MICROPHONES.compareAndSet(false, true)) {
-      throw new IllegalStateException("another suppressor of two microphones is open");
-    }
-    boolean made = false;
-    try {
-      NoiseSuppressor suppressor =
-          new NoiseSuppressor(0, 2, FRAME, NoiseSuppressor::freeTwoMicrophones);
-      made = true;
-      return suppressor;
-    } finally {
-      if (!made) TWO_MICROPHONES.set(false);
-    }
-  }
-
-  private static void freeTwoMicrophones(long address) {
-    Loquent.freeMemoryDoNS(address);
-    TWO_MICROPHONES.set(false);
+    return new NoiseSuppressor(2, Strength.NORMAL.db);
   }
 
   /** By how many samples the output is late: 48, or 320 (160 pairs) with two microphones. */
   public int delaySamples() {
-    return delay;
+    return microphones * stream.delay();
   }
 
   /** As {@link #push(short[], int, int)} with the whole array. */
@@ -115,10 +82,7 @@ public final class NoiseSuppressor implements AutoCloseable {
    * @throws IllegalStateException after the flush or after close
    */
   public short[] push(short[] pcm, int offset, int count) {
-    synchronized (handle) {
-      handle.address();
-      return cutter.push(pcm, offset, count, this::suppress);
-    }
+    return toChannels(stream.push(pcm, offset, count));
   }
 
   /**
@@ -127,22 +91,20 @@ public final class NoiseSuppressor implements AutoCloseable {
    * @throws IllegalStateException after close, or if half a pair of samples is left
    */
   public short[] flush() {
-    synchronized (handle) {
-      handle.address();
-      return cutter.flush(delay, this::suppress);
-    }
+    return toChannels(stream.flush());
   }
 
   /** Releases the suppressor. Does nothing the second time. */
   @Override
   public void close() {
-    handle.close();
+    stream.close();
   }
 
-  private void suppress(short[] audio, int at, short[] out) {
-    System.arraycopy(audio, at, in, 0, in.length);
-    // What the engine leaves alone is to come out late all the same.
-    System.arraycopy(audio, at - delay, out, 0, out.length);
-    Loquent.processDoNSFrame(handle.address(), in, in.length, out, out.length);
+  /** As many channels as came in. */
+  private short[] toChannels(short[] samples) {
+    if (microphones == 1) return samples;
+    short[] pairs = new short[2 * samples.length];
+    for (int i = 0; i < pairs.length; ++i) pairs[i] = samples[i / 2];
+    return pairs;
   }
 }

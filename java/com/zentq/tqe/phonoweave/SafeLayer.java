@@ -9,7 +9,21 @@ final class SafeLayer {
   static final int LOG_OFF = 1;
   static final int LOG_TO_JAVA = 2;
 
+  /** Room that the output of a push may need beyond its input. */
+  static final int MOST_BEYOND_A_PUSH = 160;
+
+  static final int MOST_OF_A_FLUSH = 319;
+
   private SafeLayer() {}
+
+  /** Throws if the samples are not all in the array. */
+  static void checkRange(short[] pcm, int offset, int count) {
+    if (pcm == null) throw new IllegalArgumentException("no samples");
+    if (offset < 0 || count < 0 || offset > pcm.length - count) {
+      throw new IllegalArgumentException(
+          count + " samples from " + offset + " on, in an array of " + pcm.length);
+    }
+  }
 
   /** 0 if memory runs out or a setting is out of range. */
   static native long openStream(
@@ -29,6 +43,22 @@ final class SafeLayer {
   static native int flushStream(long stream);
 
   static native int closeStream(long stream);
+
+  /** 0 if memory runs out or a setting is out of range. */
+  static native long openEnhancement(
+      int microphones, int suppressionDb, boolean level, boolean aligned);
+
+  static native int enhancementDelay(long stream);
+
+  /** How many samples of output there were; -1 after the flush. */
+  static native int enhance(long stream, short[] pcm, int offset, int count, short[] out);
+
+  /** How many samples of output were left; -1 if half a pair waits. */
+  static native int flushEnhancement(long stream, short[] out);
+
+  static native boolean isLoud(long stream);
+
+  static native int closeEnhancement(long stream);
 
   static native void setLogDestination(int destination);
 

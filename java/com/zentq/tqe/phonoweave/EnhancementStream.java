@@ -1,0 +1,69 @@
+package com.zentq.tqe.phonoweave;
+
+import java.util.Arrays;
+
+/** The library's enhancement stream: suppression and dynamics control of audio cut in any way. */
+final class EnhancementStream {
+  private final NativeHandle handle;
+  private final int microphones;
+  private final int delay;
+  private boolean loud;
+
+  /**
+   * Opens a stream, which is released when its owner is forgotten.
+   *
+   * @throws IllegalStateException if memory runs out
+   */
+  EnhancementStream(
+      Object owner, int microphones, int suppressionDb, boolean level, boolean aligned) {
+    NativeLibrary.load();
+    NativeHandle.releaseForgotten();
+    long stream = SafeLayer.openEnhancement(microphones, suppressionDb, level, aligned);
+    this.handle = new NativeHandle(owner, stream, SafeLayer::closeEnhancement);
+    this.microphones = microphones;
+    this.delay = SafeLayer.enhancementDelay(stream);
+  }
+
+  /** In samples of a microphone. */
+  int delay() {
+    return delay;
+  }
+
+  /** The output that these samples complete. */
+  short[] push(short[] pcm, int offset, int count) {
+    synchronized (handle) {
+      long stream = handle.address();
+      SafeLayer.checkRange(pcm, offset, count);
+      short[] out = new short[count / microphones + SafeLayer.MOST_BEYOND_A_PUSH];
+      int ready = SafeLayer.enhance(stream, pcm, offset, count, out);
+      if (ready < 0) throw new IllegalStateException("pushed after the flush");
+      loud = SafeLayer.isLoud(stream);
+      return Arrays.copyOf(out, ready);
+    }
+  }
+
+  /** The rest of the output; nothing the second time. */
+  short[] flush() {
+    synchronized (handle) {
+      long stream = handle.address();
+      short[] out = new short[SafeLayer.MOST_OF_A_FLUSH];
+      int ready = SafeLayer.flushEnhancement(stream, out);
+      if (ready < 0) {
+        throw new IllegalStateException("the last sample of one channel has no partner");
+      }
+      loud = SafeLayer.isLoud(stream);
+      return Arrays.copyOf(out, ready);
+    }
+  }
+
+  /** Whether the newest frame was loud. */
+  boolean isLoud() {
+    synchronized (handle) {
+      return loud;
+    }
+  }
+
+  void close() {
+    handle.close();
+  }
+}
