@@ -117,36 +117,39 @@ def settings(rate=0, gain=0, content_type=0, hangover=0, before=0, after=0):
     return bytes([rate]) + b"".join(map(number, [gain, content_type, hangover, before, after]))
 
 
-def script(*runs):
-    """Unvoiced and voiced frames in turn; the first 39 frames are not speech whatever is said."""
-    return bytes([len(runs), *runs])
+def script(text=""):
+    """Decisions like "50o 60s 2n": frames without speech, with speech, of null audio."""
+    runs = [(int(run[:-1]), "osn".index(run[-1])) for run in text.split()]
+    return bytes([len(runs)]) + bytes(64 * kind + frames for frames, kind in runs)
 
 
 def utterance_stream():
-    detector, take = script(), bytes([0])
+    take = bytes([0])
     piece = lambda audio: bytes([AUDIO]) + audio
-    sound, null = (lambda n, v=v: piece(constant(80 * n, v)) for v in (100, 0))
     speech = b"".join(map(piece, [noise(5000), voice(5000), noise(4000), voice(5000, period=80),
                                   noise(4000), literal(1, 2, 3)]))
     for rate in (0, 1):
         for content_type in (0, 2):
             yield f"speech_{rate}_{content_type}", (
-                detector + settings(rate, 0, content_type, 20, 40, 60) + speech)
+                settings(rate, 0, content_type, 20, 40, 60) + script() + speech)
     # Null audio ends an utterance at once: the shortest that there are.
-    voiced, bursts = script(0, 63), sound(45) + (sound(1) + null(1)) * 50
-    yield "full_queue", voiced + settings(1) + bursts
-    yield "full_queue_padded", voiced + settings(1, 0, 0, 0, 1, 2) + bursts + take * 3
-    yield "late_takes", voiced + settings(1) + sound(45) + ((sound(1) + null(2)) * 9 + take * 5) * 5
+    bursts = "50o " + "1s 1n " * 50
+    many = piece(noise(4000)) + (piece(voice(400)) + piece(constant(80, 0))) * 40
     widest = (1 << 31) - 1
-    yield "widest", voiced + settings(1, 1, -1, widest, widest, widest) + bursts
-    yield "open_end", voiced + settings(1, 2, 0, 4, 9, 9) + sound(120) + piece(literal(1))
-    sounds = sound(70) * 4
-    yield "refused", script(40, 6, 30, 30, 30, 5, 25) + settings(1, 0, 2, 4, 9, 9) + sounds
-    yield "interrupted", script(40, 9, 5, 9, 20) + settings(1, 0, 2, 4) + (sound(9) + null(2)) * 20
-    yield "joined", script(40, 10, 30) + settings(1, 0, 0, 200) + sounds
-    yield "apart", script(40, 10, 30) + settings(1, 0, 0, 0, 200, 200) + sounds
-    yield "refused_rate", detector + b"\xff" + number(44100) + settings()[1:] + speech
-    yield "refused_padding", detector + settings(before=-1) + speech
+    for name, chosen in {"full_queue": (1,), "full_queue_padded": (1, 0, 0, 0, 1, 2),
+                         "widest": (1, 1, -1, widest, widest, widest)}.items():
+        yield name, settings(*chosen) + script(bursts) + many + take * 3
+    yield "late_takes", settings(1) + script(bursts) + piece(noise(4000)) + (
+        (piece(voice(400)) + piece(constant(160, 0))) * 9 + take * 5) * 4
+    yield "open_end", settings(1, 2, 0, 4, 9, 9) + script("50o 40s 3n 30s") + speech[:13]
+    for name, chosen, text in [
+            ("refused", (0, 0, 2, 4, 9, 9), "50o 19s 60o 20s 60o 10s 2n 9s 60o 10s 2n 20s 60o"),
+            ("interrupted", (1, 0, 2, 4), "50o 60s 2n 1o 21n 40s 60o 60s 10n 40s 60o 20s 2n"),
+            ("joined", (1, 0, 0, 200), "50o 60s 49o 60s 50o 60s"),
+            ("apart", (1, 0, 0, 0, 200, 200), "50o 60s 50o 60s 40o 60s")]:
+        yield name, settings(*chosen) + script(text)
+    yield "refused_rate", b"\xff" + number(44100) + settings()[1:] + script() + speech
+    yield "refused_padding", settings(before=-1) + script() + speech
 
 
 def enhancement_stream():

@@ -1,15 +1,15 @@
-// The utterance stream: any settings, cuts and order of calls. Voice is what the detector hears or,
-// to reach its rarer answers with few bytes, what a script says. Linked with --wrap for the voice
-// decision.
+// The utterance stream: any settings, cuts and order of calls. The finder within it also by itself,
+// on any decisions, for few bytes make no speech.
 #include "stream/utterance_stream.h"
 
 #include <algorithm>
 #include <cstring>
 #include <type_traits>
 
-#include "Voice_Engine/epd/velmora_vad.h"
 #include "fuzz/input.h"
 #include "jni/orvalis.h"
+#include "stream/frame_detector.h"
+#include "stream/utterance_finder.h"
 
 namespace {
 
@@ -17,65 +17,57 @@ using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 using Samples = std::vector<std::int16_t>;
 
-constexpr std::size_t kMostSamples = 24000;  // enough to fill the queue
+constexpr std::size_t kMostSamples = 24000;
 
-/// Whether each judged frame is voiced, over and over; empty leaves it to the detector.
-std::vector<bool> script;
-std::size_t script_at = 0;
+/// The utterances taken so far, each judged as it comes.
+class Findings {
+public:
+  const std::vector<Utterance> &all() const { return found_; }
 
-}  // namespace
+  void tell_earliest(std::int64_t start) {
+    require(start >= earliest_, "the earliest start never goes back");
+    earliest_ = start;
+  }
 
-#define ORVALIS_DETECTOR(prefix) \
-  prefix##_ZN7orvalis17processVelmoraVADERNS_5FlagsEPPNS_15VelmoraVadStateEPKsPKfi
+  void take(const Utterance &next, std::int64_t pushed) {
+    const std::int64_t previous_end = found_.empty() ? 0 : found_.back().end;
+    require(next.number == static_cast<std::int32_t>(found_.size()) + 1, "numbers ascend by one");
+    require(next.start >= previous_end, "padded neighbours do not overlap");
+    require(next.start >= earliest_, "no utterance starts before the earliest start");
+    require(next.start < next.end, "an utterance holds samples");
+    require(next.end <= pushed, "an utterance lies within the audio");
+    require(next.began > 0 && next.began <= next.ended, "answers begin before they end");
+    require(next.ended <= pushed, "answers lie within the audio");
+    require(next.open == 0 || next.open == 1, "open is 0 or 1");
+    require(found_.empty() || found_.back().open == 0, "only the last utterance is open");
+    found_.push_back(next);
+  }
 
-extern "C" std::int32_t ORVALIS_DETECTOR(__real_)(orvalis::Flags &, orvalis::VelmoraVadState **,
-                                                  const std::int16_t *, const float *,
-                                                  std::int32_t);
+private:
+  std::int64_t earliest_ = 0;
+  std::vector<Utterance> found_;
+};
 
-extern "C" std::int32_t ORVALIS_DETECTOR(__wrap_)(orvalis::Flags &flags,
-                                                  orvalis::VelmoraVadState **state,
-                                                  const std::int16_t *frame, const float *score,
-                                                  std::int32_t band) {
-  if (script.empty()) return ORVALIS_DETECTOR(__real_)(flags, state, frame, score, band);
-  (*state)->vad_flag = script[script_at++ % script.size()];
-  return (*state)->vad_flag;
-}
-
-namespace {
-
-/// Runs of unvoiced and voiced frames, in turn.
-std::vector<bool> read_script(Input &input) {
-  std::vector<bool> voiced;
-  for (int runs = input.byte() % 32, run = 0; run < runs; ++run)
-    voiced.insert(voiced.end(), input.byte() % 64U, run % 2 != 0);
-  return voiced;
-}
-
-/// A stream with the utterances taken from it so far, each judged as it comes.
+/// A stream from which utterances are taken.
 class Listener {
 public:
   explicit Listener(const UtteranceSettings &settings)
-      : frame_samples_(settings.rate_hz / 100), stream_(OpenUtteranceStream(&settings)) {
+      : frame_samples_(orvalis::decision_timing(settings).frame_samples),
+        stream_(OpenUtteranceStream(&settings)) {
     require(stream_ != nullptr, "valid settings open a stream");
-    script_at = 0;
   }
   ~Listener() { require(CloseUtteranceStream(stream_) == 0, "a stream is released"); }
   Listener(const Listener &) = delete;
   Listener &operator=(const Listener &) = delete;
 
-  const std::vector<Utterance> &found() const { return found_; }
+  const std::vector<Utterance> &found() const { return findings_.all(); }
 
   bool take() {
-    const std::int64_t earliest = EarliestUtteranceStart(stream_);
-    require(earliest >= earliest_start_, "the earliest start never goes back");
-    earliest_start_ = earliest;
+    findings_.tell_earliest(EarliestUtteranceStart(stream_));
     Utterance next;
     const std::int32_t taken = NextUtterance(stream_, &next);
     require(taken == 0 || taken == 1, "taking answers 0 or 1");
-    if (taken == 1) {
-      check(next);
-      found_.push_back(next);
-    }
+    if (taken == 1) findings_.take(next, pushed_);
     return taken == 1;
   }
 
@@ -109,25 +101,36 @@ public:
   }
 
 private:
-  void check(const Utterance &next) const {
-    const std::int64_t previous_end = found_.empty() ? 0 : found_.back().end;
-    require(next.number == static_cast<std::int32_t>(found_.size()) + 1, "numbers ascend by one");
-    require(next.start >= previous_end, "padded neighbours do not overlap");
-    require(next.start >= earliest_start_, "no utterance starts before the earliest start");
-    require(next.start < next.end, "an utterance holds samples");
-    require(next.end <= pushed_, "an utterance lies within the audio");
-    require(next.began > 0 && next.began <= next.ended, "answers begin before they end");
-    require(next.ended <= pushed_, "answers lie within the audio");
-    require(next.open == 0 || next.open == 1, "open is 0 or 1");
-    require(found_.empty() || found_.back().open == 0, "only the last utterance is open");
-  }
-
   std::int32_t frame_samples_;
   UtteranceStream *stream_;
   std::int64_t pushed_ = 0;
-  std::int64_t earliest_start_ = 0;
-  std::vector<Utterance> found_;
+  Findings findings_;
 };
+
+/// Runs of up to 63 decisions, a byte each: no speech, speech, or null audio.
+void try_finder(const UtteranceSettings &settings, Input &input) {
+  enum Kind { kNone, kSpeech, kNull };
+  const orvalis::DecisionTiming timing = orvalis::decision_timing(settings);
+  orvalis::UtteranceFinder finder(orvalis::finder_settings(settings, timing));
+  orvalis::UtteranceQueue queue;
+  Findings findings;
+  std::int64_t processed = 0;
+  const auto take_all = [&] {
+    findings.tell_earliest(queue.front() ? queue.front()->start : finder.earliest_start());
+    for (Utterance next; queue.pop(next);) findings.take(next, processed);
+  };
+  for (int runs = input.byte(), run = 0; run < runs; ++run) {
+    const std::uint8_t byte = input.byte();
+    const int kind = byte / 64;
+    for (int frame = 0; frame < byte % 64; ++frame) {
+      if (queue.is_full()) take_all();
+      processed += timing.frame_samples;
+      finder.process(kind == kSpeech, kind == kNull, queue);
+    }
+  }
+  finder.finish(processed, queue);
+  take_all();
+}
 
 std::int32_t read_ms(Input &input) {
   const std::int32_t number = input.number();
@@ -158,12 +161,12 @@ bool is_valid(const UtteranceSettings &settings) {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
   SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
   Input input(bytes, size);
-  script = read_script(input);
   const UtteranceSettings settings = read_settings(input);
   if (!is_valid(settings)) {
     require(OpenUtteranceStream(&settings) == nullptr, "settings out of range are refused");
     return 0;
   }
+  try_finder(settings, input);
 
   Listener cut(settings);
   Samples heard;

@@ -1,0 +1,38 @@
+// The voice detector of a stream, behind one call a frame.
+#pragma once
+
+#include <cstdint>
+
+#include "stream/utterance_finder.h"
+#include "stream/utterance_stream.h"
+
+struct EpdInstance;
+
+namespace orvalis {
+
+inline constexpr int32_t kMaxFrameSamples = 160;
+
+/// Of the detector that the settings ask for.
+DecisionTiming decision_timing(const UtteranceSettings &settings);
+
+class FrameDetector {
+public:
+  struct Decision {
+    bool speech;
+    bool is_null;  ///< null audio, which is not judged
+  };
+
+  /// Takes memory. False, holding none, if that runs out.
+  bool open(const UtteranceSettings &settings);
+  void close();
+
+  /// Judges a frame of decision_timing().frame_samples, which stays as it is.
+  Decision process(const int16_t *frame);
+
+private:
+  EpdInstance *epd_ = nullptr;
+  int32_t content_type_ = 0;
+  int32_t frame_samples_ = 0;
+};
+
+}  // namespace orvalis
