@@ -1,8 +1,9 @@
-// One input through the end-point detector into a report.
+// One input through a voice detector into a report.
 #pragma once
 
 #include <utterance_stream.h>
 
+#include <cstdint>
 #include <string>
 
 #include "cli/detector_stage.h"
@@ -15,8 +16,10 @@ namespace orvalis::cli {
 struct DetectionSettings {
   AudioSettings audio;
   UtteranceSettings detector = UTTERANCE_SETTINGS_DEFAULT;
-  bool frames = false;  ///< Answers to frames instead of utterances
-  bool trace = false;   ///< The same with the frames' levels
+  // For the MCRA detector. Shorter silence joins what is before and after it.
+  McraSettings mcra = MCRA_SETTINGS_DEFAULT;
+  std::int32_t min_silence_ms = 300;
+  Reported reported = Reported::kUtterances;
   SplitSettings split;
 };
 

@@ -21,17 +21,23 @@ CLI::Validator not_empty() {
       ""};
 }
 
+CLI::Option *add_time_option(CLI::App &command, const std::string &option, std::int32_t &ms,
+                             const std::string &text) {
+  return command.add_option(option, ms, text)
+      ->check(from_to(0, 3600 * 1000))
+      ->type_name("MS")
+      ->capture_default_str();
+}
+
 UtteranceOptions add_detector_options(CLI::App &command, UtteranceSettings &detector,
                                       SplitSettings &split) {
   UtteranceOptions options;
-  options.hangover = command.add_option("--hangover", detector.hangover_ms,
-                                        "Longest silence that joins what is before and after it");
-  options.pad_before =
-      command.add_option("--pad-before", detector.pad_before_ms, "Time to add before an utterance");
-  options.pad_after =
-      command.add_option("--pad-after", detector.pad_after_ms, "Time to add after an utterance");
-  for (CLI::Option *option : {options.hangover, options.pad_before, options.pad_after})
-    option->check(from_to(0, 3600 * 1000))->type_name("MS")->capture_default_str();
+  options.all = {add_time_option(command, "--hangover", detector.hangover_ms,
+                                 "Longest silence that joins what is before and after it"),
+                 add_time_option(command, "--pad-before", detector.pad_before_ms,
+                                 "Time to add before an utterance"),
+                 add_time_option(command, "--pad-after", detector.pad_after_ms,
+                                 "Time to add after an utterance")};
 
   command
       .add_option("--content-type", detector.content_type,
@@ -44,6 +50,7 @@ UtteranceOptions add_detector_options(CLI::App &command, UtteranceSettings &dete
                                   "Write each utterance to a WAV file of its\nown in this folder")
                       ->check(not_empty())
                       ->type_name("DIR");
+  options.all.push_back(options.split);
   return options;
 }
 

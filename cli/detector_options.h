@@ -4,6 +4,7 @@
 #include <utterance_stream.h>
 
 #include <CLI/CLI.hpp>
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -13,10 +14,15 @@
 
 namespace orvalis::cli {
 
-/// Those that a single frame's answer does not know.
+/// Those that a single frame's answer does not know, and among them --split.
 struct UtteranceOptions {
-  CLI::Option *hangover, *pad_before, *pad_after, *split;
+  std::vector<CLI::Option *> all;
+  CLI::Option *split;
 };
+
+/// Adds an option in milliseconds, of which `ms` holds the default.
+CLI::Option *add_time_option(CLI::App &command, const std::string &option, std::int32_t &ms,
+                             const std::string &text);
 
 /// Adds --hangover, --pad-before, --pad-after, --content-type and --split.
 UtteranceOptions add_detector_options(CLI::App &command, UtteranceSettings &detector,

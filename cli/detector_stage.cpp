@@ -1,20 +1,44 @@
 #include "cli/detector_stage.h"
 
+#include <orvalis.h>
+
+#include <algorithm>
+#include <cstdlib>
 #include <new>
 #include <utility>
 
 #include "cli/split_names.h"
 
 namespace orvalis::cli {
+namespace {
 
-DetectorStage::DetectorStage(std::string name, const UtteranceSettings &detector,
-                             SplitSettings split, std::unique_ptr<Excerpts> excerpts,
-                             Report &report)
+/// Of what the channel-energy detector keeps to itself only its decision is known; the level is
+/// that of the audio.
+Trace level_trace(const UtteranceFrame &frame) {
+  const auto peak = std::ranges::max(std::span(frame.pcm, static_cast<std::size_t>(frame.samples)),
+                                     {}, [](int sample) { return std::abs(sample); });
+  return {{"answer", std::int64_t{frame.speech}},
+          {"energy", std::int64_t{computeEnergy(frame.pcm, frame.samples)}},
+          {"peak", std::int64_t{std::abs(peak)}}};
+}
+
+}  // namespace
+
+DetectorStage::DetectorStage(std::string name, UtteranceSettings detector, SplitSettings split,
+                             std::unique_ptr<Excerpts> excerpts, Report &report, Reported reported)
     : name_(std::move(name)),
+      rate_hz_(detector.rate_hz),
       split_(std::move(split)),
       excerpts_(std::move(excerpts)),
       report_(report),
-      stream_(OpenUtteranceStream(&detector)) {
+      reported_(reported) {
+  if (reported != Reported::kUtterances) {
+    detector.on_frame = [](const UtteranceFrame *frame, void *stage) {
+      static_cast<DetectorStage *>(stage)->note_frame(*frame);
+    };
+    detector.user = this;
+  }
+  stream_.reset(OpenUtteranceStream(&detector));
   if (!stream_) throw std::bad_alloc();
 }
 
@@ -25,17 +49,27 @@ void DetectorStage::push(std::span<const std::int16_t> input, std::vector<std::i
     const auto taken =
         PushUtteranceAudio(stream_.get(), input.data(), static_cast<std::int32_t>(input.size()));
     input = input.subspan(static_cast<std::size_t>(taken));
-    take_decided();
+    report_new();
   }
 }
 
 void DetectorStage::flush(std::vector<std::int16_t> &) {
   FlushUtteranceStream(stream_.get());
-  take_decided();
+  report_new();
 }
 
-void DetectorStage::take_decided() {
+void DetectorStage::note_frame(const UtteranceFrame &frame) {
+  Trace trace;
+  if (reported_ == Reported::kTrace) {
+    trace = frame.mcra != nullptr ? voice_trace_.of_frame(*frame.mcra, frame.speech == 1)
+                                  : level_trace(frame);
+  }
+  frames_.push_back({frame.start, frame.speech, std::move(trace)});
+}
+
+void DetectorStage::report_new() {
   for (Utterance found; NextUtterance(stream_.get(), &found) == 1;) {
+    if (reported_ != Reported::kUtterances) continue;
     // First, so that what is reported is there.
     if (excerpts_)
       excerpts_->write(found.start, found.end, part_name(split_.folder, name_, found.number),
@@ -43,6 +77,16 @@ void DetectorStage::take_decided() {
     report_.utterance(found);
   }
   if (excerpts_) excerpts_->forget_before(EarliestUtteranceStart(stream_.get()));
+  for (const Frame &frame : frames_) {
+    if (reported_ == Reported::kTrace) {
+      const auto start_s = static_cast<double>(frame.start) / rate_hz_;
+      report_.trace(frame_count_, start_s, frame.trace);
+    } else {
+      report_.frame(frame_count_, frame.decision);
+    }
+    ++frame_count_;
+  }
+  frames_.clear();
 }
 
 }  // namespace orvalis::cli

@@ -1,14 +1,17 @@
-// The end-point detector as a stage: audio passes unchanged, its utterances go to a report.
+// A voice detector as a stage: audio passes unchanged, what it finds goes to a report.
 #pragma once
 
 #include <utterance_stream.h>
 
 #include <memory>
+#include <optional>
 #include <string>
+#include <vector>
 
 #include "cli/excerpts.h"
 #include "cli/report.h"
 #include "cli/stage.h"
+#include "cli/voice_trace.h"
 
 namespace orvalis::cli {
 
@@ -18,12 +21,16 @@ struct SplitSettings {
   bool replace = false;  ///< Files that are there already give way
 };
 
+/// What a report is told of.
+enum class Reported { kUtterances, kFrames, kTrace };
+
 class DetectorStage : public Stage {
 public:
   /// `excerpts` is where the files' audio comes from; null without files. `report` outlives the
-  /// stage, and is told of utterances only.
-  DetectorStage(std::string name, const UtteranceSettings &detector, SplitSettings split,
-                std::unique_ptr<Excerpts> excerpts, Report &report);
+  /// stage, and is told of what is found only.
+  DetectorStage(std::string name, UtteranceSettings detector, SplitSettings split,
+                std::unique_ptr<Excerpts> excerpts, Report &report,
+                Reported reported = Reported::kUtterances);
 
   void push(std::span<const std::int16_t> input, std::vector<std::int16_t> &output) override;
   void flush(std::vector<std::int16_t> &output) override;
@@ -32,13 +39,24 @@ private:
   struct Close {
     void operator()(UtteranceStream *stream) const { CloseUtteranceStream(stream); }
   };
+  struct Frame {
+    std::int64_t start;
+    int decision;
+    Trace trace;
+  };
 
-  void take_decided();
+  void note_frame(const UtteranceFrame &frame);
+  void report_new();
 
   std::string name_;
+  int rate_hz_;
   SplitSettings split_;
   std::unique_ptr<Excerpts> excerpts_;
   Report &report_;
+  Reported reported_;
+  VoiceTrace voice_trace_;
+  std::vector<Frame> frames_;  ///< Not reported yet: nothing may be thrown through the library
+  std::int64_t frame_count_ = 0;
   std::unique_ptr<UtteranceStream, Close> stream_;
 };
 

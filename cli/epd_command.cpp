@@ -26,6 +26,8 @@ struct EpdOptions {
   std::string dump_folder;
   std::size_t jobs = 1;
   bool log = false;
+  bool frames = false;
+  bool trace = false;
 };
 
 void prepare_dump(EpdOptions &options) {
@@ -42,9 +44,11 @@ int run_epd(const CLI::App &command, EpdOptions &options) {
   if (std::ranges::count(options.files, "-") > 1)
     throw CLI::ValidationError("FILE", "standard input can be read only once");
   std::string &format = options.format;
-  if (options.detection.trace) format = trace_format(command, format);
-  if (options.detection.frames && format != "table" && format != "json" && format != "csv")
+  if (options.trace) format = trace_format(command, format);
+  if (options.frames && format != "table" && format != "json" && format != "csv")
     throw CLI::ValidationError("--frames", "the format " + format + " knows utterances only");
+  if (options.frames) options.detection.reported = Reported::kFrames;
+  if (options.trace) options.detection.reported = Reported::kTrace;
   options.detection.detector.input_gain = options.gain == "0.25" ? 1 : options.gain == "4" ? 2 : 0;
   const auto report = make_report(format, "--format", options.files.size());
   protect_inputs(options.files);
@@ -116,19 +120,15 @@ void add_epd_command(CLI::App &app, int &exit_status) {
       ->capture_default_str();
   epd->add_flag("--force", options->detection.split.replace, "Replace files that are there already")
       ->needs(utterances.split);
-  epd->add_flag("--frames", options->detection.frames,
-                "Print the answer to every frame of 10 ms\ninstead of utterances")
-      ->excludes(utterances.hangover)
-      ->excludes(utterances.pad_before)
-      ->excludes(utterances.pad_after)
-      ->excludes(utterances.split);
-  epd->add_flag("--trace", options->detection.trace,
-                "Print the answer to every frame and its level,\nas csv or json")
-      ->excludes(utterances.hangover)
-      ->excludes(utterances.pad_before)
-      ->excludes(utterances.pad_after)
-      ->excludes(utterances.split)
-      ->excludes("--frames");
+  auto *frames = epd->add_flag("--frames", options->frames,
+                               "Print the answer to every frame of 10 ms\ninstead of utterances");
+  auto *trace = epd->add_flag("--trace", options->trace,
+                              "Print the answer to every frame and its level,\nas csv or json");
+  trace->excludes(frames);
+  for (CLI::Option *option : utterances.all) {
+    frames->excludes(option);
+    trace->excludes(option);
+  }
   auto *jobs = epd->add_option("--jobs", options->jobs, "Files to work on at once")
                    ->check(from_to(1, 256))
                    ->type_name("N")

@@ -6,9 +6,9 @@
 #include <vector>
 
 #include "cli/audio_options.h"
+#include "cli/detection.h"
 #include "cli/detector_options.h"
 #include "cli/report_in_turn.h"
-#include "cli/voice_detection.h"
 #include "cli/work_files.h"
 
 namespace orvalis::cli {
@@ -16,7 +16,9 @@ namespace {
 
 struct VadOptions {
   std::vector<std::string> files;
-  VoiceSettings voice;
+  DetectionSettings detection;
+  bool history = false, low_threshold = false, margin_over_minima = false, calibrate = false;
+  bool trace = false;
   std::string format = "table";
   std::size_t jobs = 1;
 };
@@ -24,12 +26,20 @@ struct VadOptions {
 int run_vad(const CLI::App &command, VadOptions &options) {
   if (std::ranges::count(options.files, "-") > 1)
     throw CLI::ValidationError("FILE", "standard input can be read only once");
-  if (options.voice.trace) options.format = trace_format(command, options.format);
+  if (options.trace) {
+    options.format = trace_format(command, options.format);
+    options.detection.reported = Reported::kTrace;
+  }
+  McraSettings &mcra = options.detection.mcra;
+  mcra.historyUpdate = options.history;
+  mcra.lowThresholdSelect = options.low_threshold;
+  mcra.calibrationMode = options.calibrate;
+  mcra.calibrationEnable = options.calibrate || options.margin_over_minima;
   const auto report = make_report(options.format, "--format", options.files.size());
   return work_files(options.files, {.jobs = options.jobs},
                     [&](std::size_t job, Turn &turn, const Advanced &advanced) {
                       ReportInTurn in_turn(*report, turn);
-                      detect_voice(options.files[job], options.voice, in_turn, advanced);
+                      detect(options.files[job], options.detection, in_turn, advanced);
                     });
 }
 
@@ -57,20 +67,21 @@ Examples:
   orvalis vad --trace meeting.wav >trace.csv
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis vad --history --raw -)";
 
-void add_detector_settings(CLI::App &vad, VoiceSettings &voice) {
-  vad.add_flag("--history", voice.history,
+void add_mcra_options(CLI::App &vad, VadOptions &options) {
+  McraSettings &mcra = options.detection.mcra;
+  vad.add_flag("--history", options.history,
                "Let the noise rise as well as fall: its minima\nare those of 20 frames");
-  vad.add_option("--energy-margin", voice.energy_margin, "Factor of the smoothed-energy test")
+  vad.add_option("--energy-margin", mcra.energyMargin, "Factor of the smoothed-energy test")
       ->check(from_to(0, 1000000))
       ->type_name("N")
       ->capture_default_str();
-  vad.add_flag("--margin-over-minima", voice.margin_over_minima,
+  vad.add_flag("--margin-over-minima", options.margin_over_minima,
                "Count the margin in the energy of the minima");
-  vad.add_flag("--low-threshold", voice.low_threshold,
+  vad.add_flag("--low-threshold", options.low_threshold,
                "Least energy threshold 0.097 instead of 0.1");
-  vad.add_flag("--calibrate", voice.calibrate,
+  vad.add_flag("--calibrate", options.calibrate,
                "Learn the energy threshold from frames 80\nto 294; implies --margin-over-minima");
-  vad.add_option("--exponent", voice.exponent, "Exponent of the threshold that is learnt")
+  vad.add_option("--exponent", mcra.exponent, "Exponent of the threshold that is learnt")
       ->check(CLI::Range(0.01, 2.0).description(""))
       ->type_name("X")
       ->default_str("0.84");
@@ -80,7 +91,9 @@ void add_detector_settings(CLI::App &vad, VoiceSettings &voice) {
 
 void add_vad_command(CLI::App &app, int &exit_status) {
   const auto options = std::make_shared<VadOptions>();
-  VoiceSettings &voice = options->voice;
+  UtteranceSettings &detector = options->detection.detector;
+  detector.detector = UTTERANCE_MCRA;
+  detector.min_speech_ms = 100;
   CLI::App *vad = app.add_subcommand("vad", "Find segments of speech by the MCRA detector");
   vad->footer(kNotes);
   vad->add_option("FILE", options->files, "Audio files; \"-\" is standard input")
@@ -88,25 +101,22 @@ void add_vad_command(CLI::App &app, int &exit_status) {
       ->type_name("");
   add_report_option(*vad, "--format", options->format);
 
-  auto *min_speech =
-      vad->add_option("--min-speech", voice.min_speech_ms, "Leave out segments that are shorter");
-  auto *min_silence =
-      vad->add_option("--min-silence", voice.min_silence_ms, "Join what shorter silence cuts");
-  auto *before =
-      vad->add_option("--pad-before", voice.pad_before_ms, "Time to add before a segment");
-  auto *after = vad->add_option("--pad-after", voice.pad_after_ms, "Time to add after a segment");
-  auto *trace = vad->add_flag("--trace", voice.trace,
+  const std::vector<CLI::Option *> times = {
+      add_time_option(*vad, "--min-speech", detector.min_speech_ms,
+                      "Leave out segments that are shorter"),
+      add_time_option(*vad, "--min-silence", options->detection.min_silence_ms,
+                      "Join what shorter silence cuts"),
+      add_time_option(*vad, "--pad-before", detector.pad_before_ms, "Time to add before a segment"),
+      add_time_option(*vad, "--pad-after", detector.pad_after_ms, "Time to add after a segment")};
+  auto *trace = vad->add_flag("--trace", options->trace,
                               "Print what led to the answer to every frame,\nas csv or json");
-  for (CLI::Option *option : {min_speech, min_silence, before, after}) {
-    option->check(from_to(0, 3600 * 1000))->type_name("MS")->capture_default_str();
-    trace->excludes(option);
-  }
-  add_detector_settings(*vad, voice);
+  for (CLI::Option *option : times) trace->excludes(option);
+  add_mcra_options(*vad, *options);
   vad->add_option("--jobs", options->jobs, "Files to work on at once")
       ->check(from_to(1, 256))
       ->type_name("N")
       ->capture_default_str();
-  add_audio_options(*vad, voice.audio);
+  add_audio_options(*vad, options->detection.audio);
   vad->callback([options, vad, &exit_status] { exit_status = run_vad(*vad, *options); });
 }
 

@@ -10,16 +10,13 @@ namespace orvalis::cli {
 /// Follows a record from its initial state on.
 class VoiceTrace {
 public:
-  explicit VoiceTrace(const VADINFO &vad) : vad_(vad) {}
-
   /// What led to the answer to the record's frame. Energies and bins are those of the frame and its
   /// predecessor; speech is what exceeds both thresholds and has more than 40 bins.
-  Trace of_frame(bool speech);
+  Trace of_frame(const VADINFO &vad, bool speech);
 
 private:
-  float smoothed_threshold(float minimum_energy) const;
+  float smoothed_threshold(const VADINFO &vad) const;
 
-  const VADINFO &vad_;
   float last_energy_ = 0;
   float last_smoothed_energy_ = 0;
   float last_minimum_energy_ = 0;

@@ -112,9 +112,10 @@ def ns_frame():
         null + number(n) for n in [0, 1, 160, -1, -1 << 31, (1 << 31) - 1])
 
 
-def settings(rate=0, gain=0, content_type=0, hangover=0, before=0, after=0):
+def settings(rate=0, gain=0, content_type=0, hangover=0, before=0, after=0, mcra=0, speech=0):
     """The times are in steps of 5 ms up to 1270 ms, else in ms."""
-    return bytes([rate]) + b"".join(map(number, [gain, content_type, hangover, before, after]))
+    return bytes([rate]) + b"".join(
+        map(number, [gain, content_type, hangover, before, after, mcra, speech]))
 
 
 def script(text=""):
@@ -132,6 +133,7 @@ def utterance_stream():
         for content_type in (0, 2):
             yield f"speech_{rate}_{content_type}", (
                 settings(rate, 0, content_type, 20, 40, 60) + script() + speech)
+        yield f"mcra_{rate}", settings(rate, 0, 0, 4, 8, 12, 1, 10) + script() + speech
     # Null audio ends an utterance at once: the shortest that there are.
     bursts = "50o " + "1s 1n " * 50
     many = piece(noise(4000)) + (piece(voice(400)) + piece(constant(80, 0))) * 40
@@ -146,10 +148,13 @@ def utterance_stream():
             ("refused", (0, 0, 2, 4, 9, 9), "50o 19s 60o 20s 60o 10s 2n 9s 60o 10s 2n 20s 60o"),
             ("interrupted", (1, 0, 2, 4), "50o 60s 2n 1o 21n 40s 60o 60s 10n 40s 60o 20s 2n"),
             ("joined", (1, 0, 0, 200), "50o 60s 49o 60s 50o 60s"),
-            ("apart", (1, 0, 0, 0, 200, 200), "50o 60s 50o 60s 40o 60s")]:
+            ("apart", (1, 0, 0, 0, 200, 200), "50o 60s 50o 60s 40o 60s"),
+            ("short", (0, 0, 0, 20, 9, 99, 0, 30), "50o 30s 40o 60s 5o 30s 60o 38s 90n 50s 40o"),
+            ("mcra_apart", (1, 0, 0, 4, 99, 99, 1, 20), "9o 2s 9o 3s 1o 3s 40o 20s 1o 9s")]:
         yield name, settings(*chosen) + script(text)
     yield "refused_rate", b"\xff" + number(44100) + settings()[1:] + script() + speech
     yield "refused_padding", settings(before=-1) + script() + speech
+    yield "refused_mcra_gain", settings(gain=1, mcra=1) + script() + speech
 
 
 def enhancement_stream():

@@ -147,13 +147,19 @@ UtteranceSettings read_settings(Input &input) {
   settings.hangover_ms = read_ms(input);
   settings.pad_before_ms = read_ms(input);
   settings.pad_after_ms = read_ms(input);
+  settings.detector = input.number();
+  settings.min_speech_ms = read_ms(input);
   return settings;
 }
 
 bool is_valid(const UtteranceSettings &settings) {
-  return (settings.rate_hz == 16000 || settings.rate_hz == 8000) && settings.input_gain >= 0 &&
-         settings.input_gain <= 2 &&
-         std::min({settings.hangover_ms, settings.pad_before_ms, settings.pad_after_ms}) >= 0;
+  const bool takes_input = settings.detector == UTTERANCE_MCRA
+                               ? settings.input_gain == 0 && settings.content_type == 0
+                               : settings.detector == UTTERANCE_CHANNEL_ENERGY &&
+                                     settings.input_gain >= 0 && settings.input_gain <= 2;
+  return takes_input && (settings.rate_hz == 16000 || settings.rate_hz == 8000) &&
+         std::min({settings.hangover_ms, settings.pad_before_ms, settings.pad_after_ms,
+                   settings.min_speech_ms}) >= 0;
 }
 
 }  // namespace

@@ -19,15 +19,16 @@ UtteranceStream *stream_of(jlong handle) {
   return reinterpret_cast<UtteranceStream *>(static_cast<intptr_t>(handle));
 }
 
-jlong JNICALL open_stream(JNIEnv *, jclass, jint rate_hz, jint input_gain, jint content_type,
-                          jint hangover_ms, jint pad_before_ms, jint pad_after_ms) {
-  const UtteranceSettings settings = {.rate_hz = rate_hz,
-                                      .input_gain = input_gain,
-                                      .content_type = content_type,
-                                      .hangover_ms = hangover_ms,
-                                      .pad_before_ms = pad_before_ms,
-                                      .pad_after_ms = pad_after_ms,
-                                      .pcm_dump = 0};
+/// 0 if memory runs out or a setting is refused. The settings come in the order of the record.
+jlong JNICALL open_stream(JNIEnv *env, jclass, jintArray values) {
+  UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
+  int32_t *const fields[] = {&settings.rate_hz,     &settings.input_gain,    &settings.content_type,
+                             &settings.hangover_ms, &settings.pad_before_ms, &settings.pad_after_ms,
+                             &settings.detector,    &settings.min_speech_ms};
+  jint given[std::size(fields)];
+  if (values == nullptr || env->GetArrayLength(values) != jint{std::size(fields)}) return 0;
+  env->GetIntArrayRegion(values, 0, jint{std::size(fields)}, given);
+  for (std::size_t i = 0; i < std::size(fields); ++i) *fields[i] = given[i];
   return reinterpret_cast<intptr_t>(OpenUtteranceStream(&settings));
 }
 
@@ -197,7 +198,7 @@ extern "C" JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *machine, void *) {
   if (machine->GetEnv(&found, kJniVersion) != JNI_OK) return JNI_ERR;
   auto *env = static_cast<JNIEnv *>(found);
   const JNINativeMethod natives[] = {
-      native("openStream", "(IIIIII)J", address(open_stream)),
+      native("openStream", "([I)J", address(open_stream)),
       native("pushAudio", "(J[SII)I", address(push_audio)),
       native("nextUtterance", "(J[J)I", address(next_utterance)),
       native("flushStream", "(J)I", address(flush_stream)),

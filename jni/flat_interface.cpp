@@ -39,6 +39,8 @@ extern "C" {
 
 ORVALIS_EXPORT const char *GetVersion(void) { return orvalis::kVersion; }
 
+ORVALIS_EXPORT int32_t OrvalisAbiVersion(void) { return ORVALIS_ABI_VERSION; }
+
 ORVALIS_EXPORT EpdInstance *InitializeEPD(int32_t mode, int32_t pcmDumpEnabled) {
   return orvalis::EPD_Create(mode, pcmDumpEnabled);
 }

@@ -73,6 +73,13 @@ extern "C" {
 /* The version of the library, "160705". The string is constant and never freed. */
 const char *GetVersion(void);
 
+/*
+ * Changes when a struct or a function of a public header changes incompatibly. A program compares
+ * what the library answers with what its own headers say.
+ */
+#define ORVALIS_ABI_VERSION 1
+int32_t OrvalisAbiVersion(void);
+
 /* ============================================================================================ */
 /* End-point detection                                                                          */
 /* ============================================================================================ */

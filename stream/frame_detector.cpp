@@ -1,18 +1,20 @@
 #include "stream/frame_detector.h"
 
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+
+#include "Voice_Engine/MCRAvad/mcra_detector.h"
 #include "Voice_Engine/channel/frame_screening.h"
 #include "Voice_Engine/epd/epd_instance.h"
 
 namespace orvalis {
-namespace {
-
-int32_t engine_mode(const UtteranceSettings &settings) {
-  return settings.input_gain * 10000 + (settings.rate_hz == 16000 ? 0 : 1000);
-}
-
-}  // namespace
 
 DecisionTiming decision_timing(const UtteranceSettings &settings) {
+  if (settings.detector == UTTERANCE_MCRA) {
+    return {
+        .frame_samples = MCRA_FRAME_SAMPLES, .start_delay = 0, .end_delay = 0, .refused_run = 0};
+  }
   const auto type = static_cast<uint32_t>(settings.content_type);
   const KepdTiming timing = timing_of(type, settings.rate_hz == 8000);
   const int32_t frame_samples = settings.rate_hz / 100;
@@ -23,15 +25,44 @@ DecisionTiming decision_timing(const UtteranceSettings &settings) {
 }
 
 bool FrameDetector::open(const UtteranceSettings &settings) {
-  content_type_ = settings.content_type;
   frame_samples_ = decision_timing(settings).frame_samples;
-  epd_ = EPD_Create(engine_mode(settings), settings.pcm_dump);
+  if (settings.detector != UTTERANCE_MCRA) return open_epd(settings);
+  constexpr McraSettings kDefault = MCRA_SETTINGS_DEFAULT;
+  return open_mcra(settings.mcra != nullptr ? *settings.mcra : kDefault);
+}
+
+bool FrameDetector::open_epd(const UtteranceSettings &settings) {
+  content_type_ = settings.content_type;
+  const int32_t mode = settings.input_gain * 10000 + (settings.rate_hz == 16000 ? 0 : 1000);
+  epd_ = EPD_Create(mode, settings.pcm_dump);
   return epd_ != nullptr;
 }
 
-void FrameDetector::close() { freeMemory_EPD(epd_); }
+bool FrameDetector::open_mcra(const McraSettings &settings) {
+  mcra_ = static_cast<VADINFO *>(std::malloc(sizeof(VADINFO)));
+  if (mcra_ == nullptr) return false;
+  std::memset(mcra_, 0, sizeof(VADINFO));
+  initialise_mcra(*mcra_);
+  mcra_->historyUpdate = settings.historyUpdate;
+  mcra_->energyMargin = settings.energyMargin;
+  mcra_->lowThresholdSelect = settings.lowThresholdSelect;
+  mcra_->calibrationEnable = settings.calibrationEnable;
+  mcra_->calibrationMode = settings.calibrationMode;
+  exponent_ = settings.exponent;
+  return true;
+}
+
+void FrameDetector::close() {
+  if (epd_ != nullptr) freeMemory_EPD(epd_);
+  std::free(mcra_);
+}
 
 FrameDetector::Decision FrameDetector::process(const int16_t *frame) {
+  if (mcra_ != nullptr) {
+    Word16 windowed[MCRA_FRAME_SAMPLES];
+    std::copy_n(frame, MCRA_FRAME_SAMPLES, windowed);
+    return {judge_mcra_frame(*mcra_, windowed, MCRA_FRAME_SAMPLES, exponent_), false};
+  }
   int32_t small_samples = 0;
   const bool is_null = is_null_frame(frame, frame_samples_, small_samples);
   EpdReasons reasons;

@@ -1,4 +1,4 @@
-// The voice detector of a stream, behind one call a frame.
+// Either voice detector behind one call a frame.
 #pragma once
 
 #include <cstdint>
@@ -7,6 +7,7 @@
 #include "stream/utterance_stream.h"
 
 struct EpdInstance;
+struct VADINFO;
 
 namespace orvalis {
 
@@ -29,10 +30,20 @@ public:
   /// Judges a frame of decision_timing().frame_samples, which stays as it is.
   Decision process(const int16_t *frame);
 
+  /// The MCRA detector's record; null for the other one.
+  const VADINFO *mcra() const { return mcra_; }
+
 private:
+  bool open_epd(const UtteranceSettings &settings);
+  bool open_mcra(const McraSettings &settings);
+
+  // One of the two.
   EpdInstance *epd_ = nullptr;
-  int32_t content_type_ = 0;
+  VADINFO *mcra_ = nullptr;
+
   int32_t frame_samples_ = 0;
+  int32_t content_type_ = 0;
+  float exponent_ = 0;
 };
 
 }  // namespace orvalis

@@ -23,7 +23,7 @@ FinderSettings finder_settings(const UtteranceSettings &settings, const Decision
           .hangover = samples_of(settings.hangover_ms),
           .pad_before = samples_of(settings.pad_before_ms),
           .pad_after = samples_of(settings.pad_after_ms),
-          .min_speech = 0};
+          .min_speech = samples_of(settings.min_speech_ms)};
 }
 
 void UtteranceFinder::process(bool speech, bool is_null, UtteranceQueue &queue) {

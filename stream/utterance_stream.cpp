@@ -12,14 +12,19 @@ struct UtteranceStream {
   UtteranceStream(const UtteranceSettings &settings, const orvalis::FrameDetector &opened)
       : detector(opened),
         finder(orvalis::finder_settings(settings, orvalis::decision_timing(settings))),
-        frame_samples(orvalis::decision_timing(settings).frame_samples) {}
+        frame_samples(orvalis::decision_timing(settings).frame_samples),
+        on_frame(settings.on_frame),
+        user(settings.user) {}
 
   orvalis::FrameDetector detector;
   orvalis::UtteranceFinder finder;
   orvalis::UtteranceQueue queue;
   int32_t frame_samples;
+  void (*on_frame)(const UtteranceFrame *frame, void *user);
+  void *user;
   bool flushed = false;
   int64_t pushed = 0;
+  int64_t judged = 0;
   int32_t filled = 0;
   int16_t frame[orvalis::kMaxFrameSamples] = {};
 };
@@ -27,13 +32,29 @@ struct UtteranceStream {
 namespace {
 
 bool is_valid(const UtteranceSettings &settings) {
-  return (settings.rate_hz == 16000 || settings.rate_hz == 8000) && settings.input_gain >= 0 &&
-         settings.input_gain <= 2 && settings.hangover_ms >= 0 && settings.pad_before_ms >= 0 &&
-         settings.pad_after_ms >= 0;
+  if (settings.rate_hz != 16000 && settings.rate_hz != 8000) return false;
+  if (std::min({settings.hangover_ms, settings.pad_before_ms, settings.pad_after_ms,
+                settings.min_speech_ms}) < 0) {
+    return false;
+  }
+  if (settings.detector == UTTERANCE_MCRA) {
+    return settings.input_gain == 0 && settings.content_type == 0 && settings.pcm_dump == 0;
+  }
+  return settings.detector == UTTERANCE_CHANNEL_ENERGY && settings.mcra == nullptr &&
+         settings.input_gain >= 0 && settings.input_gain <= 2;
 }
 
 void judge_frame(UtteranceStream &stream) {
   const auto [speech, is_null] = stream.detector.process(stream.frame);
+  if (stream.on_frame != nullptr) {
+    const UtteranceFrame frame = {.start = stream.judged,
+                                  .pcm = stream.frame,
+                                  .samples = stream.frame_samples,
+                                  .speech = speech,
+                                  .mcra = stream.detector.mcra()};
+    stream.on_frame(&frame, stream.user);
+  }
+  stream.judged += stream.frame_samples;
   stream.finder.process(speech, is_null, stream.queue);
   stream.filled = 0;
 }

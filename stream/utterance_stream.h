@@ -1,10 +1,10 @@
 /*
- * utterance_stream.h - utterances from audio that was cut anyhow
+ * utterance_stream.h - utterances from audio in chunks of any size
  *
- * The detector of orvalis.h answers frame by frame, late by its confirmation run and its closing
- * pause, and leaves the hangover to its caller. This stream does what callers then write by hand:
- * it takes audio in pieces of any size, dates the answers back, joins what a short silence has cut,
- * pads, and hands out utterances. No result depends on how the audio was cut.
+ * A detector decides frame by frame, some of it late, and leaves the hangover to its caller. This
+ * stream does what callers then write by hand, for either detector of the library: it takes audio
+ * in chunks of any size, dates the decisions back, joins what a short silence has cut, leaves out
+ * what is too short, pads, and hands out utterances. No result depends on how the audio was cut.
  *
  *
  * A worked example
@@ -35,23 +35,35 @@
  * (tests/example_stream.c is this example; it is compiled and run as C and as C++.)
  *
  *
- * From answers to utterances
- * --------------------------
- * A run of answers 1 is a piece. A piece is dated back by the detector's own delay, in frames of
- * 10 ms, clipped to the input and to the previous piece:
+ * The detectors
+ * -------------
+ *   UTTERANCE_CHANNEL_ENERGY   that of orvalis.h: confirms speech over several frames, and at
+ *                              16 kHz suppresses the noise before
+ *   UTTERANCE_MCRA             that of MCRAvad.h: decides each frame at once. Takes no input_gain,
+ *                              content_type or pcm_dump, but a configuration of its own
  *
- *   content type     start   end at 16 kHz   end at 8 kHz
- *   0, 1             5       25              28
- *   2 and more       3       14              17
  *
- * Null audio (a frame with more than 60 zero samples in a row) is silence. A piece that it
- * interrupts ends with its last 1, not dated back; if the detector answers 1 in the first frame
- * that is not null again, the piece that begins there is not dated back either. For content types
- * of 2 and more a piece of at most 19 answers is one that the detector refused as too short; it is
- * not handed out.
+ * From decisions to utterances
+ * ----------------------------
+ * A run of decisions for speech is a piece. A piece is dated back by the detector's own delay,
+ * clipped to the input and to the previous piece:
  *
- * Pieces join when an answer 1 comes at most `hangover_ms` after the last one. Padding lengthens an
- * utterance but never crosses a neighbour: each of two owns half of the gap between them.
+ *   detector         a frame   start       end at 16 kHz   end at 8 kHz
+ *   channel energy   10 ms     5 frames    25 frames       28 frames
+ *     content type
+ *     2 and more     10 ms     3 frames    14 frames       17 frames
+ *   MCRA             160       as it is    as it is        as it is
+ *                    samples
+ *
+ * For the channel-energy detector null audio (a frame with more than 60 zero samples in a row) is
+ * silence. A piece that it interrupts ends with its last frame of speech, not dated back; if the
+ * detector decides for speech in the first frame that is not null again, the piece that begins
+ * there is not dated back either. For content types of 2 and more a piece of at most 19 frames is
+ * one that the detector refused as too short; it is not handed out.
+ *
+ * Pieces join when a decision for speech comes at most `hangover_ms` after the last one; what then
+ * holds less than `min_speech_ms` is left out. Padding lengthens an utterance but never crosses a
+ * neighbour: each of two owns half of the gap between them.
  *
  * Threads: as for an EPD instance. Memory: all of it is taken in OpenUtteranceStream.
  */
@@ -66,34 +78,72 @@ extern "C" {
 
 typedef struct UtteranceStream UtteranceStream;
 
+/* Values of UtteranceSettings.detector. */
+#define UTTERANCE_CHANNEL_ENERGY 0
+#define UTTERANCE_MCRA           1
+
+/* Configuration of the MCRA detector: fields of its record and the exponent, as in MCRAvad.h. */
+typedef struct McraSettings {
+  int32_t historyUpdate;
+  int32_t energyMargin;
+  int32_t lowThresholdSelect;
+  int32_t calibrationEnable;
+  int32_t calibrationMode;
+  float exponent;
+} McraSettings;
+
+/* Noise may only fall, and nothing is calibrated. */
+#define MCRA_SETTINGS_DEFAULT \
+  { 0, 2, 0, 0, 0, 0.84f }
+
+/* A frame that was judged. */
+typedef struct UtteranceFrame {
+  int64_t start;              /* its first sample */
+  const int16_t *pcm;         /* its samples, as they were pushed */
+  int32_t samples;            /* 160, or 80 for the channel-energy detector at 8 kHz */
+  int32_t speech;             /* the detector's decision: 1 or 0 */
+  const struct VADINFO *mcra; /* the MCRA detector's record behind the frame; else NULL */
+} UtteranceFrame;
+
 typedef struct UtteranceSettings {
   int32_t rate_hz;       /* 16000 or 8000 */
   int32_t input_gain;    /* 0: as it is, 1: divided by 4, 2: multiplied by 4 (wrapping) */
   int32_t content_type;  /* timing of the detector: 0, 1, or 2 and more; see orvalis.h */
-  int32_t hangover_ms;   /* longest time between answers 1 that joins pieces; 0 joins none */
+  int32_t hangover_ms;   /* longest time between decisions for speech that joins; 0 joins none */
   int32_t pad_before_ms; /* 0 or more, added before an utterance */
   int32_t pad_after_ms;  /* 0 or more, added after it */
   int32_t pcm_dump;      /* 1 writes the detector's dump files; see InitializeEPD in orvalis.h */
+  int32_t detector;      /* UTTERANCE_CHANNEL_ENERGY or UTTERANCE_MCRA */
+  int32_t min_speech_ms; /* 0 or more: less speech, without padding, is no utterance */
+
+  /* Read by OpenUtteranceStream. NULL: MCRA_SETTINGS_DEFAULT, or another detector. */
+  const McraSettings *mcra;
+
+  /* Unless NULL, called for each frame once it is judged, from within calls that take the stream,
+   * none of which it may make itself. What `frame` points to is valid until it returns. */
+  void (*on_frame)(const UtteranceFrame *frame, void *user);
+  void *user; /* what on_frame gets */
 } UtteranceSettings;
 
-/* 16 kHz, no gain, content type 0, half a second of hangover, no padding, no dump. */
+/* Channel energy at 16 kHz, no gain, content type 0, half a second of hangover, no padding. */
 #define UTTERANCE_SETTINGS_DEFAULT \
-  { 16000, 0, 0, 500, 0, 0, 0 }
+  { 16000, 0, 0, 500, 0, 0, 0, UTTERANCE_CHANNEL_ENERGY, 0, 0, 0, 0 }
 
 /* Times are counts of samples since the stream was opened. */
 typedef struct Utterance {
   int64_t start;  /* first sample */
   int64_t end;    /* one past the last sample */
-  int64_t began;  /* samples heard when the first answer 1 was given */
-  int64_t ended;  /* samples heard when the last answer 1 was given */
+  int64_t began;  /* samples judged when the first decision for speech was taken */
+  int64_t ended;  /* samples judged when the last one was taken */
   int32_t number; /* 1, 2, 3 ... */
-  int32_t open;   /* 1 if the detector still answered 1 when the audio ended */
+  int32_t open;   /* 1 if the last frame of the audio was speech */
 } Utterance;
 
 /* Utterances that may wait in a stream. */
 #define UTTERANCE_QUEUE_LENGTH 16
 
-/* Opens a stream. NULL if memory runs out, settings is NULL or a setting is out of range. */
+/* Opens a stream. NULL if memory runs out, settings is NULL, a setting is out of range, or the
+ * detector does not take it. */
 UtteranceStream *OpenUtteranceStream(const UtteranceSettings *settings);
 
 /*

@@ -1,31 +1,20 @@
-// The exported entries of the MCRA detector.
+// The MCRA detector: its parts in a frame's order, and the exported entries.
 #include "Voice_Engine/MCRAvad/MCRAvad.h"
 
 #include <cstddef>
 #include <cstring>
 
 #include "Voice_Engine/MCRAvad/frame_decision.h"
+#include "Voice_Engine/MCRAvad/mcra_detector.h"
 #include "Voice_Engine/MCRAvad/noise_spectrum.h"
 #include "Voice_Engine/MCRAvad/speech_presence.h"
 #include "Voice_Engine/basic_op/word.h"
 #include "Voice_Engine/platform/export.h"
 #include "Voice_Engine/platform/log.h"
 
-namespace {
+namespace orvalis {
 
-void analyse_frame(VADINFO &vad, int16_t *frame, int32_t length) {
-  orvalis::count_up(vad.frameIndex);
-  orvalis::take_periodogram(vad, frame, length);
-  orvalis::update_noise(vad);
-  orvalis::update_presence(vad);
-}
-
-}  // namespace
-
-extern "C" {
-
-ORVALIS_EXPORT void initialVADINFO(VADINFO **info) {
-  VADINFO &vad = **info;
+void initialise_mcra(VADINFO &vad) {
   // Spectra, energies and `reserved`; configuration follows them.
   std::memset(&vad, 0, offsetof(VADINFO, historyUpdate));
   vad.frameIndex = -1;
@@ -40,6 +29,24 @@ ORVALIS_EXPORT void initialVADINFO(VADINFO **info) {
   vad.calibrationPeak = 0;
   vad.calibrationCount = 0;
 }
+
+void analyse_mcra_frame(VADINFO &vad, Word16 *frame, Word32 length) {
+  count_up(vad.frameIndex);
+  take_periodogram(vad, frame, length);
+  update_noise(vad);
+  update_presence(vad);
+}
+
+bool judge_mcra_frame(VADINFO &vad, Word16 *frame, Word32 length, float exponent) {
+  analyse_mcra_frame(vad, frame, length);
+  return decide_frame(vad, exponent);
+}
+
+}  // namespace orvalis
+
+extern "C" {
+
+ORVALIS_EXPORT void initialVADINFO(VADINFO **info) { orvalis::initialise_mcra(**info); }
 
 ORVALIS_EXPORT void reset_MCRA_params(VADINFO **info) {
   using namespace orvalis;
@@ -60,12 +67,11 @@ ORVALIS_EXPORT void reset_MCRA_params(VADINFO **info) {
 }
 
 ORVALIS_EXPORT void ApplyVAD(VADINFO **info, int16_t *frame, int32_t length) {
-  analyse_frame(**info, frame, length);
+  orvalis::analyse_mcra_frame(**info, frame, length);
 }
 
 ORVALIS_EXPORT int32_t processVAD(VADINFO **info, int16_t *frame, int32_t length, float exponent) {
-  analyse_frame(**info, frame, length);
-  return orvalis::decide_frame(**info, exponent) ? 1 : 0;
+  return orvalis::judge_mcra_frame(**info, frame, length, exponent) ? 1 : 0;
 }
 
 ORVALIS_EXPORT int32_t explainVAD(VADINFO **info, McraReasons *reasons) {

@@ -1,94 +1,21 @@
-// `orvalis vad`: segments from answers, and what the tool makes of files; traces of both detectors.
+// `orvalis vad`: what the tool makes of files and options; traces of both detectors.
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <random>
+#include <array>
 #include <string>
 #include <vector>
 
 #include "Voice_Engine/MCRAvad/MCRAvad.h"
-#include "cli/segments.h"
 #include "jni/orvalis.h"
+#include "stream/utterance_stream.h"
 #include "tests/cli/tool.h"
 #include "tests/support/recordings.h"
 
 namespace orvalis::test {
 namespace {
 
-using cli::Segments;
-using cli::SegmentSettings;
 using Answers = std::vector<bool>;
-
-/// Border by border, as a reader of all answers would set them.
-std::vector<Utterance> expected_segments(const Answers &answers, std::int64_t frame,
-                                         std::int64_t samples, const SegmentSettings &settings) {
-  std::vector<Utterance> found;
-  for (std::size_t i = 0; i < answers.size(); ++i) {
-    if (!answers[i]) continue;
-    const auto start = static_cast<std::int64_t>(i) * frame;
-    if (found.empty() ||
-        start - found.back().end >= std::max<std::int64_t>(settings.min_silence, 1))
-      found.push_back(
-          {.start = start, .end = 0, .began = start + frame, .ended = 0, .number = 0, .open = 0});
-    found.back().end = found.back().ended = start + frame;
-  }
-  if (!found.empty() && answers.back()) found.back().open = 1;
-  std::erase_if(found, [&](const Utterance &u) { return u.end - u.start < settings.min_speech; });
-  const std::vector<Utterance> bare = found;
-  for (std::size_t i = 0; i < found.size(); ++i) {
-    const auto half_gap = [&](std::size_t next) {
-      return (bare[next].start - bare[next - 1].end) / 2;
-    };
-    const std::int64_t first = i == 0 ? 0 : bare[i - 1].end + half_gap(i);
-    const std::int64_t last = i + 1 == found.size() ? samples : bare[i].end + half_gap(i + 1);
-    found[i].start = std::max(bare[i].start - settings.pad_before, first);
-    found[i].end = std::min(bare[i].end + settings.pad_after, last);
-    found[i].number = static_cast<std::int32_t>(i) + 1;
-  }
-  return found;
-}
-
-bool are_same(const Utterance &a, const Utterance &b) {
-  return a.start == b.start && a.end == b.end && a.began == b.began && a.ended == b.ended &&
-         a.number == b.number && a.open == b.open;
-}
-
-TEST(VoiceSegments, AreJoinedLeftOutAndPadded) {
-  for (unsigned seed = 0; seed < 3000; ++seed) {
-    std::mt19937 random(seed);
-    const auto up_to = [&](std::int64_t most) {
-      return static_cast<std::int64_t>(random()) % (most + 1);
-    };
-    const SegmentSettings settings{up_to(60), up_to(80), up_to(70), up_to(70)};
-    Answers answers;
-    while (answers.size() < 100)
-      answers.insert(answers.end(), static_cast<std::size_t>(1 + up_to(seed % 30)), up_to(1) == 1);
-    std::vector<Utterance> found;
-    Segments segments(settings, [&](const Utterance &segment) { found.push_back(segment); });
-    for (const bool speech : answers) segments.hear(speech, 10);
-    segments.end(7);
-    const auto samples = static_cast<std::int64_t>(10 * answers.size() + 7);
-    ASSERT_TRUE(
-        std::ranges::equal(found, expected_segments(answers, 10, samples, settings), are_same))
-        << "seed " << seed;
-  }
-}
-
-TEST(VoiceSegments, AreHandedOutAsSoonAsTheyAreDecided) {
-  int found = 0;
-  Segments segments({20, 30, 0, 40}, [&](const Utterance &) { ++found; });
-  const auto hear = [&](int frames, bool speech) {
-    for (int i = 0; i < frames; ++i) segments.hear(speech, 10);
-    return found;
-  };
-  hear(5, true);
-  EXPECT_EQ(hear(7, false), 0) << "speech could still come within twice the padding";
-  EXPECT_EQ(hear(1, false), 1);
-  hear(3, true);
-  hear(4, false);
-  EXPECT_EQ(hear(1, true), 1) << "too short to be a neighbour as yet";
-  EXPECT_EQ(hear(1, true), 2);
-}
 
 struct Voice {
   const char *options;
@@ -151,29 +78,54 @@ TEST_F(Vad, TraceGivesTheAnswersAndTheirReasons) {
       << csv.substr(0, 300);
 }
 
-TEST_F(Vad, SegmentsFollowTheAnswers) {
+/// Start, end, began and open of each utterance that the stream finds.
+std::vector<std::array<std::int64_t, 4>> segments_of(const Voice &voice, UtteranceSettings settings,
+                                                     const Pcm &pcm) {
+  const McraSettings mcra = {voice.history, voice.margin,    voice.low,
+                             voice.enable,  voice.calibrate, voice.exponent};
+  settings.detector = UTTERANCE_MCRA;
+  settings.mcra = &mcra;
+  UtteranceStream *stream = OpenUtteranceStream(&settings);
+  std::vector<std::array<std::int64_t, 4>> found;
+  std::size_t done = 0;
+  do {
+    done += static_cast<std::size_t>(PushUtteranceAudio(
+        stream, pcm.data() + done, static_cast<std::int32_t>(pcm.size() - done)));
+    if (done == pcm.size()) FlushUtteranceStream(stream);
+    for (Utterance u; NextUtterance(stream, &u) == 1;)
+      found.push_back({u.start, u.end, u.began, u.open});
+  } while (done < pcm.size());
+  CloseUtteranceStream(stream);
+  return found;
+}
+
+TEST_F(Vad, SegmentsAreTheStreams) {
   for (const std::string &file : {kWide, kNarrow, kWideOpen}) {
     const Pcm pcm = load_recording(file);
-    const std::int64_t rate = file == kNarrow ? 8000 : 16000;
+    UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
+    settings.rate_hz = file == kNarrow ? 8000 : 16000;
     for (const Voice &voice : kVoices) {
-      const std::string options = std::string(voice.options) + " " + file;
-      const auto matches = [&](const std::string &more, const SegmentSettings &settings) {
-        SCOPED_TRACE(more + options);
-        const auto lines = json_lines(run("vad --format json " + more + options).out);
-        const auto expected = expected_segments(answers_of(voice, pcm), 160,
-                                                static_cast<std::int64_t>(pcm.size()), settings);
-        ASSERT_EQ(lines.size(), expected.size());
-        for (std::size_t i = 0; i < lines.size(); ++i) {
-          EXPECT_EQ(lines[i]["start_sample"], expected[i].start);
-          EXPECT_EQ(lines[i]["end_sample"], expected[i].end);
-          EXPECT_EQ(lines[i]["began_sample"], expected[i].began);
-          EXPECT_EQ(lines[i]["open"], expected[i].open == 1);
+      const auto expect = [&](const std::string &options) {
+        const std::string arguments = options + voice.options + " " + file;
+        std::vector<std::array<std::int64_t, 4>> found;
+        for (const Json &line : json_lines(run("vad --format json " + arguments).out)) {
+          found.push_back({line["start_sample"], line["end_sample"], line["began_sample"],
+                           line["open"].get<bool>()});
         }
+        EXPECT_EQ(found, segments_of(voice, settings, pcm)) << arguments;
+        return found;
       };
-      const auto ms = [&](std::int64_t time) { return time * rate / 1000; };
-      matches("", {ms(100), ms(300), 0, 0});
-      matches("--min-speech 200 --min-silence 60 --pad-before 50 --pad-after 400 ",
-              {ms(200), ms(60), ms(50), ms(400)});
+      settings.hangover_ms = 300;
+      settings.min_speech_ms = 100;
+      settings.pad_before_ms = UtteranceSettings(UTTERANCE_SETTINGS_DEFAULT).pad_before_ms;
+      settings.pad_after_ms = UtteranceSettings(UTTERANCE_SETTINGS_DEFAULT).pad_after_ms;
+      expect("");
+      settings.min_speech_ms = 200;
+      settings.pad_before_ms = settings.pad_after_ms = 0;
+      settings.hangover_ms = settings.rate_hz == 8000 ? 80 : 70;  // frames of 20 and of 10 ms
+      const auto found = expect("--min-speech 200 --min-silence 65 --pad-before 0 --pad-after 0 ");
+      for (std::size_t i = 1; i < found.size(); ++i)
+        EXPECT_GE(found[i][0] - found[i - 1][1], 65 * settings.rate_hz / 1000);
     }
   }
 }

@@ -71,7 +71,12 @@ class SafeClassesTest {
   }
 
   static String utterances(short[] pcm, List<Integer> pieces) {
-    try (EndPointDetector epd = EndPointDetector.at(16000).hangoverMillis(100).open()) {
+    return utterances(EndPointDetector.at(16000).hangoverMillis(100), pcm, pieces);
+  }
+
+  private static String utterances(
+      EndPointDetector.Settings settings, short[] pcm, List<Integer> pieces) {
+    try (EndPointDetector epd = settings.open()) {
       StringBuilder text = new StringBuilder();
       int at = 0;
       for (int length : pieces) {
@@ -123,6 +128,21 @@ class SafeClassesTest {
   }
 
   /** With the delayed first channel in the output, which is what comes where nothing is suppressed. */
+  @Test
+  void settingsReachTheDetector() {
+    short[] pcm = Audio.command();
+    List<Integer> whole = List.of(pcm.length);
+    EndPointDetector.Settings settings = EndPointDetector.at(16000);
+    String plain = utterances(settings, pcm, whole);
+    String mcra = utterances(settings.method(EndPointDetector.Method.MCRA), pcm, whole);
+    assertFalse(plain.isEmpty());
+    assertFalse(mcra.isEmpty());
+    assertFalse(plain.equals(mcra));
+    assertEquals("", utterances(settings.minSpeechMillis(60_000), pcm, whole));
+    assertMisuse(() -> settings.contentType(2).open(), IllegalArgumentException.class);
+    assertMisuse(() -> settings.contentType(0).inputGain(1).open(), IllegalArgumentException.class);
+  }
+
   @Test
   void suppressorIsTheEnginesFrameByFrame() {
     for (int microphones = 1; microphones <= 2; ++microphones) {
@@ -195,6 +215,8 @@ class SafeClassesTest {
           () -> EndPointDetector.at(16000).hangoverMillis(-1),
           () -> EndPointDetector.at(16000).padBeforeMillis(-1),
           () -> EndPointDetector.at(16000).padAfterMillis(-1),
+          () -> EndPointDetector.at(16000).minSpeechMillis(-1),
+          () -> EndPointDetector.at(16000).method(null),
           () -> NoiseSuppressor.forOneMicrophone(null),
           () -> EngineLog.toLogger(null)
         }) {

@@ -11,7 +11,10 @@
 #include <string>
 #include <vector>
 
+#include "Voice_Engine/MCRAvad/MCRAvad.h"
 #include "jni/orvalis.h"
+#include "stream/frame_detector.h"
+#include "stream/utterance_finder.h"
 #include "tests/support/random.h"
 #include "tests/support/recordings.h"
 #include "tests/support/scripted_malloc.h"
@@ -144,47 +147,147 @@ TEST(UtteranceStream, FlushEndsTheAudio) {
   EXPECT_EQ(PushUtteranceAudio(stream.get(), pcm.data(), 3), -1);
 }
 
-TEST(UtteranceStream, AnswersDoNotDependOnTheCut) {
-  auto generator = orvalis::test::seeded_generator();
-  Pcm pcm = orvalis::test::speech_16k(orvalis::test::kSentences[1]);
-  for (const int at : {20000, 30000}) std::fill_n(pcm.begin() + at, 5000, std::int16_t{0});
+/// What on_frame told of the frames of a stream.
+struct Frames {
+  std::vector<int64_t> starts;
+  std::vector<bool> speech;
+  Pcm pcm;
 
-  UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
-  settings.content_type = 2;
-  settings.hangover_ms = 200;
-  const auto expected = utterances_of(settings, pcm);
-  ASSERT_GE(expected.size(), 2U);
-  for (int round = 0; round < 1000; ++round) {
-    // Pieces from single samples to several seconds.
-    std::uniform_real_distribution<double> exponent(0, round % 3 == 0 ? 2.5 : 5);
-    const auto length = [&] { return static_cast<std::size_t>(std::pow(10, exponent(generator))); };
-    ASSERT_EQ(utterances_of(settings, pcm, length), expected) << "round " << round;
+  void observe(UtteranceSettings &settings) {
+    settings.user = this;
+    settings.on_frame = [](const UtteranceFrame *frame, void *user) {
+      auto &frames = *static_cast<Frames *>(user);
+      frames.starts.push_back(frame->start);
+      frames.speech.push_back(frame->speech == 1);
+      frames.pcm.insert(frames.pcm.end(), frame->pcm, frame->pcm + frame->samples);
+      EXPECT_TRUE(frame->mcra == nullptr ||
+                  frame->mcra->frameIndex + 1 == std::ssize(frames.starts));
+    };
+  }
+};
+
+/// The detectors' decisions on the whole frames of some audio, without a stream.
+std::vector<bool> decisions_of(const UtteranceSettings &settings, Pcm pcm) {
+  const int32_t frame = orvalis::decision_timing(settings).frame_samples;
+  VADINFO record{};
+  VADINFO *vad = &record;
+  initialVADINFO(&vad);
+  EpdInstance *epd = InitializeEPD(settings.rate_hz == 8000 ? 1000 : 0, 0);
+  std::vector<bool> decisions;
+  for (std::size_t at = 0; at + frame <= pcm.size(); at += static_cast<std::size_t>(frame)) {
+    decisions.push_back(settings.detector == UTTERANCE_MCRA
+                            ? processVAD(&vad, &pcm[at], frame, 0.84F) == 1
+                            : ProcessEPDFrame(epd, &pcm[at], frame) == 1);
+  }
+  FreeMemoryEPD(epd);
+  return decisions;
+}
+
+TEST(UtteranceStream, HandsEitherDetectorsDecisionsToTheFinder) {
+  for (const int32_t detector : {UTTERANCE_CHANNEL_ENERGY, UTTERANCE_MCRA}) {
+    for (const int32_t rate_hz : {16000, 8000}) {
+      UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
+      settings.rate_hz = rate_hz;
+      settings.detector = detector;
+      settings.min_speech_ms = 700;
+      settings.hangover_ms = 200;
+      const Pcm pcm = rate_hz == 8000 ? orvalis::test::speech_8k("wav/all.wav")
+                                      : orvalis::test::speech_16k("goforward.raw");
+      const auto decisions = decisions_of(settings, pcm);
+      const auto timing = orvalis::decision_timing(settings);
+      orvalis::UtteranceFinder finder(orvalis::finder_settings(settings, timing));
+      orvalis::UtteranceQueue queue;
+      std::vector<Fields> expected;
+      const auto take = [&] {
+        for (Utterance u; queue.pop(u);)
+          expected.push_back({u.start, u.end, u.began, u.ended, u.number, u.open});
+      };
+      for (const bool speech : decisions) {  // none of the audio is null
+        finder.process(speech, false, queue);
+        take();
+      }
+      finder.finish(std::ssize(pcm), queue);
+      take();
+
+      Frames frames;
+      frames.observe(settings);
+      EXPECT_EQ(utterances_of(settings, pcm, [] { return 1000U; }), expected);
+      EXPECT_FALSE(expected.empty());
+      EXPECT_EQ(frames.speech, decisions);
+      EXPECT_EQ(frames.pcm, Pcm(pcm.begin(), pcm.begin() + std::ssize(frames.pcm)));
+      for (std::size_t i = 0; i < frames.starts.size(); ++i)
+        ASSERT_EQ(frames.starts[i], static_cast<int64_t>(i) * timing.frame_samples);
+    }
   }
 }
 
-TEST(UtteranceStream, RefusesBadArgumentsAndWantOfMemory) {
-  const UtteranceSettings good = UTTERANCE_SETTINGS_DEFAULT;
-  for (int32_t UtteranceSettings::*field :
-       {&UtteranceSettings::rate_hz, &UtteranceSettings::input_gain,
-        &UtteranceSettings::hangover_ms, &UtteranceSettings::pad_before_ms,
-        &UtteranceSettings::pad_after_ms}) {
-    UtteranceSettings bad = good;
-    bad.*field = -1;
-    EXPECT_EQ(OpenUtteranceStream(&bad), nullptr);
+TEST(UtteranceStream, NoSettingDependsOnTheCut) {
+  auto generator = orvalis::test::seeded_generator();
+  const auto up_to = [&](int most) {
+    return std::uniform_int_distribution<int>(0, most)(generator);
+  };
+  Pcm pcm = orvalis::test::speech_16k(orvalis::test::kSentences[1]);
+  for (const int at : {20000, 30000}) std::fill_n(pcm.begin() + at, 5000, std::int16_t{0});
+  std::size_t found = 0;
+  for (int round = 0; round < 100; ++round) {
+    UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
+    settings.detector = up_to(1);
+    settings.rate_hz = up_to(1) == 1 ? 16000 : 8000;
+    settings.content_type = settings.detector == UTTERANCE_MCRA ? 0 : up_to(2);
+    settings.hangover_ms = up_to(400);
+    settings.min_speech_ms = up_to(1) * up_to(800);
+    settings.pad_before_ms = up_to(300);
+    settings.pad_after_ms = up_to(300);
+    const auto expected = utterances_of(settings, pcm);
+    found += expected.size();
+    for (const double longest : {2.5, 5.0}) {  // pieces from single samples to several seconds
+      std::uniform_real_distribution<double> exponent(0, longest);
+      const auto piece = [&] {
+        return static_cast<std::size_t>(std::pow(10, exponent(generator)));
+      };
+      ASSERT_EQ(utterances_of(settings, pcm, piece), expected) << "round " << round;
+    }
   }
-  UtteranceSettings bad = good;
-  bad.rate_hz = 44100;
-  EXPECT_EQ(OpenUtteranceStream(&bad), nullptr);
-  bad = good;
-  bad.input_gain = 3;
-  EXPECT_EQ(OpenUtteranceStream(&bad), nullptr);
+  EXPECT_GT(found, 150U);
+}
+
+TEST(UtteranceStream, RefusesBadArgumentsAndWantOfMemory) {
+  using Settings = UtteranceSettings;
+  const Settings good = UTTERANCE_SETTINGS_DEFAULT;
+  Settings mcra = good;
+  mcra.detector = UTTERANCE_MCRA;
+  const struct {
+    Settings settings;
+    int32_t Settings::*field;
+    int32_t value;
+  } kRefused[] = {{good, &Settings::rate_hz, 44100},    {good, &Settings::input_gain, -1},
+                  {good, &Settings::input_gain, 3},     {good, &Settings::hangover_ms, -1},
+                  {good, &Settings::pad_before_ms, -1}, {good, &Settings::pad_after_ms, -1},
+                  {good, &Settings::min_speech_ms, -1}, {good, &Settings::detector, -1},
+                  {good, &Settings::detector, 2},       {mcra, &Settings::input_gain, 1},
+                  {mcra, &Settings::content_type, 1},   {mcra, &Settings::pcm_dump, 1}};
+  for (auto [settings, field, value] : kRefused) {
+    settings.*field = value;
+    EXPECT_EQ(OpenUtteranceStream(&settings), nullptr) << value;
+  }
+  const McraSettings configuration = MCRA_SETTINGS_DEFAULT;
+  mcra.mcra = &configuration;
+  EXPECT_NE(open(mcra), nullptr);
+  mcra.detector = UTTERANCE_CHANNEL_ENERGY;
+  EXPECT_EQ(open(mcra), nullptr) << "a configuration of another detector";
   EXPECT_EQ(OpenUtteranceStream(nullptr), nullptr);
 
   UtteranceSettings largest = good;
   largest.hangover_ms = largest.pad_before_ms = largest.pad_after_ms = INT32_MAX;
-  for (int granted = 0; granted < 2; ++granted) {
-    const auto memory = orvalis::test::ScriptedMalloc::failing(granted);
-    EXPECT_EQ(OpenUtteranceStream(&largest), nullptr) << granted;
+  for (const int32_t detector : {UTTERANCE_MCRA, UTTERANCE_CHANNEL_ENERGY}) {
+    largest.detector = detector;
+    int granted = 0;
+    for (bool opened = false; !opened && granted < 9; granted += !opened) {
+      const auto memory = orvalis::test::ScriptedMalloc::failing(granted);
+      opened = open(largest) != nullptr;
+    }
+    EXPECT_GE(granted, 1);
+    EXPECT_LT(granted, 9);
   }
   const Stream stream = open(largest);
   ASSERT_NE(stream, nullptr);

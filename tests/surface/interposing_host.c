@@ -2,6 +2,7 @@
  * and tables of its own under names that the library exports too, all of them wrong: the library
  * must not notice, and both programs print the same.
  *   interposing_host <RECORDING    (raw 16-bit PCM) */
+#include "Voice_Engine/MCRAvad/MCRAvad.h"
 #include "jni/orvalis.h"
 #include "stream/utterance_stream.h"
 #include "tests/support/read_pcm.h"
@@ -29,6 +30,11 @@ void r_fft_epd(int16_t *buffer, int16_t isign, int32_t band) {
   buffer[0] = (int16_t)(isign + band);
 }
 void r_fft_ns(int16_t *buffer, int16_t isign) { buffer[0] = isign; }
+int32_t ResetEPDparams(EpdInstance *epd) { return epd == NULL; }
+void initialVADINFO(VADINFO **info) { *info = NULL; }
+int32_t processVAD(VADINFO **info, int16_t *frame, int32_t length, float exponent) {
+  return info != NULL && frame[length - 1] > exponent;
+}
 int16_t window[160] = {1, 2, 3};
 int16_t phs_tbl_WB[256] = {1, 2, 3};
 int16_t phs_tbl_256[256] = {1, 2, 3};
@@ -88,8 +94,9 @@ static void print_queries(int32_t samples, int32_t rate_hz) {
   printf("queries at %d Hz: %08lx\n", (int)rate_hz, (unsigned long)folded);
 }
 
-static void print_utterances(int32_t samples) {
+static void print_utterances(int32_t samples, int32_t detector) {
   UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
+  settings.detector = detector;
   UtteranceStream *stream = OpenUtteranceStream(&settings);
   Utterance found;
   PushUtteranceAudio(stream, pcm, samples);
@@ -108,6 +115,7 @@ int main(void) {
   print_answers(samples, 1000, 0);
   print_queries(samples, 16000);
   print_queries(samples, 8000);
-  print_utterances(samples);
+  print_utterances(samples, UTTERANCE_CHANNEL_ENERGY);
+  print_utterances(samples, UTTERANCE_MCRA);
   return 0;
 }

@@ -10,6 +10,7 @@ int main(void) {
   Utterance found;
   int16_t piece[1000];
   int32_t samples;
+  if (OrvalisAbiVersion() != ORVALIS_ABI_VERSION) return 1;
   while ((samples = (int32_t)fread(piece, sizeof piece[0], 1000, stdin)) > 0)
     if (PushUtteranceAudio(stream, piece, samples) != samples) return 1;
   FlushUtteranceStream(stream);

@@ -20,6 +20,14 @@ import java.util.List;
  * is forgotten rather than closed is released when another one is made.
  */
 public final class EndPointDetector implements AutoCloseable {
+  /** Which decisions on frames the utterances are made of. */
+  public enum Method {
+    /** The detector of {@link Loquent}, which confirms speech over several frames. */
+    CHANNEL_ENERGY,
+    /** Follows the noise in every bin of the spectrum and decides each frame at once. */
+    MCRA
+  }
+
   /** Settings of a detector. Times are milliseconds from 0 on. */
   public static final class Settings {
     private final int rateHz;
@@ -28,6 +36,8 @@ public final class EndPointDetector implements AutoCloseable {
     private int hangoverMillis = 500;
     private int padBeforeMillis;
     private int padAfterMillis;
+    private Method method = Method.CHANNEL_ENERGY;
+    private int minSpeechMillis;
 
     private Settings(int rateHz) {
       if (rateHz != 16000 && rateHz != 8000) {
@@ -69,12 +79,29 @@ public final class EndPointDetector implements AutoCloseable {
       return this;
     }
 
+    /** CHANNEL_ENERGY unless set. MCRA takes no input gain and no content type. */
+    public Settings method(Method choice) {
+      if (choice == null) throw new IllegalArgumentException("a method is CHANNEL_ENERGY or MCRA");
+      method = choice;
+      return this;
+    }
+
+    /** What holds less speech, without padding, is no utterance; 0 unless set. */
+    public Settings minSpeechMillis(int millis) {
+      minSpeechMillis = checkTime(millis);
+      return this;
+    }
+
     /**
      * Opens a detector.
      *
+     * @throws IllegalArgumentException if a setting does not go with the method
      * @throws IllegalStateException if memory runs out
      */
     public EndPointDetector open() {
+      if (method == Method.MCRA && (inputGain != 0 || contentType != 0)) {
+        throw new IllegalArgumentException("MCRA takes no input gain and no content type");
+      }
       return new EndPointDetector(this);
     }
 
@@ -92,12 +119,16 @@ public final class EndPointDetector implements AutoCloseable {
     NativeHandle.releaseForgotten();
     long stream =
         SafeLayer.openStream(
-            settings.rateHz,
-            settings.inputGain,
-            settings.contentType,
-            settings.hangoverMillis,
-            settings.padBeforeMillis,
-            settings.padAfterMillis);
+            new int[] {
+              settings.rateHz,
+              settings.inputGain,
+              settings.contentType,
+              settings.hangoverMillis,
+              settings.padBeforeMillis,
+              settings.padAfterMillis,
+              settings.method.ordinal(),
+              settings.minSpeechMillis
+            });
     handle = new NativeHandle(this, stream, SafeLayer::closeStream);
   }
 

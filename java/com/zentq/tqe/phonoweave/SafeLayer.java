@@ -25,14 +25,11 @@ final class SafeLayer {
     }
   }
 
-  /** 0 if memory runs out or a setting is out of range. */
-  static native long openStream(
-      int rateHz,
-      int inputGain,
-      int contentType,
-      int hangoverMillis,
-      int padBeforeMillis,
-      int padAfterMillis);
+  /**
+   * 0 if memory runs out or a setting is refused. The settings are rate, input gain, content type,
+   * hangover, paddings before and after, method and least speech.
+   */
+  static native long openStream(int[] settings);
 
   /** How many samples were taken: fewer when utterances have to be fetched first. */
   static native int pushAudio(long stream, short[] pcm, int offset, int count);
