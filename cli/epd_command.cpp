@@ -95,9 +95,9 @@ Exit status:
 Examples:
   orvalis epd meeting.wav
   orvalis epd --format json --hangover 800 a.flac b.mp3
-  orvalis epd --pad-before 200 --pad-after 300 --channel 2 call.wav
+  orvalis epd --pad-before 0 --pad-after 0 --channel 2 call.wav
   orvalis epd --raw --rate 8000 line.raw
-  orvalis epd --split clips --pad-before 100 --pad-after 100 meeting.wav
+  orvalis epd --split clips --pad-before 300 --pad-after 400 meeting.wav
   orvalis epd --jobs 4 --format csv *.flac >all.csv
   orvalis epd --format labels take.wav >take.txt
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis epd --raw -)";

@@ -63,7 +63,7 @@ Trace:
 
 Examples:
   orvalis vad meeting.wav
-  orvalis vad --format json --min-silence 500 --pad-before 100 a.flac b.mp3
+  orvalis vad --format json --min-silence 500 --pad-before 0 a.flac b.mp3
   orvalis vad --trace meeting.wav >trace.csv
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis vad --history --raw -)";
 

@@ -125,9 +125,10 @@ typedef struct UtteranceSettings {
   void *user; /* what on_frame gets */
 } UtteranceSettings;
 
-/* Channel energy at 16 kHz, no gain, content type 0, half a second of hangover, no padding. */
+/* Channel energy at 16 kHz, no gain, content type 0, half a second of hangover, and padding that
+ * keeps soft beginnings and ends of words. */
 #define UTTERANCE_SETTINGS_DEFAULT \
-  { 16000, 0, 0, 500, 0, 0, 0, UTTERANCE_CHANNEL_ENERGY, 0, 0, 0, 0 }
+  { 16000, 0, 0, 500, 150, 250, 0, UTTERANCE_CHANNEL_ENERGY, 0, 0, 0, 0 }
 
 /* Times are counts of samples since the stream was opened. */
 typedef struct Utterance {

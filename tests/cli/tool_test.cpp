@@ -133,11 +133,14 @@ TEST_F(Tool, OptionsReachTheDetector) {
   EXPECT_GT(epd("--hangover 0 " + kNarrow).size(), plain.size());
   EXPECT_LT(epd("--hangover 2000 " + kNarrow).size(), plain.size());
 
-  const auto padded = epd("--pad-before 70 --pad-after 90 " + kNarrow);
-  ASSERT_EQ(padded.size(), plain.size());
-  for (std::size_t i = 0; i < plain.size(); ++i) {
-    EXPECT_EQ(padded[i]["start_sample"], plain[i]["start_sample"].get<int>() - 70 * 8);
-    EXPECT_EQ(padded[i]["end_sample"], plain[i]["end_sample"].get<int>() + 90 * 8);
+  const auto bare = epd("--pad-before 0 --pad-after 0 " + kNarrow);
+  for (const int more : {0, 20}) {
+    const auto padded = more == 0 ? plain : epd("--pad-before 170 --pad-after 270 " + kNarrow);
+    ASSERT_EQ(padded.size(), bare.size());
+    for (std::size_t i = 0; i < bare.size(); ++i) {
+      EXPECT_EQ(padded[i]["start_sample"], bare[i]["start_sample"].get<int>() - (150 + more) * 8);
+      EXPECT_EQ(padded[i]["end_sample"], bare[i]["end_sample"].get<int>() + (250 + more) * 8);
+    }
   }
 
   EXPECT_LT(epd("--content-type 2 " + kWide)[0]["ended"], epd(kWide)[0]["ended"]);

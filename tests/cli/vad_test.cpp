@@ -117,8 +117,8 @@ TEST_F(Vad, SegmentsAreTheStreams) {
       };
       settings.hangover_ms = 300;
       settings.min_speech_ms = 100;
-      settings.pad_before_ms = UtteranceSettings(UTTERANCE_SETTINGS_DEFAULT).pad_before_ms;
-      settings.pad_after_ms = UtteranceSettings(UTTERANCE_SETTINGS_DEFAULT).pad_after_ms;
+      settings.pad_before_ms = 150;
+      settings.pad_after_ms = 250;
       expect("");
       settings.min_speech_ms = 200;
       settings.pad_before_ms = settings.pad_after_ms = 0;

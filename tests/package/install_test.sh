@@ -37,11 +37,11 @@ check_installation() {
   libraries=$(pkg-config --variable=libdir orvalis)
 
   answer='library 160705
-0.51 s to 2.25 s'
+0.36 s to 2.50 s'
   check "$1: the consumer built by pkg-config" "$answer" \
     "$(LD_LIBRARY_PATH=$libraries "$made/by_pkg_config" <"$recording")"
   check "$1: the consumer built by CMake" "$answer" "$("$made/consumer" <"$recording")"
-  check "$1: the tool" '1 0.510 2.250 1.740' \
+  check "$1: the tool" '1 0.360 2.500 2.140' \
     "$("$2/bin/orvalis" epd --raw - <"$recording" | tail -n 1 | xargs)"
   [ -d "$build/java" ] || return 0
   for jar in orvalis orvalis-sources orvalis-javadoc orvalis-example; do

@@ -27,6 +27,7 @@ struct Span {
 std::vector<Span> utterances_of(const Pcm &pcm, int32_t rate_hz) {
   UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   settings.rate_hz = rate_hz;
+  settings.pad_before_ms = settings.pad_after_ms = 0;  // what the detector itself finds
   UtteranceStream *stream = OpenUtteranceStream(&settings);
   EXPECT_EQ(PushUtteranceAudio(stream, pcm.data(), static_cast<int32_t>(pcm.size())),
             static_cast<int32_t>(pcm.size()));

@@ -34,8 +34,8 @@ public final class EndPointDetector implements AutoCloseable {
     private int inputGain;
     private int contentType;
     private int hangoverMillis = 500;
-    private int padBeforeMillis;
-    private int padAfterMillis;
+    private int padBeforeMillis = 150;
+    private int padAfterMillis = 250;
     private Method method = Method.CHANNEL_ENERGY;
     private int minSpeechMillis;
 
@@ -67,13 +67,13 @@ public final class EndPointDetector implements AutoCloseable {
       return this;
     }
 
-    /** Time to add before an utterance; 0 unless set. Padding never crosses a neighbour. */
+    /** Time to add before an utterance; 150 unless set. Padding never crosses a neighbour. */
     public Settings padBeforeMillis(int millis) {
       padBeforeMillis = checkTime(millis);
       return this;
     }
 
-    /** Time to add after an utterance; 0 unless set. */
+    /** Time to add after an utterance; 250 unless set. */
     public Settings padAfterMillis(int millis) {
       padAfterMillis = checkTime(millis);
       return this;
