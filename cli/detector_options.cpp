@@ -45,6 +45,20 @@ UtteranceOptions add_detector_options(CLI::App &command, UtteranceSettings &dete
       ->check(from_to(0, std::numeric_limits<int>::max()))
       ->type_name("N")
       ->capture_default_str();
+  auto *lead_in = command.add_flag_callback(
+      "--lead-in", [&detector] { detector.lead_in = 1; },
+      "Learn the noise of the first 10 s before they are\njudged, so that a first word counts "
+      "(the default,\nbut not of --raw -)");
+  auto *no_lead_in = command
+                         .add_flag_callback(
+                             "--no-lead-in", [&detector] { detector.lead_in = 0; },
+                             "Judge audio as it comes; speech is not found in\nits first 0.4 s")
+                         ->excludes(lead_in);
+  detector.lead_in = 1;
+  command.parse_complete_callback([&command, &detector, lead_in, no_lead_in] {
+    const bool is_told = lead_in->count() + no_lead_in->count() > 0;
+    if (!is_told && command.count("--raw") > 0) detector.lead_in = kLeadInForFiles;
+  });
   options.split = command
                       .add_option("--split", split.folder,
                                   "Write each utterance to a WAV file of its\nown in this folder")

@@ -24,7 +24,7 @@ struct UtteranceOptions {
 CLI::Option *add_time_option(CLI::App &command, const std::string &option, std::int32_t &ms,
                              const std::string &text);
 
-/// Adds --hangover, --pad-before, --pad-after, --content-type and --split.
+/// Adds --hangover, --pad-before, --pad-after, --content-type, --lead-in and --split.
 UtteranceOptions add_detector_options(CLI::App &command, UtteranceSettings &detector,
                                       SplitSettings &split);
 

@@ -38,6 +38,7 @@ DetectorStage::DetectorStage(std::string name, UtteranceSettings detector, Split
     };
     detector.user = this;
   }
+  if (detector.lead_in == kLeadInForFiles) detector.lead_in = name_ == "-" ? 0 : 1;
   stream_.reset(OpenUtteranceStream(&detector));
   if (!stream_) throw std::bad_alloc();
 }

@@ -21,6 +21,10 @@ struct SplitSettings {
   bool replace = false;  ///< Files that are there already give way
 };
 
+/// UtteranceSettings.lead_in until the input is known: standard input is live, and answered at
+/// once.
+inline constexpr std::int32_t kLeadInForFiles = 2;
+
 /// What a report is told of.
 enum class Reported { kUtterances, kFrames, kTrace };
 

@@ -70,7 +70,8 @@ constexpr const char *kExamples = R"(Input:
   16 kHz, other sample formats rounded to 16 bits; what exceeds full scale clips.
   Several channels are averaged unless --channel picks one.
   "-" reads standard input: WAV (or AIFF, AU, Ogg), or with --raw samples alone.
-  Each utterance is printed the moment it is decided.
+  Each utterance is printed the moment it is decided. Of all but --raw standard input
+  the first 10 s are waited for (--no-lead-in).
 
 Files of utterances:
   --split clips writes take.wav's utterances to clips/take-001.wav, clips/take-002.wav

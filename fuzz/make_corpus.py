@@ -112,10 +112,11 @@ def ns_frame():
         null + number(n) for n in [0, 1, 160, -1, -1 << 31, (1 << 31) - 1])
 
 
-def settings(rate=0, gain=0, content_type=0, hangover=0, before=0, after=0, mcra=0, speech=0):
+def settings(rate=0, gain=0, content_type=0, hangover=0, before=0, after=0, mcra=0, speech=0,
+             lead_in=0):
     """The times are in steps of 5 ms up to 1270 ms, else in ms."""
     return bytes([rate]) + b"".join(
-        map(number, [gain, content_type, hangover, before, after, mcra, speech]))
+        map(number, [gain, content_type, hangover, before, after, mcra, speech, lead_in]))
 
 
 def script(text=""):
@@ -141,6 +142,11 @@ def utterance_stream():
     for name, chosen in {"full_queue": (1,), "full_queue_padded": (1, 0, 0, 0, 1, 2),
                          "widest": (1, 1, -1, widest, widest, widest)}.items():
         yield name, settings(*chosen) + script(bursts) + many + take * 3
+    # The first 10 s are 80000 samples.
+    for name, audio in {"lead_in": speech * 5, "lead_in_flushed": speech, "lead_in_full": many * 8,
+                        "lead_in_short": piece(noise(760)),
+                        "lead_in_of_null": piece(constant(8000, 0)) * 11 + many}.items():
+        yield name, settings(1, hangover=9, lead_in=1) + script() + audio + take * 9 + speech
     yield "late_takes", settings(1) + script(bursts) + piece(noise(4000)) + (
         (piece(voice(400)) + piece(constant(160, 0))) * 9 + take * 5) * 4
     yield "open_end", settings(1, 2, 0, 4, 9, 9) + script("50o 40s 3n 30s") + speech[:13]
@@ -155,6 +161,7 @@ def utterance_stream():
     yield "refused_rate", b"\xff" + number(44100) + settings()[1:] + script() + speech
     yield "refused_padding", settings(before=-1) + script() + speech
     yield "refused_mcra_gain", settings(gain=1, mcra=1) + script() + speech
+    yield "refused_mcra_lead_in", settings(mcra=1, lead_in=1) + script() + speech
 
 
 def enhancement_stream():

@@ -17,7 +17,7 @@ using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 using Samples = std::vector<std::int16_t>;
 
-constexpr std::size_t kMostSamples = 24000;
+constexpr std::size_t kMostSamples = 96000;  // more than a lead-in is made of at 8 kHz
 
 /// The utterances taken so far, each judged as it comes.
 class Findings {
@@ -149,15 +149,21 @@ UtteranceSettings read_settings(Input &input) {
   settings.pad_after_ms = read_ms(input);
   settings.detector = input.number();
   settings.min_speech_ms = read_ms(input);
+  settings.lead_in = input.number();
   return settings;
 }
 
+bool is_from(std::int32_t value, std::int32_t least, std::int32_t most) {
+  return value >= least && value <= most;
+}
+
 bool is_valid(const UtteranceSettings &settings) {
-  const bool takes_input = settings.detector == UTTERANCE_MCRA
-                               ? settings.input_gain == 0 && settings.content_type == 0
-                               : settings.detector == UTTERANCE_CHANNEL_ENERGY &&
-                                     settings.input_gain >= 0 && settings.input_gain <= 2;
-  return takes_input && (settings.rate_hz == 16000 || settings.rate_hz == 8000) &&
+  const bool is_mcra = settings.detector == UTTERANCE_MCRA;
+  return (settings.rate_hz == 16000 || settings.rate_hz == 8000) &&
+         is_from(settings.detector, UTTERANCE_CHANNEL_ENERGY, UTTERANCE_MCRA) &&
+         is_from(settings.input_gain, 0, is_mcra ? 0 : 2) &&
+         is_from(settings.lead_in, 0, is_mcra ? 0 : 1) &&
+         (!is_mcra || settings.content_type == 0) &&
          std::min({settings.hangover_ms, settings.pad_before_ms, settings.pad_after_ms,
                    settings.min_speech_ms}) >= 0;
 }

@@ -24,7 +24,7 @@ jlong JNICALL open_stream(JNIEnv *env, jclass, jintArray values) {
   UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   int32_t *const fields[] = {&settings.rate_hz,     &settings.input_gain,    &settings.content_type,
                              &settings.hangover_ms, &settings.pad_before_ms, &settings.pad_after_ms,
-                             &settings.detector,    &settings.min_speech_ms};
+                             &settings.detector,    &settings.min_speech_ms, &settings.lead_in};
   jint given[std::size(fields)];
   if (values == nullptr || env->GetArrayLength(values) != jint{std::size(fields)}) return 0;
   env->GetIntArrayRegion(values, 0, jint{std::size(fields)}, given);

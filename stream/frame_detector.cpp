@@ -7,6 +7,7 @@
 #include "Voice_Engine/MCRAvad/mcra_detector.h"
 #include "Voice_Engine/channel/frame_screening.h"
 #include "Voice_Engine/epd/epd_instance.h"
+#include "stream/lead_in.h"
 
 namespace orvalis {
 
@@ -67,6 +68,19 @@ FrameDetector::Decision FrameDetector::process(const int16_t *frame) {
   const bool is_null = is_null_frame(frame, frame_samples_, small_samples);
   EpdReasons reasons;
   return {EPD_Proc_Frame(epd_, frame, frame_samples_, content_type_, reasons) == 1, is_null};
+}
+
+void FrameDetector::lead_in(const int16_t *window) {
+  const Word32 pcm_dump = epd_->pcmDumpEnabled;
+  epd_->pcmDumpEnabled = 0;
+  EpdReasons unused;
+  for (int32_t i = 0; i < kLeadInFrames; ++i) {
+    Word16 frame[kMaxFrameSamples];
+    make_lead_in_frame(window, frame_samples_, i, frame);
+    EPD_Proc_Frame(epd_, frame, frame_samples_, content_type_, unused);
+  }
+  epd_->pcmDumpEnabled = pcm_dump;
+  reset_ALL_EPDparams(epd_);
 }
 
 }  // namespace orvalis

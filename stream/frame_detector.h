@@ -30,6 +30,10 @@ public:
   /// Judges a frame of decision_timing().frame_samples, which stays as it is.
   Decision process(const int16_t *frame);
 
+  /// Lets the channel-energy detector learn the noise from 100 ms. No dump and no utterance holds
+  /// them.
+  void lead_in(const int16_t *window);
+
   /// The MCRA detector's record; null for the other one.
   const VADINFO *mcra() const { return mcra_; }
 

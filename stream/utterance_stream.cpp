@@ -6,15 +6,20 @@
 
 #include "Voice_Engine/platform/export.h"
 #include "stream/frame_detector.h"
+#include "stream/lead_in.h"
 #include "stream/utterance_finder.h"
 
 struct UtteranceStream {
-  UtteranceStream(const UtteranceSettings &settings, const orvalis::FrameDetector &opened)
+  UtteranceStream(const UtteranceSettings &settings, const orvalis::FrameDetector &opened,
+                  int32_t room, int16_t *memory)
       : detector(opened),
         finder(orvalis::finder_settings(settings, orvalis::decision_timing(settings))),
         frame_samples(orvalis::decision_timing(settings).frame_samples),
         on_frame(settings.on_frame),
-        user(settings.user) {}
+        user(settings.user),
+        leads_in(settings.lead_in == 1),
+        held(memory),
+        held_room(room) {}
 
   orvalis::FrameDetector detector;
   orvalis::UtteranceFinder finder;
@@ -22,11 +27,18 @@ struct UtteranceStream {
   int32_t frame_samples;
   void (*on_frame)(const UtteranceFrame *frame, void *user);
   void *user;
+
+  bool leads_in;  // and has not yet
   bool flushed = false;
+  bool finished = false;
   int64_t pushed = 0;
   int64_t judged = 0;
-  int32_t filled = 0;
-  int16_t frame[orvalis::kMaxFrameSamples] = {};
+
+  // Audio waits here until there is a frame of it, or at first what the lead-in is made of.
+  int16_t *held;
+  int32_t held_room;
+  int32_t held_samples = 0;
+  int32_t held_judged = 0;
 };
 
 namespace {
@@ -38,17 +50,31 @@ bool is_valid(const UtteranceSettings &settings) {
     return false;
   }
   if (settings.detector == UTTERANCE_MCRA) {
-    return settings.input_gain == 0 && settings.content_type == 0 && settings.pcm_dump == 0;
+    return settings.input_gain == 0 && settings.content_type == 0 && settings.pcm_dump == 0 &&
+           settings.lead_in == 0;
   }
   return settings.detector == UTTERANCE_CHANNEL_ENERGY && settings.mcra == nullptr &&
-         settings.input_gain >= 0 && settings.input_gain <= 2;
+         settings.input_gain >= 0 && settings.input_gain <= 2 && settings.lead_in >= 0 &&
+         settings.lead_in <= 1;
 }
 
-void judge_frame(UtteranceStream &stream) {
-  const auto [speech, is_null] = stream.detector.process(stream.frame);
+/// Most samples that a stream holds before it judges them.
+int32_t room_for_held(const UtteranceSettings &settings) {
+  const int32_t frame_samples = orvalis::decision_timing(settings).frame_samples;
+  return settings.lead_in == 1 ? orvalis::kLeadInSearch * frame_samples : frame_samples;
+}
+
+void lead_in(UtteranceStream &stream) {
+  const int32_t frames = stream.held_samples / stream.frame_samples;
+  const int16_t *window = orvalis::quietest_window(stream.held, frames, stream.frame_samples);
+  if (window != nullptr) stream.detector.lead_in(window);
+}
+
+void judge_frame(UtteranceStream &stream, const int16_t *pcm) {
+  const auto [speech, is_null] = stream.detector.process(pcm);
   if (stream.on_frame != nullptr) {
     const UtteranceFrame frame = {.start = stream.judged,
-                                  .pcm = stream.frame,
+                                  .pcm = pcm,
                                   .samples = stream.frame_samples,
                                   .speech = speech,
                                   .mcra = stream.detector.mcra()};
@@ -56,7 +82,26 @@ void judge_frame(UtteranceStream &stream) {
   }
   stream.judged += stream.frame_samples;
   stream.finder.process(speech, is_null, stream.queue);
-  stream.filled = 0;
+}
+
+/// Judges the held audio if it is due: when it fills its room, or when no more will come. Stops at
+/// a full queue, to go on when called again.
+void judge_held(UtteranceStream &stream) {
+  if (stream.held_samples < stream.held_room && !stream.flushed) return;
+  if (stream.leads_in) lead_in(stream);
+  stream.leads_in = false;
+  while (stream.held_judged + stream.frame_samples <= stream.held_samples) {
+    if (stream.queue.is_full()) return;
+    judge_frame(stream, stream.held + stream.held_judged);
+    stream.held_judged += stream.frame_samples;
+  }
+  if (!stream.flushed) {
+    stream.held_room = stream.frame_samples;
+    stream.held_samples = stream.held_judged = 0;
+  } else if (!stream.finished) {
+    stream.finder.finish(stream.pushed, stream.queue);
+    stream.finished = true;
+  }
 }
 
 }  // namespace
@@ -67,12 +112,15 @@ ORVALIS_EXPORT UtteranceStream *OpenUtteranceStream(const UtteranceSettings *set
   if (settings == nullptr || !is_valid(*settings)) return nullptr;
   orvalis::FrameDetector detector;
   if (!detector.open(*settings)) return nullptr;
-  void *memory = std::malloc(sizeof(UtteranceStream));
+  const int32_t room = room_for_held(*settings);
+  void *memory =
+      std::malloc(sizeof(UtteranceStream) + static_cast<std::size_t>(room) * sizeof(int16_t));
   if (memory == nullptr) {
     detector.close();
     return nullptr;
   }
-  return new (memory) UtteranceStream(*settings, detector);
+  auto *held = reinterpret_cast<int16_t *>(static_cast<UtteranceStream *>(memory) + 1);
+  return new (memory) UtteranceStream(*settings, detector, room, held);
 }
 
 ORVALIS_EXPORT int32_t PushUtteranceAudio(UtteranceStream *stream, const int16_t *pcm,
@@ -80,20 +128,22 @@ ORVALIS_EXPORT int32_t PushUtteranceAudio(UtteranceStream *stream, const int16_t
   if (stream == nullptr || stream->flushed || numSample < 0 || (pcm == nullptr && numSample > 0)) {
     return -1;
   }
+  judge_held(*stream);
   int32_t taken = 0;
   while (taken < numSample && !stream->queue.is_full()) {
-    const int32_t piece = std::min(numSample - taken, stream->frame_samples - stream->filled);
-    std::copy_n(pcm + taken, piece, stream->frame + stream->filled);
-    stream->filled += piece;
+    const int32_t piece = std::min(numSample - taken, stream->held_room - stream->held_samples);
+    std::copy_n(pcm + taken, piece, stream->held + stream->held_samples);
+    stream->held_samples += piece;
+    stream->pushed += piece;
     taken += piece;
-    if (stream->filled == stream->frame_samples) judge_frame(*stream);
+    judge_held(*stream);
   }
-  stream->pushed += taken;
   return taken;
 }
 
 ORVALIS_EXPORT int32_t NextUtterance(UtteranceStream *stream, Utterance *utterance) {
   if (stream == nullptr || utterance == nullptr) return -1;
+  judge_held(*stream);
   return stream->queue.pop(*utterance) ? 1 : 0;
 }
 
@@ -105,9 +155,9 @@ ORVALIS_EXPORT int64_t EarliestUtteranceStart(const UtteranceStream *stream) {
 
 ORVALIS_EXPORT int32_t FlushUtteranceStream(UtteranceStream *stream) {
   if (stream == nullptr) return -1;
-  if (!stream->flushed) stream->finder.finish(stream->pushed, stream->queue);
   stream->flushed = true;
-  return stream->filled;
+  judge_held(*stream);
+  return static_cast<int32_t>(stream->pushed % stream->frame_samples);
 }
 
 ORVALIS_EXPORT int32_t CloseUtteranceStream(UtteranceStream *stream) {

@@ -65,6 +65,21 @@
  * holds less than `min_speech_ms` is left out. Padding lengthens an utterance but never crosses a
  * neighbour: each of two owns half of the gap between them.
  *
+ *
+ * The first word of a recording
+ * -----------------------------
+ * The channel-energy detector learns the noise first and never decides for speech in its first 39
+ * frames, so that a recording that begins with speech seems to begin with it after 0.39 s. With
+ * `lead_in` the detector hears 0.6 s ahead of the recording that are made of it: the 100 ms of least
+ * variance among the first 10 s, without null audio, forwards and backwards in turn. Nothing else
+ * knows of them: positions, frames and dump files are those of the audio alone.
+ *
+ * For that the stream holds the first 10 s (in 320 KB at 16 kHz). Utterances among them come when
+ * they are complete, or with the flush; what they decide is worked out in the calls that complete
+ * them and take the utterances, in the time of 1060 frames at most. Live audio does without: there
+ * the first 0.39 s are a pause as a rule.
+ *
+ *
  * Threads: as for an EPD instance. Memory: all of it is taken in OpenUtteranceStream.
  */
 #ifndef ORVALIS_UTTERANCE_STREAM_H
@@ -115,6 +130,7 @@ typedef struct UtteranceSettings {
   int32_t pcm_dump;      /* 1 writes the detector's dump files; see InitializeEPD in orvalis.h */
   int32_t detector;      /* UTTERANCE_CHANNEL_ENERGY or UTTERANCE_MCRA */
   int32_t min_speech_ms; /* 0 or more: less speech, without padding, is no utterance */
+  int32_t lead_in;       /* 1: for recordings, whose first word may come at once; see above */
 
   /* Read by OpenUtteranceStream. NULL: MCRA_SETTINGS_DEFAULT, or another detector. */
   const McraSettings *mcra;
@@ -128,7 +144,7 @@ typedef struct UtteranceSettings {
 /* Channel energy at 16 kHz, no gain, content type 0, half a second of hangover, and padding that
  * keeps soft beginnings and ends of words. */
 #define UTTERANCE_SETTINGS_DEFAULT \
-  { 16000, 0, 0, 500, 150, 250, 0, UTTERANCE_CHANNEL_ENERGY, 0, 0, 0, 0 }
+  { 16000, 0, 0, 500, 150, 250, 0, UTTERANCE_CHANNEL_ENERGY, 0, 0, 0, 0, 0 }
 
 /* Times are counts of samples since the stream was opened. */
 typedef struct Utterance {
@@ -164,8 +180,8 @@ int32_t NextUtterance(UtteranceStream *stream, Utterance *utterance);
 int64_t EarliestUtteranceStart(const UtteranceStream *stream);
 
 /*
- * Ends the audio and closes what is open; there is always room for it in the queue. Returns the
- * number of samples behind the last whole frame, which were not judged (0..159), also when called
+ * Ends the audio and closes what is open. Whatever the queue holds, NextUtterance then hands out all
+ * that is left. Returns the number of samples behind the last whole frame, which were not judged (0..159), also when called
  * again; -1 if stream is NULL.
  */
 int32_t FlushUtteranceStream(UtteranceStream *stream);

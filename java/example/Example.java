@@ -45,7 +45,7 @@ public final class Example {
     }
     ByteOrder order = format.isBigEndian() ? ByteOrder.BIG_ENDIAN : ByteOrder.LITTLE_ENDIAN;
     byte[] bytes = new byte[8192];
-    try (EndPointDetector detector = EndPointDetector.at(rateHz).open()) {
+    try (EndPointDetector detector = EndPointDetector.at(rateHz).leadIn(true).open()) {
       for (int count = audio.read(bytes); count > 0; count = audio.read(bytes)) {
         short[] samples = new short[count / 2];
         ByteBuffer.wrap(bytes, 0, count).order(order).asShortBuffer().get(samples);

@@ -65,7 +65,7 @@ TEST_F(Outputs, StreamsBeginBeforeTheInputEnds) {
   // What was streamed can be read as it comes, and once it is a file.
   const std::string streamed = child.output();
   EXPECT_EQ(samples_of(streamed.substr(kWavHeader)), through("denoise", speech));
-  const auto expected = unnamed("--raw -", streamed.substr(kWavHeader));
+  const auto expected = unnamed("--raw --lead-in -", streamed.substr(kWavHeader));
   EXPECT_FALSE(expected.empty());
   EXPECT_EQ(unnamed("-", streamed), expected);
   EXPECT_EQ(unnamed(write("streamed.wav", streamed)), expected);

@@ -53,7 +53,7 @@ TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
 
     EXPECT_EQ(unnamed("-", wav), expected);
     EXPECT_EQ(unnamed("- <" + path), expected);
-    EXPECT_EQ(unnamed(raw + "-", samples), expected);
+    EXPECT_EQ(unnamed(raw + "--lead-in -", samples), expected);
     EXPECT_EQ(unnamed(raw + write("samples", samples)), expected);
 
     // A live recorder's header, which cannot tell the length, and the same audio in two channels.
@@ -62,15 +62,21 @@ TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
     std::string doubled;
     for (std::size_t i = 0; i + 1 < samples.size(); i += 2)
       doubled += samples.substr(i, 2) + samples.substr(i, 2);
-    EXPECT_EQ(unnamed(raw + "--channels 2 -", doubled), expected);
+    EXPECT_EQ(unnamed(raw + "--lead-in --channels 2 -", doubled), expected);
+
+    // Live samples are not waited for.
+    const auto at_once = unnamed("--no-lead-in " + path);
+    EXPECT_EQ(unnamed(raw + "-", samples), at_once);
+    EXPECT_GT(at_once[0]["start"], expected[0]["start"]);
   }
 }
 
 TEST_F(Tool, PiecesOnAPipeDoNotMatter) {
-  const auto expected = unnamed(kWide);
   const std::string samples = read_file(kWide).substr(kWavHeader);
   for (const std::size_t piece : {1, 7, 160, 1000}) {
-    ChildProcess child(command("epd --format json --raw -"), folder_.path());
+    const std::string options = piece == 7 ? "--lead-in " : "--no-lead-in ";
+    const auto expected = unnamed(options + kWide);
+    ChildProcess child(command("epd --format json --raw - " + options), folder_.path());
     for (std::size_t at = 0; at < samples.size(); at += 2 * piece)
       child.write(samples.substr(at, 2 * piece));
     EXPECT_EQ(child.finish(), 0);
@@ -253,6 +259,7 @@ TEST_F(Tool, WrongUsageEndsWith2) {
                                       "epd --raw --channels 0 x",
                                       "epd --content-type -1 x",
                                       "epd --frames --hangover 9 x",
+                                      "epd --lead-in --no-lead-in x",
                                       "epd - -",
                                       "epd --jobs 0 x",
                                       "epd --jobs 2 --log x",
@@ -284,7 +291,7 @@ TEST_F(Tool, LiveAudioIsAnsweredBeforeItEnds) {
   EXPECT_EQ(child.output().find("\n        2 "), std::string::npos);
   child.write(samples.substr(2 * 8000 * 33 / 10));
   EXPECT_EQ(child.finish(), 0);
-  EXPECT_EQ(child.output(), run("epd " + kNarrow).out);
+  EXPECT_EQ(child.output(), run("epd --no-lead-in " + kNarrow).out);
 }
 
 TEST_F(Tool, OutputThatFailsEndsWith1) {

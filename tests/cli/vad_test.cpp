@@ -155,7 +155,8 @@ TEST_F(Vad, FormatsJobsAndRefusalsAreThoseOfEpd) {
 
 TEST_F(Vad, TraceOfEpdGivesAnswersAndLevels) {
   const Pcm pcm = load_recording(kWide);
-  const auto lines = json_lines(run("epd --trace --format json --content-type 2 " + kWide).out);
+  const auto lines =
+      json_lines(run("epd --trace --no-lead-in --format json --content-type 2 " + kWide).out);
   ASSERT_EQ(lines.size(), pcm.size() / 160);
   SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
   EpdInstance *epd = InitializeEPD(0, 0);

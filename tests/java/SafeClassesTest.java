@@ -130,7 +130,7 @@ class SafeClassesTest {
   /** With the delayed first channel in the output, which is what comes where nothing is suppressed. */
   @Test
   void settingsReachTheDetector() {
-    short[] pcm = Audio.command();
+    short[] pcm = Arrays.copyOfRange(Audio.command(), 8000, 40_000); // begins with speech
     List<Integer> whole = List.of(pcm.length);
     EndPointDetector.Settings settings = EndPointDetector.at(16000);
     String plain = utterances(settings, pcm, whole);
@@ -138,6 +138,10 @@ class SafeClassesTest {
     assertFalse(plain.isEmpty());
     assertFalse(mcra.isEmpty());
     assertFalse(plain.equals(mcra));
+    assertMisuse(() -> settings.leadIn(true).open(), IllegalArgumentException.class);
+    settings.method(EndPointDetector.Method.CHANNEL_ENERGY);
+    assertFalse(plain.equals(utterances(settings, pcm, whole)));
+    settings.method(EndPointDetector.Method.MCRA).leadIn(false);
     assertEquals("", utterances(settings.minSpeechMillis(60_000), pcm, whole));
     assertMisuse(() -> settings.contentType(2).open(), IllegalArgumentException.class);
     assertMisuse(() -> settings.contentType(0).inputGain(1).open(), IllegalArgumentException.class);

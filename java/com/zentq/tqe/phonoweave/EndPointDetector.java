@@ -38,6 +38,7 @@ public final class EndPointDetector implements AutoCloseable {
     private int padAfterMillis = 250;
     private Method method = Method.CHANNEL_ENERGY;
     private int minSpeechMillis;
+    private boolean leadIn;
 
     private Settings(int rateHz) {
       if (rateHz != 16000 && rateHz != 8000) {
@@ -79,7 +80,7 @@ public final class EndPointDetector implements AutoCloseable {
       return this;
     }
 
-    /** CHANNEL_ENERGY unless set. MCRA takes no input gain and no content type. */
+    /** CHANNEL_ENERGY unless set. MCRA takes no input gain, content type or lead-in. */
     public Settings method(Method choice) {
       if (choice == null) throw new IllegalArgumentException("a method is CHANNEL_ENERGY or MCRA");
       method = choice;
@@ -93,14 +94,23 @@ public final class EndPointDetector implements AutoCloseable {
     }
 
     /**
+     * For recordings, whose first word may come at once: the detector waits for the first 10 s and
+     * learns the noise from their quietest part. Off unless set; live audio does without.
+     */
+    public Settings leadIn(boolean wanted) {
+      leadIn = wanted;
+      return this;
+    }
+
+    /**
      * Opens a detector.
      *
      * @throws IllegalArgumentException if a setting does not go with the method
      * @throws IllegalStateException if memory runs out
      */
     public EndPointDetector open() {
-      if (method == Method.MCRA && (inputGain != 0 || contentType != 0)) {
-        throw new IllegalArgumentException("MCRA takes no input gain and no content type");
+      if (method == Method.MCRA && (inputGain != 0 || contentType != 0 || leadIn)) {
+        throw new IllegalArgumentException("MCRA takes no input gain, content type or lead-in");
       }
       return new EndPointDetector(this);
     }
@@ -127,7 +137,8 @@ public final class EndPointDetector implements AutoCloseable {
               settings.padBeforeMillis,
               settings.padAfterMillis,
               settings.method.ordinal(),
-              settings.minSpeechMillis
+              settings.minSpeechMillis,
+              settings.leadIn ? 1 : 0
             });
     handle = new NativeHandle(this, stream, SafeLayer::closeStream);
   }

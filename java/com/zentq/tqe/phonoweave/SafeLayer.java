@@ -27,7 +27,7 @@ final class SafeLayer {
 
   /**
    * 0 if memory runs out or a setting is refused. The settings are rate, input gain, content type,
-   * hangover, paddings before and after, method and least speech.
+   * hangover, paddings before and after, method, least speech and lead-in.
    */
   static native long openStream(int[] settings);
 
