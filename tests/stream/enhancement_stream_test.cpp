@@ -255,7 +255,7 @@ TEST_F(EnhancementStreamTest, CountsWhatIsLoudAndClipped) {
   // A second of a tone that is not loud, then half a second of one that is and clips.
   Pcm tone;
   for (int i = 0; i < 24000; ++i)
-    tone.push_back(to_sample((i < 16000 ? 2000 : 40000) * std::sin(i * 0.1)));
+    tone.push_back(to_sample((i < 16050 ? 2000 : 40000) * std::sin(i * 0.1)));
   const auto clipped = [](const Pcm &samples) -> EnhancementCount {
     EnhancementCount found = {0, -1};
     for (std::size_t i = 0; i < samples.size(); ++i)
@@ -268,6 +268,8 @@ TEST_F(EnhancementStreamTest, CountsWhatIsLoudAndClipped) {
     for (const std::int16_t sample : tone) in.insert(in.end(), microphones, sample);
     const Stream stream = open({microphones, 0, 1, 1});
     EnhancementCounts counts;
+    GetEnhancementCounts(stream.get(), &counts);
+    EXPECT_EQ(values_of(counts), (std::vector<std::int64_t>{0, -1, 0, -1, 0, -1, 0}));
     push(stream, microphones, in, out);
     GetEnhancementCounts(stream.get(), &counts);
     const EnhancementCount before = clipped(tone), after = clipped(out);
@@ -281,7 +283,7 @@ TEST_F(EnhancementStreamTest, CountsWhatIsLoudAndClipped) {
   }
 }
 
-TEST_F(EnhancementStreamTest, RefusesBadArgumentsAndWantOfMemory) {
+TEST_F(EnhancementStreamTest, RefusesBadArguments) {
   const EnhancementSettings good = ENHANCEMENT_SETTINGS_DEFAULT;
   EXPECT_EQ(OpenEnhancementStream(nullptr), nullptr);
   for (const EnhancementSettings &bad : {EnhancementSettings{0, 0, 0, 1},
@@ -294,11 +296,6 @@ TEST_F(EnhancementStreamTest, RefusesBadArgumentsAndWantOfMemory) {
                                          {1, 13, -1, 1},
                                          {1, 13, 0, 2}})
     EXPECT_EQ(OpenEnhancementStream(&bad), nullptr) << describe(bad);
-  for (int granted = 0; granted < 3; ++granted) {
-    const auto memory = ScriptedMalloc::failing(granted);
-    const EnhancementSettings both = {2, 13, 1, 1};
-    EXPECT_EQ(OpenEnhancementStream(&both), nullptr) << granted;
-  }
   EXPECT_EQ(EnhancementDelay(nullptr), -1);
   EXPECT_EQ(PushEnhancementAudio(nullptr, nullptr, 0, nullptr, 0), -1);
   EXPECT_EQ(FlushEnhancementStream(nullptr, nullptr, 0), -1);
@@ -390,6 +387,10 @@ TEST_F(EnhancementStreamTest, TakesItsMemoryWhenItOpensAndGivesItBack) {
   open_and_close();  // what the C library keeps for itself is kept now
   const auto before = in_use();
   for (int round = 0; round < 2000; ++round) open_and_close();
+  for (int granted = 0; granted < 3; ++granted) {
+    const auto memory = ScriptedMalloc::failing(granted);
+    EXPECT_EQ(OpenEnhancementStream(&both), nullptr) << granted;
+  }
   EXPECT_EQ(in_use(), before);
 
   const Stream stream = open(both);
