@@ -20,14 +20,16 @@ using test::NoiseColour;
 using test::Pcm;
 
 constexpr std::size_t kRate = 16000;
-constexpr std::size_t kFrame = 160;
+constexpr std::size_t kFrame = ORVALIS_FRAME_16K;
 
 struct Suppressor {
   int mode;
   std::size_t microphones;
   std::size_t delay;
 };
-constexpr Suppressor kSuppressors[] = {{0, 1, 48}, {2, 1, 48}, {0, 2, 160}};
+constexpr Suppressor kSuppressors[] = {{ORVALIS_NS_13DB, 1, ORVALIS_NS_DELAY_1MIC},
+                                       {ORVALIS_NS_18DB, 1, ORVALIS_NS_DELAY_1MIC},
+                                       {ORVALIS_NS_13DB, 2, ORVALIS_NS_DELAY_2MIC}};
 
 /// The first microphone without its noise, no later than it. The second is not always listened to.
 Pcm suppressed(const Suppressor &suppressor, const Pcm &first, const Pcm &second) {
