@@ -17,6 +17,7 @@
  *     chunks of any size, not delayed
  *   a decision on each frame, confirmed over   InitializeEPD and others    here
  *     several frames, noise suppressed before
+ *   what led to it                             ProcessEPDFrameExplained    here, epd_reasons.h
  *   a decision on each frame at once, and      processVAD, explainVAD      MCRAvad.h
  *     what led to it: the MCRA detector
  *   noise suppression frame by frame           InitializeDoNS and others   here
@@ -196,9 +197,9 @@ int32_t ProcessEPDFrameByMode(EpdInstance *epd, const int16_t *pcm, int32_t numS
                               int32_t mode);
 
 /*
- * The same as ProcessEPDFrameByCnttype, and why: `reasons` is set to those of the last frame of the
- * buffer that was judged (see epd_reasons.h), or left alone if the call returns -1 because pcm is
- * NULL. It may be NULL.
+ * Does what ProcessEPDFrameByCnttype does, and tells why: sets `reasons` to what led to the
+ * decision on the last frame of the buffer that was processed (see epd_reasons.h). `reasons` may be
+ * NULL. It stays as it is if the call returns -1 because pcm is NULL.
  */
 int32_t ProcessEPDFrameExplained(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
                                  int32_t contentType, EpdReasons *reasons);
