@@ -33,7 +33,7 @@ std::vector<std::int32_t> energy_of(std::span<const std::int16_t> block, int) {
 }
 
 std::vector<std::int32_t> spectrum_of(std::span<const std::int16_t> block, int rate_hz) {
-  std::vector<std::int32_t> bins(rate_hz == 16000 ? 128 : 64);
+  std::vector<std::int32_t> bins(rate_hz == 16000 ? ORVALIS_BINS_16K : ORVALIS_BINS_8K);
   getSpectrum(block.data(), bins.data(), rate_hz);
   return bins;
 }
@@ -41,7 +41,7 @@ std::vector<std::int32_t> spectrum_of(std::span<const std::int16_t> block, int r
 std::vector<std::string> energy_columns(int) { return {"energy"}; }
 
 std::vector<std::string> spectrum_columns(int rate_hz) {
-  std::vector<std::string> names(rate_hz == 16000 ? 128 : 64);
+  std::vector<std::string> names(rate_hz == 16000 ? ORVALIS_BINS_16K : ORVALIS_BINS_8K);
   for (std::size_t i = 0; i < names.size(); ++i) names[i] = fmt::format("bin{}", i);
   return names;
 }

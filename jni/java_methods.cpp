@@ -143,8 +143,8 @@ LOQUENT(jint, processDoNSFrame)
 LOQUENT(jint, getSpectrum)
 (JNIEnv *env, jobject, jshortArray pcm, jintArray spectrum, jint rate_hz) {
   constexpr char kMethod[] = "getSpectrum";
-  constexpr jint kSamples = 160;
-  constexpr jint kBins = 128;
+  constexpr jint kSamples = ORVALIS_FRAME_16K;
+  constexpr jint kBins = ORVALIS_BINS_16K;
   if (judge(env, kMethod, pcm, kSamples) != Access::kSamples ||
       judge(env, kMethod, spectrum, kBins) != Access::kSamples)
     return 0;

@@ -6,14 +6,15 @@
 
 int report_speech(const int16_t *pcm, int32_t samples)
 {
-    EpdInstance *epd = InitializeEPD(0, 0);    // 16 kHz, no dump files
+    EpdInstance *epd = InitializeEPD(ORVALIS_EPD_16K, 0);    // no dump files
     int32_t previous = 0;
     if (epd == NULL)
         return -1;
-    for (int32_t at = 0; at + 160 <= samples; at += 160) {
-        int32_t speech = ProcessEPDFrame(epd, pcm + at, 160);
+    for (int32_t at = 0; at + ORVALIS_FRAME_16K <= samples; at += ORVALIS_FRAME_16K) {
+        int32_t speech = ProcessEPDFrame(epd, pcm + at, ORVALIS_FRAME_16K);
         if (speech != previous)
-            printf("%s after %.2f s\n", speech ? "speech" : "silence", (at + 160) / 16000.0);
+            printf("%s after %.2f s\n", speech ? "speech" : "silence",
+                   (at + ORVALIS_FRAME_16K) / 16000.0);
         previous = speech;
     }
     return FreeMemoryEPD(epd);
