@@ -9,7 +9,6 @@
 
 #include "cli/audio_source.h"
 #include "cli/excerpts.h"
-#include "cli/report_input.h"
 
 namespace orvalis::cli {
 namespace {
@@ -34,20 +33,22 @@ void detect(const std::string &name, const DetectionSettings &settings, Report &
     detector.hangover_ms = hangover_ms(settings.min_silence_ms, detector.rate_hz);
   }
 
-  report_input(name, source, report, [&] {
-    std::unique_ptr<Excerpts> excerpts;
-    if (!settings.split.folder.empty())
-      excerpts = make_excerpts(name, settings.audio, source.rate_hz());
-    DetectorStage stage(name, detector, settings.split, std::move(excerpts), report,
-                        settings.reported);
-    std::vector<std::int16_t> passed;
-    for (auto piece = source.read(); !piece.empty(); piece = source.read()) {
-      passed.clear();
-      stage.push(piece, passed);
-      advanced(advance_of(name, source, began));
-    }
-    stage.flush(passed);
-  });
+  report.begin_file(name, source.rate_hz());
+  std::unique_ptr<Excerpts> excerpts;
+  if (!settings.split.folder.empty())
+    excerpts = make_excerpts(name, settings.audio, source.rate_hz());
+  DetectorStage stage(name, detector, settings.split, std::move(excerpts), report,
+                      settings.reported);
+  std::vector<std::int16_t> passed;
+  for (auto piece = source.read(); !piece.empty(); piece = source.read()) {
+    passed.clear();
+    stage.push(piece, passed);
+    advanced(advance_of(name, source, began));
+  }
+  stage.flush(passed);
+  report.end_file(source.samples_read());
+  // Last, so that a damaged file still gives what could be decided.
+  source.check_complete();
 }
 
 }  // namespace orvalis::cli

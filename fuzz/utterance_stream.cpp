@@ -51,9 +51,16 @@ private:
 /// A stream from which utterances are taken.
 class Listener {
 public:
-  explicit Listener(const UtteranceSettings &settings)
-      : frame_samples_(orvalis::decision_timing(settings).frame_samples),
-        stream_(OpenUtteranceStream(&settings)) {
+  explicit Listener(UtteranceSettings settings)
+      : frame_samples_(orvalis::decision_timing(settings).frame_samples) {
+    settings.on_frame = [](const UtteranceFrame *frame, void *user) {
+      auto &judged = static_cast<Listener *>(user)->judged_;
+      require(frame->start == judged, "frames follow one another");
+      require(frame->speech == 0 || frame->speech == 1, "a decision is 0 or 1");
+      judged += frame->samples;
+    };
+    settings.user = this;
+    stream_ = OpenUtteranceStream(&settings);
     require(stream_ != nullptr, "valid settings open a stream");
   }
   ~Listener() { require(CloseUtteranceStream(stream_) == 0, "a stream is released"); }
@@ -98,12 +105,14 @@ public:
     const std::int16_t sample = 1;
     require(PushUtteranceAudio(stream_, &sample, 1) == -1, "no audio is taken after the flush");
     take_all();
+    require(judged_ == pushed_ / frame_samples_ * frame_samples_, "every whole frame is judged");
   }
 
 private:
   std::int32_t frame_samples_;
-  UtteranceStream *stream_;
+  UtteranceStream *stream_ = nullptr;
   std::int64_t pushed_ = 0;
+  std::int64_t judged_ = 0;
   Findings findings_;
 };
 

@@ -45,17 +45,17 @@
  *
  * From decisions to utterances
  * ----------------------------
- * A run of decisions for speech is a piece. A piece is dated back by the detector's own delay,
- * clipped to the input and to the previous piece:
+ * A run of decisions for speech is a piece. A piece is dated back by the detector's own delay, here
+ * in ms, clipped to the input and to the previous piece:
  *
- *   detector         a frame   start       end at 16 kHz   end at 8 kHz
- *   channel energy   10 ms     5 frames    25 frames       28 frames
- *     content type
- *     2 and more     10 ms     3 frames    14 frames       17 frames
- *   MCRA             160       as it is    as it is        as it is
- *                    samples
+ *   detector         content type   start   end at 16 kHz   end at 8 kHz
+ *   channel energy   0, 1           50      250             280
+ *                    2 and more     30      140             170
+ *   MCRA             0              0       0               0
  *
- * For the channel-energy detector null audio (a frame with more than 60 zero samples in a row) is
+ * The channel-energy detector judges frames of 10 ms, the MCRA detector frames of 160 samples.
+ *
+ * To the channel-energy detector null audio (a frame with more than 60 zero samples in a row) is
  * silence. A piece that it interrupts ends with its last frame of speech, not dated back; if the
  * detector decides for speech in the first frame that is not null again, the piece that begins
  * there is not dated back either. For content types of 2 and more a piece of at most 19 frames is
