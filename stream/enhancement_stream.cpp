@@ -29,8 +29,8 @@ struct EnhancementStream {
   NsInstance *ns = nullptr;
   DrcInstance *drc = nullptr;
   FrameCutter input;
-  FrameCutter suppressed;     ///< on its way to dynamics control
-  orvalis::S2chnsState pair;  ///< of two microphones
+  FrameCutter suppressed;          ///< on its way to dynamics control
+  orvalis::S2chnsState pair = {};  ///< of two microphones
   EnhancementCounts counts = {{0, -1}, {0, -1}, {0, -1}, 0};
 };
 
