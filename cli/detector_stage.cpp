@@ -1,5 +1,6 @@
 #include "cli/detector_stage.h"
 
+#include <MCRAvad.h>
 #include <orvalis.h>
 
 #include <algorithm>
@@ -12,14 +13,44 @@
 namespace orvalis::cli {
 namespace {
 
-/// Of what the channel-energy detector keeps to itself only its decision is known; the level is
-/// that of the audio.
-Trace level_trace(const UtteranceFrame &frame) {
+/// Both sides of the conditions that led to a decision. Null audio is not judged and has none.
+Trace trace_of(const UtteranceFrame &frame, const EpdReasons &why) {
   const auto peak = std::ranges::max(std::span(frame.pcm, static_cast<std::size_t>(frame.samples)),
                                      {}, [](int sample) { return std::abs(sample); });
-  return {{"answer", std::int64_t{frame.speech}},
-          {"energy", std::int64_t{computeEnergy(frame.pcm, frame.samples)}},
-          {"peak", std::int64_t{std::abs(peak)}}};
+  const auto number = [](auto value) { return std::int64_t{value}; };
+  const auto decibels = [](std::int32_t q5) { return static_cast<float>(q5) / 32; };
+  return {{"answer", number(frame.speech)},
+          {"energy", number(computeEnergy(frame.pcm, frame.samples))},
+          {"peak", number(std::abs(peak))},
+          {"judged", number(why.judged)},
+          {"voice", number(why.voice)},
+          {"noise", number(why.noise)},
+          {"voice_metric", number(why.voiceMetric)},
+          {"voice_metric_threshold", number(why.voiceMetricThreshold)},
+          {"deviation", decibels(why.spectralDeviation)},
+          {"deviation_threshold", decibels(why.spectralDeviationThreshold)},
+          {"channel_energy", number(why.channelEnergy)},
+          {"min_channel_energy", number(why.minChannelEnergy)},
+          {"gated_energy", number(why.energy)},
+          {"energy_gate", number(why.energyGate)},
+          {"noise_floor", why.noiseFloor},
+          {"onset", number(why.onset)},
+          {"onset_frames", number(why.onsetFrames)},
+          {"pause", number(why.pause)},
+          {"pause_frames", number(why.pauseFrames)}};
+}
+
+/// Energies and bins are those of the frame and its predecessor.
+Trace trace_of(const McraReasons &why) {
+  return {{"answer", std::int64_t{why.answer}},
+          {"energy", why.energy},
+          {"energy_threshold", why.energyThreshold},
+          {"smoothed_energy", why.smoothedEnergy},
+          {"smoothed_threshold", why.smoothedThreshold},
+          {"minimum_energy", why.minEnergy},
+          {"speech_bins", why.speechBins},
+          {"speech_bins_threshold", why.speechBinsThreshold},
+          {"frame_snr", why.frameSnr}};
 }
 
 }  // namespace
@@ -62,8 +93,7 @@ void DetectorStage::flush(std::vector<std::int16_t> &) {
 void DetectorStage::note_frame(const UtteranceFrame &frame) {
   Trace trace;
   if (reported_ == Reported::kTrace) {
-    trace = frame.mcra != nullptr ? voice_trace_.of_frame(*frame.mcra, frame.speech == 1)
-                                  : level_trace(frame);
+    trace = frame.mcra != nullptr ? trace_of(*frame.mcra) : trace_of(frame, *frame.epd);
   }
   frames_.push_back({frame.start, frame.speech, std::move(trace)});
 }

@@ -11,7 +11,6 @@
 #include "cli/excerpts.h"
 #include "cli/report.h"
 #include "cli/stage.h"
-#include "cli/voice_trace.h"
 
 namespace orvalis::cli {
 
@@ -58,7 +57,6 @@ private:
   std::unique_ptr<Excerpts> excerpts_;
   Report &report_;
   Reported reported_;
-  VoiceTrace voice_trace_;
   std::vector<Frame> frames_;  ///< Not reported yet: nothing may be thrown through the library
   std::int64_t frame_count_ = 0;
   std::unique_ptr<UtteranceStream, Close> stream_;

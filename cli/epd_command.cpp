@@ -123,8 +123,9 @@ void add_epd_command(CLI::App &app, int &exit_status) {
       ->needs(utterances.split);
   auto *frames = epd->add_flag("--frames", options->frames,
                                "Print the answer to every frame of 10 ms\ninstead of utterances");
-  auto *trace = epd->add_flag("--trace", options->trace,
-                              "Print the answer to every frame and its level,\nas csv or json");
+  auto *trace =
+      epd->add_flag("--trace", options->trace,
+                    "Print the answer to every frame and what led to it,\nas csv or json");
   trace->excludes(frames);
   for (CLI::Option *option : utterances.all) {
     frames->excludes(option);

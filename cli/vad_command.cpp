@@ -59,7 +59,8 @@ Output:
 Trace:
   energy, smoothed_energy, minimum_energy and speech_bins are those of a frame and its
   predecessor. A frame is speech if energy exceeds energy_threshold, smoothed_energy
-  exceeds smoothed_threshold and speech_bins exceeds 40.
+  exceeds smoothed_threshold and speech_bins exceeds
+  speech_bins_threshold.
 
 Examples:
   orvalis vad meeting.wav

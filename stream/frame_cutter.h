@@ -40,13 +40,11 @@ public:
     std::int16_t tail[kMostValues];
     const std::int32_t length = (past_ + waiting_) / channels_;
     std::copy_n(frame() - past_, past_ + waiting_, tail);
-    for (std::int32_t i = 0; frames > 0; ++i) {
+    const std::int32_t missing = frames * kFrame - waiting_ / channels_;
+    for (std::int32_t i = 0; i < missing; ++i) {
       const std::int32_t step = i % (2 * length);
       const std::int32_t from = step < length ? length - 1 - step : step - length;
-      push(tail + from * channels_, channels_, [&](const std::int16_t *whole) {
-        --frames;
-        work(whole);
-      });
+      push(tail + from * channels_, channels_, work);
     }
   }
 

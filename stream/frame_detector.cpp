@@ -2,10 +2,9 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <cstring>
 
+#include "Voice_Engine/MCRAvad/frame_decision.h"
 #include "Voice_Engine/MCRAvad/mcra_detector.h"
-#include "Voice_Engine/channel/frame_screening.h"
 #include "Voice_Engine/epd/epd_instance.h"
 #include "stream/lead_in.h"
 
@@ -16,13 +15,14 @@ DecisionTiming decision_timing(const UtteranceSettings &settings) {
     return {
         .frame_samples = MCRA_FRAME_SAMPLES, .start_delay = 0, .end_delay = 0, .refused_run = 0};
   }
-  const auto type = static_cast<uint32_t>(settings.content_type);
-  const KepdTiming timing = timing_of(type, settings.rate_hz == 8000);
+  const KepdTiming timing =
+      timing_of(static_cast<uint32_t>(settings.content_type), settings.rate_hz == 8000);
   const int32_t frame_samples = settings.rate_hz / 100;
+  // Utterances count their closing pause: only behind a short one can they be too short.
   return {.frame_samples = frame_samples,
           .start_delay = timing.start_lag() * frame_samples,
           .end_delay = timing.end_lag() * frame_samples,
-          .refused_run = type < 2 ? 0 : kShortUtterance};
+          .refused_run = timing.pause_limit > kShortUtterance ? 0 : kShortUtterance};
 }
 
 bool FrameDetector::open(const UtteranceSettings &settings) {
@@ -40,9 +40,8 @@ bool FrameDetector::open_epd(const UtteranceSettings &settings) {
 }
 
 bool FrameDetector::open_mcra(const McraSettings &settings) {
-  mcra_ = static_cast<VADINFO *>(std::malloc(sizeof(VADINFO)));
+  mcra_ = static_cast<VADINFO *>(std::calloc(1, sizeof(VADINFO)));
   if (mcra_ == nullptr) return false;
-  std::memset(mcra_, 0, sizeof(VADINFO));
   initialise_mcra(*mcra_);
   mcra_->historyUpdate = settings.historyUpdate;
   mcra_->energyMargin = settings.energyMargin;
@@ -62,22 +61,21 @@ FrameDetector::Decision FrameDetector::process(const int16_t *frame) {
   if (mcra_ != nullptr) {
     Word16 windowed[MCRA_FRAME_SAMPLES];
     std::copy_n(frame, MCRA_FRAME_SAMPLES, windowed);
-    return {judge_mcra_frame(*mcra_, windowed, MCRA_FRAME_SAMPLES, exponent_), false};
+    const bool speech = judge_mcra_frame(*mcra_, windowed, MCRA_FRAME_SAMPLES, exponent_);
+    explain_frame(*mcra_, mcra_reasons_);
+    return {.speech = speech, .is_null = false};
   }
-  int32_t small_samples = 0;
-  const bool is_null = is_null_frame(frame, frame_samples_, small_samples);
-  EpdReasons reasons;
-  return {EPD_Proc_Frame(epd_, frame, frame_samples_, content_type_, reasons) == 1, is_null};
+  const Word32 answer = EPD_Proc_Frame(epd_, frame, frame_samples_, content_type_, epd_reasons_);
+  return {.speech = answer == 1, .is_null = epd_reasons_.judged == 0};
 }
 
 void FrameDetector::lead_in(const int16_t *window) {
   const Word32 pcm_dump = epd_->pcmDumpEnabled;
   epd_->pcmDumpEnabled = 0;
-  EpdReasons unused;
   for (int32_t i = 0; i < kLeadInFrames; ++i) {
     Word16 frame[kMaxFrameSamples];
     make_lead_in_frame(window, frame_samples_, i, frame);
-    EPD_Proc_Frame(epd_, frame, frame_samples_, content_type_, unused);
+    process(frame);
   }
   epd_->pcmDumpEnabled = pcm_dump;
   reset_ALL_EPDparams(epd_);

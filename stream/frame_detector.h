@@ -3,11 +3,12 @@
 
 #include <cstdint>
 
+#include "Voice_Engine/MCRAvad/MCRAvad.h"
+#include "Voice_Engine/epd/epd_reasons.h"
 #include "stream/utterance_finder.h"
 #include "stream/utterance_stream.h"
 
 struct EpdInstance;
-struct VADINFO;
 
 namespace orvalis {
 
@@ -34,8 +35,9 @@ public:
   /// them.
   void lead_in(const int16_t *window);
 
-  /// The MCRA detector's record; null for the other one.
-  const VADINFO *mcra() const { return mcra_; }
+  /// Why the last frame was answered as it was; null for the other detector.
+  const EpdReasons *epd_reasons() const { return epd_ != nullptr ? &epd_reasons_ : nullptr; }
+  const McraReasons *mcra_reasons() const { return mcra_ != nullptr ? &mcra_reasons_ : nullptr; }
 
 private:
   bool open_epd(const UtteranceSettings &settings);
@@ -48,6 +50,8 @@ private:
   int32_t frame_samples_ = 0;
   int32_t content_type_ = 0;
   float exponent_ = 0;
+  EpdReasons epd_reasons_ = {};
+  McraReasons mcra_reasons_ = {};
 };
 
 }  // namespace orvalis

@@ -77,7 +77,8 @@ void judge_frame(UtteranceStream &stream, const int16_t *pcm) {
                                   .pcm = pcm,
                                   .samples = stream.frame_samples,
                                   .speech = speech,
-                                  .mcra = stream.detector.mcra()};
+                                  .epd = stream.detector.epd_reasons(),
+                                  .mcra = stream.detector.mcra_reasons()};
     stream.on_frame(&frame, stream.user);
   }
   stream.judged += stream.frame_samples;

@@ -70,14 +70,14 @@
  * -----------------------------
  * The channel-energy detector learns the noise first and never decides for speech in its first 39
  * frames, so that a recording that begins with speech seems to begin with it after 0.39 s. With
- * `lead_in` the detector hears 0.6 s ahead of the recording that are made of it: the 100 ms of least
- * variance among the first 10 s, without null audio, forwards and backwards in turn. Nothing else
- * knows of them: positions, frames and dump files are those of the audio alone.
+ * `lead_in` the detector hears 0.6 s ahead of the recording that are made of it: the 100 ms of
+ * least variance among the first 10 s, without null audio, forwards and backwards in turn. Nothing
+ * else knows of them: positions, frames and dump files are those of the audio alone.
  *
- * For that the stream holds the first 10 s (in 320 KB at 16 kHz). Utterances among them come when
- * they are complete, or with the flush; what they decide is worked out in the calls that complete
- * them and take the utterances, in the time of 1060 frames at most. Live audio does without: there
- * the first 0.39 s are a pause as a rule.
+ * For that the stream holds the first 10 s (320 KB at 16 kHz). Utterances in them are decided once
+ * they are complete or flushed: the call that completes them, and NextUtterance while the queue was
+ * full, judge up to 1000 frames at once. Leave it off for live audio, which begins with a pause of
+ * 0.39 s as a rule.
  *
  *
  * Threads: as for an EPD instance. Memory: all of it is taken in OpenUtteranceStream.
@@ -111,13 +111,14 @@ typedef struct McraSettings {
 #define MCRA_SETTINGS_DEFAULT \
   { 0, 2, 0, 0, 0, 0.84f }
 
-/* A frame that was judged. */
+/* A frame, and why its detector decided as it did: see epd_reasons.h and MCRAvad.h. */
 typedef struct UtteranceFrame {
-  int64_t start;              /* its first sample */
-  const int16_t *pcm;         /* its samples, as they were pushed */
-  int32_t samples;            /* 160, or 80 for the channel-energy detector at 8 kHz */
-  int32_t speech;             /* the detector's decision: 1 or 0 */
-  const struct VADINFO *mcra; /* the MCRA detector's record behind the frame; else NULL */
+  int64_t start;                  /* its first sample */
+  const int16_t *pcm;             /* its samples, as they were pushed */
+  int32_t samples;                /* 160, or 80 for the channel-energy detector at 8 kHz */
+  int32_t speech;                 /* the detector's decision: 1 or 0 */
+  const struct EpdReasons *epd;   /* of the channel-energy detector; else NULL */
+  const struct McraReasons *mcra; /* of the MCRA detector; else NULL */
 } UtteranceFrame;
 
 typedef struct UtteranceSettings {
@@ -180,9 +181,9 @@ int32_t NextUtterance(UtteranceStream *stream, Utterance *utterance);
 int64_t EarliestUtteranceStart(const UtteranceStream *stream);
 
 /*
- * Ends the audio and closes what is open. Whatever the queue holds, NextUtterance then hands out all
- * that is left. Returns the number of samples behind the last whole frame, which were not judged (0..159), also when called
- * again; -1 if stream is NULL.
+ * Ends the audio and closes what is open. Whatever the queue holds, NextUtterance then hands out
+ * all that is left. Returns the number of samples behind the last whole frame, which were not
+ * judged (0..159), also when called again; -1 if stream is NULL.
  */
 int32_t FlushUtteranceStream(UtteranceStream *stream);
 

@@ -207,21 +207,21 @@ int32_t processVAD(VADINFO **info, int16_t *frame, int32_t length, float exponen
  */
 typedef struct McraReasons {
   int32_t frameIndex;
-  int32_t answer;                             /* 1 for speech, 0 for none */
-  float energy, energyThreshold;              /* of periodogram */
-  float smoothedEnergy, smoothedThreshold;    /* of smoothedPeriodogram */
-  float minEnergy;                            /* of minPower */
-  float frameSnr;                             /* mean a priori SNR, as a ratio */
-  int64_t speechBins, speechBinsThreshold;    /* bins' worth of speechProb */
+  int32_t answer;                          /* 1 for speech, 0 for none */
+  float energy, energyThreshold;           /* of periodogram */
+  float smoothedEnergy, smoothedThreshold; /* of smoothedPeriodogram */
+  float minEnergy;                         /* of minPower */
+  float frameSnr;                          /* mean a priori SNR, as a ratio */
+  int64_t speechBins, speechBinsThreshold; /* bins' worth of speechProb */
   /* What the next frame's reasons need of this frame. */
   float prevEnergy, prevSmoothedEnergy, prevMinEnergy;
   int64_t prevSpeechBins;
 } McraReasons;
 
 /*
- * Explains the frame that processVAD has just answered, and returns that answer. Fill `reasons` with
- * zeros before the first frame and call this after every frame; it then holds the reasons for the
- * last one. The record is only read.
+ * Explains the frame that processVAD has just answered, and returns that answer. Fill `reasons`
+ * with zeros before the first frame and call this after every frame; it then holds the reasons for
+ * the last one. The record is only read.
  */
 int32_t explainVAD(VADINFO **info, McraReasons *reasons);
 

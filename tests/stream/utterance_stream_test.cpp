@@ -172,11 +172,17 @@ TEST(UtteranceStream, FlushEndsTheAudio) {
   EXPECT_EQ(PushUtteranceAudio(stream.get(), pcm.data(), 3), -1);
 }
 
-/// What on_frame told of the frames of a stream.
+/// What was judged, how, and by what energy and noise.
 struct Frames {
   std::vector<int64_t> starts;
   std::vector<bool> speech;
+  std::vector<std::array<double, 2>> reasons;
   Pcm pcm;
+
+  void take(const EpdReasons &why) {
+    reasons.push_back({static_cast<double>(why.energy), why.noiseFloor});
+  }
+  void take(const McraReasons &why) { reasons.push_back({why.energy, why.minEnergy}); }
 
   void observe(UtteranceSettings &settings) {
     settings.user = this;
@@ -185,37 +191,46 @@ struct Frames {
       frames.starts.push_back(frame->start);
       frames.speech.push_back(frame->speech == 1);
       frames.pcm.insert(frames.pcm.end(), frame->pcm, frame->pcm + frame->samples);
-      EXPECT_TRUE(frame->mcra == nullptr ||
-                  frame->mcra->frameIndex + 1 == std::ssize(frames.starts));
+      EXPECT_NE(frame->epd == nullptr, frame->mcra == nullptr);
+      frame->epd != nullptr ? frames.take(*frame->epd) : frames.take(*frame->mcra);
     };
   }
 };
 
-/// What a detector decides on the whole frames of some audio, without a stream.
-std::vector<bool> decisions_of(const UtteranceSettings &settings, Pcm pcm) {
+/// What a detector makes of the whole frames of some audio, without a stream.
+Frames judged_alone(const UtteranceSettings &settings, Pcm pcm) {
   const int32_t frame = orvalis::decision_timing(settings).frame_samples;
-  const auto frames = static_cast<int32_t>(pcm.size()) / frame;
-  VADINFO record{};
-  VADINFO *vad = &record;
-  initialVADINFO(&vad);
+  const auto count = static_cast<int32_t>(pcm.size()) / frame;
+  Frames frames;
+  if (settings.detector == UTTERANCE_MCRA) {
+    VADINFO record{};
+    VADINFO *vad = &record;
+    initialVADINFO(&vad);
+    McraReasons why{};
+    for (int32_t i = 0; i < count; ++i) {
+      frames.speech.push_back(processVAD(&vad, &pcm[i * frame], frame, 0.84F) == 1);
+      explainVAD(&vad, &why);
+      frames.take(why);
+    }
+    return frames;
+  }
   EpdInstance *epd = InitializeEPD(settings.rate_hz == 8000 ? 1000 : 0, 0);
+  EpdReasons why{};
   if (settings.lead_in == 1) {
-    const int16_t *window = orvalis::quietest_window(pcm.data(), std::min(frames, 1000), frame);
-    for (int32_t i = 0; window != nullptr && i < orvalis::kLeadInFrames; ++i) {
+    const int16_t *window = orvalis::quietest_window(pcm.data(), std::min(count, 1000), frame);
+    for (int32_t i = 0; window != nullptr && i < 60; ++i) {
       int16_t played[160];
       orvalis::make_lead_in_frame(window, frame, i, played);
       ProcessEPDFrame(epd, played, frame);
     }
     ResetEPDparams(epd);
   }
-  std::vector<bool> decisions;
-  for (int32_t i = 0; i < frames; ++i) {
-    decisions.push_back(settings.detector == UTTERANCE_MCRA
-                            ? processVAD(&vad, &pcm[i * frame], frame, 0.84F) == 1
-                            : ProcessEPDFrame(epd, &pcm[i * frame], frame) == 1);
+  for (int32_t i = 0; i < count; ++i) {
+    frames.speech.push_back(ProcessEPDFrameExplained(epd, &pcm[i * frame], frame, 0, &why) == 1);
+    frames.take(why);
   }
   FreeMemoryEPD(epd);
-  return decisions;
+  return frames;
 }
 
 /// What the finder makes of decisions.
@@ -267,13 +282,14 @@ TEST(UtteranceStream, HandsADetectorsDecisionsToTheFinder) {
     settings.lead_in = lead_in;
     settings.hangover_ms = least_found < 100 ? 200 : 0;
     settings.min_speech_ms = least_found < 100 ? 700 : 0;
-    const auto decisions = decisions_of(settings, pcm);
+    const Frames alone = judged_alone(settings, pcm);
     Frames frames;
     frames.observe(settings);
     const auto found = utterances_of(settings, pcm, [] { return 1000U; });
-    EXPECT_EQ(found, utterances_of(settings, pcm, decisions));
+    EXPECT_EQ(found, utterances_of(settings, pcm, alone.speech));
     EXPECT_GE(found.size(), least_found);
-    EXPECT_EQ(frames.speech, decisions);
+    EXPECT_EQ(frames.speech, alone.speech);
+    EXPECT_EQ(frames.reasons, alone.reasons);
     EXPECT_EQ(frames.pcm, Pcm(pcm.begin(), pcm.begin() + std::ssize(frames.pcm)));
     for (std::size_t i = 0; i < frames.starts.size(); ++i)
       ASSERT_EQ(frames.starts[i] * std::ssize(frames.starts),
