@@ -65,7 +65,7 @@ TEST_F(Vad, TraceGivesTheAnswersAndTheirReasons) {
         const bool reasons =
             line["energy"].get<float>() > line["energy_threshold"].get<float>() &&
             line["smoothed_energy"].get<float>() > line["smoothed_threshold"].get<float>() &&
-            line["speech_bins"] > 40;
+            line["speech_bins"] > line["speech_bins_threshold"];
         ASSERT_EQ(reasons, answers[i]) << line;
       }
     }
@@ -73,8 +73,8 @@ TEST_F(Vad, TraceGivesTheAnswersAndTheirReasons) {
   const std::string csv = run("vad --trace " + kWide).out;
   EXPECT_TRUE(csv.starts_with(
       "file,frame,start,answer,energy,energy_threshold,smoothed_energy,smoothed_threshold,"
-      "minimum_energy,speech_bins,frame_snr\n" +
-      kWide + ",0,0.00,0,0,0.1,0,2,0,0,0\n"))
+      "minimum_energy,speech_bins,speech_bins_threshold,frame_snr\n" +
+      kWide + ",0,0.00,0,0,0.1,0,2,0,0,40,0\n"))
       << csv.substr(0, 300);
 }
 
