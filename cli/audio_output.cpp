@@ -4,25 +4,45 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
+#include <cctype>
 #include <cerrno>
+#include <filesystem>
 #include <string_view>
 #include <system_error>
-#include <vector>
-
-#include "cli/output_file.h"
-#include "cli/output_formats.h"
 
 namespace orvalis::cli {
 namespace {
 
-/// Where standard output led before it was reserved.
-int standard_output = STDOUT_FILENO;
+struct Format {
+  std::string name;
+  int sndfile_format;
+  std::string other_ending;
+};
+
+/// Raw samples are little-endian, as they are read.
+const std::vector<Format> &formats() {
+  static const std::vector<Format> kFormats = {
+      {"wav", SF_FORMAT_WAV | SF_FORMAT_PCM_16, "wave"},
+      {"flac", SF_FORMAT_FLAC | SF_FORMAT_PCM_16, "fla"},
+      {"ogg", SF_FORMAT_OGG | SF_FORMAT_VORBIS, "oga"},
+      {"opus", SF_FORMAT_OGG | SF_FORMAT_OPUS, "opus"},
+      {"aiff", SF_FORMAT_AIFF | SF_FORMAT_PCM_16, "aif"},
+      {"au", SF_FORMAT_AU | SF_FORMAT_PCM_16, "snd"},
+      {"caf", SF_FORMAT_CAF | SF_FORMAT_PCM_16, "caf"},
+      {"raw", SF_FORMAT_RAW | SF_FORMAT_PCM_16 | SF_ENDIAN_LITTLE, "pcm"},
+  };
+  return kFormats;
+}
 
 class WholeFile : public AudioOutput {
 public:
-  WholeFile(const std::string &name, const OutputFormat &format, bool replace)
-      : file_(name, format, replace) {}
+  WholeFile(const OutputTarget &target, int rate_hz, const Overwriting &overwriting)
+      : file_(target.name,
+              {rate_hz, 1,
+               std::ranges::find(formats(), target.format, &Format::name)->sndfile_format},
+              overwriting) {}
 
   void write(std::span<const std::int16_t> samples) override { file_.write(samples); }
   void commit() override { file_.commit(); }
@@ -31,8 +51,8 @@ private:
   OutputFile file_;
 };
 
-/// The header of WAV whose length nobody knows yet, which libsndfile does not write: the greatest
-/// possible stands for it, as with other tools that stream.
+/// A WAV header without a length, which libsndfile cannot write. As in other tools that stream, the
+/// largest possible length stands for it.
 std::array<char, 44> wav_header(int rate_hz) {
   std::array<char, 44> header{};
   std::size_t at = 0;
@@ -42,10 +62,10 @@ std::array<char, 44> wav_header(int rate_hz) {
   const auto put_name = [&](std::string_view name) {
     for (const char c : name) header[at++] = c;
   };
-  constexpr std::uint32_t kOpen = 0xffffffff, kPcm = 1, kChannels = 1, kBytes = 2;
+  constexpr std::uint32_t kOpenLength = 0xffffffff, kPcm = 1, kChannels = 1, kBytes = 2;
   const auto rate = static_cast<std::uint32_t>(rate_hz);
   put_name("RIFF");
-  put(kOpen, 4);
+  put(kOpenLength, 4);
   put_name("WAVEfmt ");
   put(16, 4);
   put(kPcm, 2);
@@ -55,17 +75,18 @@ std::array<char, 44> wav_header(int rate_hz) {
   put(kBytes, 2);
   put(8 * kBytes, 2);
   put_name("data");
-  put(kOpen, 4);
+  put(kOpenLength, 4);
   return header;
 }
 
 class Streamed : public AudioOutput {
 public:
-  Streamed(const std::string &name, const std::string &format, int rate_hz)
-      : name_(name),
-        descriptor_(name == "-" ? standard_output : open(name.c_str(), O_WRONLY | O_CLOEXEC)) {
+  Streamed(const OutputTarget &target, int rate_hz)
+      : name_(target.name),
+        descriptor_(name_ == "-" ? target.standard_output
+                                 : open(name_.c_str(), O_WRONLY | O_CLOEXEC)) {
     if (descriptor_ < 0) fail();
-    if (format == "wav") {
+    if (target.format == "wav") {
       const auto header = wav_header(rate_hz);
       write_bytes(header.data(), header.size());
     }
@@ -86,7 +107,7 @@ public:
   }
 
   void commit() override {
-    // Some devices tell of a failure only now.
+    // Some devices report a failure only now.
     const int last = descriptor_;
     descriptor_ = -1;
     if (close(last) != 0) fail();
@@ -106,7 +127,7 @@ private:
   [[noreturn]] void fail() const {
     const std::error_code error(errno, std::generic_category());
     if (name_ == "-") throw std::system_error(error, "standard output");
-    throw OutputError(name_ + ": " + error.message());
+    throw AudioError(name_ + ": " + error.message());
   }
 
   std::string name_;
@@ -116,6 +137,23 @@ private:
 
 }  // namespace
 
+std::vector<std::string> output_format_names() {
+  std::vector<std::string> names;
+  for (const Format &format : formats()) names.push_back(format.name);
+  return names;
+}
+
+std::string format_of_name(const std::string &file) {
+  std::string ending = std::filesystem::path(file).extension().string();
+  if (ending.empty()) return "";
+  ending.erase(0, 1);
+  std::ranges::transform(ending, ending.begin(),
+                         [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
+  for (const Format &format : formats())
+    if (ending == format.name || ending == format.other_ending) return format.name;
+  return "";
+}
+
 bool is_streamed(const std::string &name) {
   struct stat status;
   return name == "-" ||
@@ -124,17 +162,10 @@ bool is_streamed(const std::string &name) {
 
 bool can_be_streamed(const std::string &format) { return format == "wav" || format == "raw"; }
 
-void reserve_standard_output() {
-  standard_output = fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
-  if (standard_output < 0 || dup2(STDERR_FILENO, STDOUT_FILENO) < 0)
-    throw std::system_error(errno, std::generic_category(), "standard output");
-}
-
-std::unique_ptr<AudioOutput> open_audio_output(const std::string &name, const std::string &format,
-                                               int rate_hz, bool replace) {
-  if (is_streamed(name)) return std::make_unique<Streamed>(name, format, rate_hz);
-  return std::make_unique<WholeFile>(name, OutputFormat{rate_hz, 1, sndfile_format(format)},
-                                     replace);
+std::unique_ptr<AudioOutput> open_audio_output(const OutputTarget &target, int rate_hz,
+                                               const Overwriting &overwriting) {
+  if (is_streamed(target.name)) return std::make_unique<Streamed>(target, rate_hz);
+  return std::make_unique<WholeFile>(target, rate_hz, overwriting);
 }
 
 }  // namespace orvalis::cli

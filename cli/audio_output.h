@@ -1,35 +1,46 @@
-// Where processed audio goes: a file that is there whole or not at all, or a stream.
+// Where processed audio goes: a file that appears once it is complete, or a stream.
 #pragma once
 
 #include <cstdint>
 #include <memory>
 #include <span>
 #include <string>
+#include <vector>
+
+#include "cli/output_file.h"
 
 namespace orvalis::cli {
 
-/// Whether an output of that name is written as the audio comes: "-" is standard output, and a pipe
-/// or a device has no name to take late.
+/// Names of the formats that can be written, for --format.
+std::vector<std::string> output_format_names();
+
+/// The format that a file's name ends in: one of output_format_names, or "".
+std::string format_of_name(const std::string &file);
+
+/// Whether an output of that name is written while the audio arrives: "-" is standard output, and a
+/// pipe or device cannot be renamed when it is complete.
 bool is_streamed(const std::string &name);
 
-/// Formats that can be streamed.
+/// Whether a format can be streamed.
 bool can_be_streamed(const std::string &format);
 
-/// Frees standard output for audio: what is printed goes to standard error from now on.
-void reserve_standard_output();
+struct OutputTarget {
+  std::string name;          ///< "-" for standard output
+  std::string format;        ///< One of output_format_names
+  int standard_output = -1;  ///< Its descriptor, for "-"
+};
 
-/// Takes one channel of 16-bit samples. Methods throw OutputError, or std::system_error if standard
-/// output fails, which ends the tool.
+/// Takes one channel of 16-bit samples. All methods throw AudioError, or std::system_error if
+/// standard output fails, which ends the tool.
 class AudioOutput {
 public:
   virtual ~AudioOutput() = default;
   virtual void write(std::span<const std::int16_t> samples) = 0;
-  /// All of the audio was written. A file appears under its name.
+  /// All audio has been written: a file now appears under its name.
   virtual void commit() = 0;
 };
 
-/// Opens an output in one of output_format_names. `replace`: a file of that name gives way.
-std::unique_ptr<AudioOutput> open_audio_output(const std::string &name, const std::string &format,
-                                               int rate_hz, bool replace);
+std::unique_ptr<AudioOutput> open_audio_output(const OutputTarget &target, int rate_hz,
+                                               const Overwriting &overwriting);
 
 }  // namespace orvalis::cli

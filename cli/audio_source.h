@@ -1,68 +1,74 @@
-// Any audio file, or standard input, as the 16-bit samples that the engine takes: mono, or a pair
-// of microphones.
+// Any audio file, raw samples or standard input, read as the 16-bit samples that the engine takes.
 #pragma once
 
-#include <algorithm>
 #include <cstdint>
 #include <optional>
 #include <span>
 #include <string>
 #include <vector>
 
-#include "cli/open_audio.h"
+#include "cli/audio_file.h"
 #include "cli/resampler.h"
 
 namespace orvalis::cli {
 
+/// What to do with several channels, unless one is picked.
+enum class Channels {
+  kMean,    ///< Average them
+  kPair,    ///< Keep two as two; there must be two
+  kRefuse,  ///< The user has to decide
+};
+
+struct AudioSettings {
+  bool raw = false;  ///< No header: 16-bit little-endian samples
+  int raw_rate_hz = 16000;
+  int raw_channels = 1;
+  int channel = 0;  ///< Picks one, from 1; 0 picks none
+  Channels channels = Channels::kMean;
+  const char *channel_hint = "";  ///< For the error of kRefuse: the ways to decide
+  bool wide_only = false;         ///< 8 kHz is converted like other rates
+};
+
+/// An open input and its format.
+struct OpenAudio {
+  Sndfile file;
+  SF_INFO info{};
+  bool piped = false;  ///< Can be read only once, and its length is unknown
+};
+
+/// Opens a file, or standard input for "-". Several threads may do so at once. Throws AudioError.
+OpenAudio open_audio(const std::string &name, const AudioSettings &settings);
+
 class AudioSource {
 public:
-  /// Opens a file, or standard input for "-".
+  /// Opens the input. Throws AudioError.
   AudioSource(const std::string &name, const AudioSettings &settings);
 
   /// Rate of the samples that read() returns: 8000 or 16000.
   int rate_hz() const { return resampler_ ? 16000 : audio_.info.samplerate; }
 
-  /// The audio's own, before any conversion.
+  /// The input's own rate.
   int source_rate_hz() const { return audio_.info.samplerate; }
-  int source_channels() const { return audio_.info.channels; }
 
-  /// The next samples, about 10 ms, so that a live source is heard at once. Empty at the end. Those
-  /// of a pair are interleaved.
+  /// The next chunk, of about 10 ms, so that live audio is processed at once. Empty at the end.
+  /// Pairs are interleaved.
   std::span<const std::int16_t> read();
 
-  /// Hands all that is left to `take` in blocks of exactly `length` samples; a remainder is
-  /// dropped.
-  template <class Take>
-  void for_each_block(std::size_t length, Take take) {
-    std::vector<std::int16_t> block;
-    for (auto piece = read(); !piece.empty(); piece = read()) {
-      while (!piece.empty()) {
-        const auto part = piece.first(std::min(piece.size(), length - block.size()));
-        block.insert(block.end(), part.begin(), part.end());
-        piece = piece.subspan(part.size());
-        if (block.size() < length) continue;
-        take(std::span<const std::int16_t>(block));
-        block.clear();
-      }
-    }
-  }
-
-  /// Samples of the audio, of each channel, that were read so far.
+  /// Samples per channel that have been read from the input so far.
   std::int64_t source_frames_read() const { return frames_read_; }
 
-  /// Samples of each channel that read() has returned so far.
+  /// Samples per channel that read() has returned so far, and the same in seconds.
   std::int64_t samples_read() const { return samples_read_; }
+  double seconds_read() const { return static_cast<double>(samples_read_) / rate_hz(); }
 
-  /// Whether the source can be read only once.
-  bool is_piped() const { return audio_.piped; }
-
-  /// How much audio there is, unless that cannot be known.
+  /// Length of the whole input, if known.
   std::optional<double> length_seconds() const {
     if (audio_.piped) return std::nullopt;
     return static_cast<double>(audio_.info.frames) / audio_.info.samplerate;
   }
 
-  /// After the end: throws if that was a read error, or came before the end that the header names.
+  /// After the end: throws AudioError if it was due to a read error, or came before the end that
+  /// the header promises.
   void check_complete() const;
 
 private:
@@ -72,9 +78,9 @@ private:
 
   OpenAudio audio_;
   bool ended_ = false;
-  bool untouched_ = false;  ///< 16-bit samples go to the engine as they are
-  int channel_ = 0;
-  std::size_t channels_ = 1;  ///< That read() returns
+  bool untouched_ = false;  ///< 16-bit samples reach the engine as they are
+  int channel_;             ///< The one that is picked, from 1; or 0
+  std::size_t channels_;    ///< Of what read() returns
   sf_count_t frames_read_ = 0;
   std::int64_t samples_read_ = 0;
   std::optional<Resampler> resampler_;

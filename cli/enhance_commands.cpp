@@ -1,7 +1,4 @@
-#include "cli/enhance_commands.h"
-
-#include <orvalis.h>
-
+// `orvalis denoise`, `orvalis level` and `orvalis process`: better audio from audio.
 #include <algorithm>
 #include <limits>
 #include <memory>
@@ -9,78 +6,86 @@
 #include <string>
 #include <vector>
 
-#include "cli/audio_options.h"
-#include "cli/audio_output.h"
-#include "cli/detector_options.h"
-#include "cli/enhancement.h"
-#include "cli/output_formats.h"
+#include "cli/commands.h"
+#include "cli/enhance.h"
+#include "cli/jobs.h"
+#include "cli/options.h"
 #include "cli/output_plan.h"
-#include "cli/protected_inputs.h"
-#include "cli/report_in_turn.h"
-#include "cli/work_files.h"
 
 namespace orvalis::cli {
 namespace {
 
 struct EnhanceOptions {
-  std::vector<std::string> inputs;  ///< The last one is the output, until the work begins
-  PathSettings work;
+  std::vector<std::string> files;  ///< Inputs, then the output
+  EnhanceSettings settings;
   std::string format;
   std::string report = "table";
   std::size_t jobs = 1;
+  bool mix = false;
+  bool replace = false;
   bool not_aligned = false;
 };
 
-int run(EnhanceOptions &options) {
-  PathSettings &work = options.work;
-  std::string destination = options.inputs.back();
-  options.inputs.pop_back();
-  if (destination == "/dev/stdout") destination = "-";  // what is printed must not get between
-  if (std::ranges::count(options.inputs, "-") > 1)
-    throw CLI::ValidationError("FILE", "standard input can be read only once");
-  const auto report = make_report(options.report, "--report", options.inputs.size());
-  const auto outputs = plan_outputs(options.inputs, destination, options.format);
-  protect_inputs(options.inputs);
-  prepare_split(work.split, options.inputs);
+/// The settings that several options decide together.
+EnhanceSettings settings_of(const EnhanceOptions &options, const ProtectedFiles &inputs) {
+  EnhanceSettings settings = options.settings;
+  const bool pair = settings.enhancement.microphones == 2;
+  settings.audio.wide_only = true;
+  settings.audio.channels = pair          ? Channels::kPair
+                            : options.mix ? Channels::kMean
+                                          : Channels::kRefuse;
+  settings.audio.channel_hint =
+      settings.enhancement.suppression_db > 0
+          ? "average them with --mix, or pick one with --channel N, or clean two microphones with "
+            "--mics 2"
+          : "average them with --mix, or pick one with --channel N";
+  settings.enhancement.aligned = options.not_aligned ? 0 : 1;
+  settings.overwriting = {options.replace, &inputs};
+  settings.detector.split.overwriting = settings.overwriting;
+  return settings;
+}
+
+int run_enhancement(const EnhanceOptions &options, Console &console) {
+  std::vector<std::string> inputs = options.files;
+  std::string destination = inputs.back();
+  inputs.pop_back();
+  if (destination == "/dev/stdout") destination = "-";  // keeps the report out of the audio
+  check_inputs(inputs);
+  const auto report = make_report(options.report, "--report", inputs.size(), console);
+  auto targets = plan_outputs(inputs, destination, options.format);
+  const ProtectedFiles protected_files(inputs);
+  const EnhanceSettings settings = settings_of(options, protected_files);
+  prepare_split(settings.detector.split, inputs);
   if (destination == "-") {
-    if (is_protected("-")) throw std::runtime_error("standard output: the file is an input");
-    reserve_standard_output();
+    if (protected_files.contains("-"))
+      throw std::runtime_error("standard output: the file is an input");
+    targets.front().standard_output = console.reserve_standard_output();
   }
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
-  work.audio.wide_only = true;
-  work.audio.pair = work.enhancement.microphones == 2;
-  work.enhancement.aligned = options.not_aligned ? 0 : 1;
-  work.split.replace = work.replace;
-  return work_files(options.inputs, {.jobs = options.jobs},
-                    [&](std::size_t job, Turn &turn, const Advanced &advanced) {
-                      const std::string &name = options.inputs[job];
-                      ReportInTurn in_turn(*report, turn);
-                      const auto tell = [&](const std::string &text) {
-                        turn.act([&name, text] { print_note(name, text); });
-                      };
-                      enhance(name, outputs[job], work, in_turn, tell, advanced);
-                    });
+  return process_files(inputs, options.jobs, console, [&](Job &job) {
+    ReportInTurn in_turn(*report, job);
+    enhance(job, targets[job.number()], settings, in_turn);
+  });
 }
 
 constexpr const char *kInputAndOutput = R"(
 Input:
   Any file that libsndfile reads (WAV, FLAC, Ogg, MP3, AIFF, AU, ...), at any rate.
-  16 kHz audio of 16 bits is worked on as it is. Other rates are resampled to 16 kHz,
-  other sample formats rounded to 16 bits; what exceeds full scale clips. Several
-  channels are refused unless an option says what to do with them.
+  Audio of 16 bits at 16 kHz is processed as it is. Other rates are resampled to
+  16 kHz, other sample formats rounded to 16 bits; what exceeds full scale clips.
+  Several channels are refused unless an option says which is meant.
   "-" reads standard input: WAV (or AIFF, AU, Ogg), or with --raw samples alone.
 
 Output:
-  One channel of 16 bits at 16 kHz, or with --keep-rate at the input's own rate, as
-  long as the input and no later. The name tells the format: .wav, .flac, .ogg, .opus,
-  .aiff, .au, .caf or .raw. A file appears under its name when it is complete, and
-  never in place of an input, or of any other file without --force. Into a folder,
-  inputs go under their own names. "-" writes standard output while the input still
-  comes: WAV of open length, or raw.
+  One channel of 16 bits at 16 kHz, or with --keep-rate at the rate of the input, as
+  long as the input and not delayed. Its name gives the format: .wav, .flac, .ogg,
+  .opus, .aiff, .au, .caf or .raw. A file appears under its name when it is complete.
+  It never replaces an input, and other files only with --force. In a folder, each
+  output gets the name of its input. "-" writes standard output while input still
+  arrives, as WAV of open length or raw.
 
 Exit status:
-  0 all files done; 1 a file could not be read or written (the others are done);
-  2 wrong usage.
+  0 all files were processed; 1 a file could not be read or written (the others were
+  processed); 2 wrong usage.
 )";
 
 constexpr const char *kDenoiseNotes = R"(
@@ -92,30 +97,54 @@ Examples:
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis denoise --raw - - | aplay -q)";
 
 constexpr const char *kLevelNotes = R"(
-Standard error tells for how long the audio was loud, and how many samples of input
-and output are at full scale.
+On standard error it reports for how long the audio was loud, and how many samples of
+input and output are at full scale.
 
 Examples:
   orvalis level meeting.wav level.wav
   orvalis level --channel 2 call.wav level.flac)";
 
 constexpr const char *kProcessNotes = R"(
-The utterances are those of the processed audio, printed on standard output, or on
-standard error if audio goes there. --split writes them as processed, at 16 kHz.
+The utterances are those of the processed audio, reported on standard output, or on
+standard error if the audio goes to standard output. --split writes them as processed,
+at 16 kHz.
 
 Examples:
   orvalis process meeting.wav out.wav
   orvalis process --report json --split clips meeting.wav out.flac
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis process --raw - out.wav)";
 
-/// A command with the options that all of them have.
-CLI::App *add_command(CLI::App &app, const char *name, const char *summary, const char *notes,
-                      const std::shared_ptr<EnhanceOptions> &options, int &exit_status) {
-  CLI::App *command = app.add_subcommand(name, summary);
-  command->footer(std::string(kInputAndOutput).substr(1) + notes);
-  PathSettings &work = options->work;
+struct CommandTexts {
+  const char *name;
+  const char *summary;
+  const char *notes;
+};
+
+void add_suppression_options(CLI::App &command, EnhancementSettings &enhancement) {
   command
-      ->add_option("FILE", options->inputs,
+      .add_option("--level", enhancement.suppression_db,
+                  "Suppression of one microphone in dB: 13 or 18")
+      ->check(CLI::IsMember({13, 18}).description(""))
+      ->type_name("DB")
+      ->capture_default_str();
+  command
+      .add_option(
+          "--mics", enhancement.microphones,
+          "Microphones: 1, or 2, which are the two channels\nof the input; the first one is "
+          "cleaned")
+      ->check(from_to(1, 2))
+      ->type_name("N")
+      ->capture_default_str();
+}
+
+/// Adds a command with the options that all of them have.
+CLI::App *add_command(CLI::App &app, const CommandTexts &texts,
+                      const std::shared_ptr<EnhanceOptions> &options, Run &run) {
+  CLI::App *command = app.add_subcommand(texts.name, texts.summary);
+  command->footer(std::string(kInputAndOutput).substr(1) + texts.notes);
+  EnhanceSettings &settings = options->settings;
+  command
+      ->add_option("FILE", options->files,
                    "Inputs, \"-\" for standard input; then the output:\n"
                    "a file, a folder, or \"-\" for standard output")
       ->required()
@@ -125,60 +154,46 @@ CLI::App *add_command(CLI::App &app, const char *name, const char *summary, cons
   command->add_option("--format", options->format, "Format of the output (default: by its name)")
       ->check(CLI::IsMember(output_format_names()).description(""))
       ->type_name("NAME");
-  command->add_flag("--force", work.replace, "Replace files that are there already");
-  command->add_flag("--keep-rate", work.keep_rate, "Convert back to the rate of the input");
-  command->add_option("--jobs", options->jobs, "Files to work on at once")
-      ->check(from_to(1, 256))
-      ->type_name("N")
-      ->capture_default_str();
+  command->add_flag("--force", options->replace, "Replace existing files");
+  command->add_flag("--keep-rate", settings.keep_rate, "Convert back to the rate of the input");
+  add_jobs_option(*command, options->jobs);
   CLI::Option *channel =
-      add_audio_options(*command, work.audio, "Channel to work on, from 1, of several");
-  command->add_flag("--mix", work.mix, "Work on the mean of several channels")->excludes(channel);
-  if (work.enhancement.suppression_db > 0) {
-    command
-        ->add_option("--level", work.enhancement.suppression_db,
-                     "Suppression of one microphone in dB: 13 or 18")
-        ->check(CLI::IsMember({13, 18}).description(""))
-        ->type_name("DB")
-        ->capture_default_str();
-    command
-        ->add_option("--mics", work.enhancement.microphones,
-                     "Microphones, 1 or 2; two are two channels,\nand the first one is cleaned")
-        ->check(from_to(1, 2))
-        ->type_name("N")
-        ->capture_default_str();
-  }
-  command->callback([options, command, &exit_status] {
-    if (options->work.enhancement.microphones == 2)
+      add_audio_options(*command, settings.audio, "Channel to process, from 1, of several");
+  command->add_flag("--mix", options->mix, "Process the mean of several channels")
+      ->excludes(channel);
+  if (settings.enhancement.suppression_db > 0)
+    add_suppression_options(*command, settings.enhancement);
+  command->callback([options, command, &run] {
+    if (options->settings.enhancement.microphones == 2)
       for (const char *of_one : {"--level", "--channel", "--mix"})
         if (command->count(of_one) > 0) throw CLI::ExcludesError("--mics 2", of_one);
-    exit_status = run(*options);
+    run.exit_status = run_enhancement(*options, run.console);
   });
   return command;
 }
 
 }  // namespace
 
-void add_enhance_commands(CLI::App &app, int &exit_status) {
+void add_enhance_commands(CLI::App &app, Run &run) {
   const auto denoise = std::make_shared<EnhanceOptions>();
-  add_command(app, "denoise", "Take the noise from speech", kDenoiseNotes, denoise, exit_status)
+  add_command(app, {"denoise", "Suppress the noise in speech", kDenoiseNotes}, denoise, run)
       ->add_flag("--no-align", denoise->not_aligned,
-                 "Keep the suppressor's delay: 48 samples,\n160 with two microphones");
+                 "Keep the suppressor's delay: 48 samples, or 160\nwith two microphones");
 
   const auto level = std::make_shared<EnhanceOptions>();
-  level->work.enhancement.suppression_db = 0;
-  level->work.enhancement.level = 1;
-  add_command(app, "level", "Level recorded speech: dynamics control", kLevelNotes, level,
-              exit_status);
+  level->settings.enhancement.suppression_db = 0;
+  level->settings.enhancement.level = 1;
+  add_command(app, {"level", "Even out how loud speech is: dynamics control", kLevelNotes}, level,
+              run);
 
   const auto process = std::make_shared<EnhanceOptions>();
-  process->work.enhancement.level = 1;
-  process->work.detect = true;
-  CLI::App *command =
-      add_command(app, "process", "Denoise, level, and find the utterances of the result",
-                  kProcessNotes, process, exit_status);
+  process->settings.enhancement.level = 1;
+  process->settings.detect = true;
+  CLI::App *command = add_command(
+      app, {"process", "Denoise, level, and find the utterances of the result", kProcessNotes},
+      process, run);
   add_report_option(*command, "--report", process->report);
-  add_detector_options(*command, process->work.detector, process->work.split);
+  add_utterance_options(*command, process->settings.detector);
 }
 
 }  // namespace orvalis::cli

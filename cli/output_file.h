@@ -1,50 +1,63 @@
-// An audio file that is there whole or not at all.
+// An audio file that appears complete or not at all, and never in place of an input.
 #pragma once
 
-#include <sndfile.h>
+#include <sys/types.h>
 
 #include <memory>
 #include <span>
-#include <stdexcept>
 #include <string>
+#include <utility>
+#include <vector>
 
-#include "cli/open_audio.h"
+#include "cli/audio_file.h"
 
 namespace orvalis::cli {
 
-/// What keeps a file from being written; the message names the file.
-class OutputError : public std::runtime_error {
+/// The inputs of a run. No output may overwrite one of them under any name: a link, another
+/// spelling, or standard output.
+class ProtectedFiles {
 public:
-  using std::runtime_error::runtime_error;
+  /// "-" is standard input.
+  explicit ProtectedFiles(const std::vector<std::string> &inputs);
+
+  /// Whether an output of that name, or standard output for "-", is one of the files.
+  bool contains(const std::string &output) const;
+
+private:
+  std::vector<std::pair<dev_t, ino_t>> files_;
 };
 
-struct OutputFormat {
+/// What an output may do to files that exist.
+struct Overwriting {
+  bool allowed = false;                             ///< It replaces them
+  const ProtectedFiles *protected_files = nullptr;  ///< Except these, unless null
+};
+
+struct SampleFormat {
   int rate_hz;
   int channels;
-  int format;  ///< One of libsndfile's, such as SF_FORMAT_WAV | SF_FORMAT_PCM_16
+  int sndfile_format;  ///< Such as SF_FORMAT_WAV | SF_FORMAT_PCM_16
 };
 
-/// Is written under a temporary name in the folder of its own one, which it takes when it is
-/// committed. Without that it vanishes. Every method may throw OutputError.
+/// Written under a temporary name in the same folder, and removed unless committed. All methods may
+/// throw AudioError, with the file's name in the message.
 class OutputFile {
 public:
-  /// `replace`: a file of that name gives way, unless it is an input. Otherwise it is refused, now
-  /// and when committing.
-  OutputFile(const std::string &path, const OutputFormat &format, bool replace);
+  /// Existing files are respected here and once more when committing.
+  OutputFile(const std::string &path, const SampleFormat &format, const Overwriting &overwriting);
   ~OutputFile();
 
-  /// Appends interleaved samples. What exceeds full scale clips, where the file's format ends
-  /// there.
+  /// Appends interleaved samples. What exceeds full scale clips, unless the format can hold it.
   void write(std::span<const short> samples);
   void write(std::span<const int> samples);
   void write(std::span<const float> samples);
   void write(std::span<const double> samples);
 
-  /// Gives the complete file its name.
+  /// Completes the file and gives it its name.
   void commit();
 
 private:
-  class Bytes;
+  class TemporaryFile;
 
   template <class Sample>
   void append(std::span<const Sample> samples,
@@ -53,10 +66,10 @@ private:
   void check(bool good) const;
 
   std::string path_;
-  bool replace_;
-  bool lacks_samples_;            // and its format cannot be without
-  std::unique_ptr<Bytes> bytes_;  // outlives file_, which writes to it while closing
-  SndfilePointer file_;
+  bool may_replace_;
+  bool needs_samples_;                        ///< There are none yet, and the format requires some
+  std::unique_ptr<TemporaryFile> temporary_;  // outlives sndfile_, which writes to it while closing
+  Sndfile sndfile_;
 };
 
 }  // namespace orvalis::cli

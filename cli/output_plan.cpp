@@ -8,16 +8,13 @@
 #include <map>
 #include <system_error>
 
-#include "cli/audio_output.h"
-#include "cli/output_formats.h"
-
 namespace orvalis::cli {
 namespace {
 
 namespace fs = std::filesystem;
 
-/// In a folder, an input keeps its name, and its format if that can be written.
-PlannedOutput in_folder(const std::string &folder, const std::string &input, std::string format) {
+/// In a folder, an output gets the input's name, and its format if that can be written.
+OutputTarget in_folder(const std::string &folder, const std::string &input, std::string format) {
   const fs::path name = input == "-" ? "stdin" : fs::path(input).filename();
   const std::string own_format = format_of_name(name);
   if (format.empty()) format = own_format.empty() ? "wav" : own_format;
@@ -26,7 +23,7 @@ PlannedOutput in_folder(const std::string &folder, const std::string &input, std
   return {fs::path(folder) / output, format};
 }
 
-PlannedOutput under_name(const std::string &name, std::string format) {
+OutputTarget under_name(const std::string &name, std::string format) {
   if (format.empty()) format = format_of_name(name);
   const bool streamed = is_streamed(name);
   if (format.empty() && streamed) format = "wav";
@@ -41,16 +38,16 @@ PlannedOutput under_name(const std::string &name, std::string format) {
 
 }  // namespace
 
-std::vector<PlannedOutput> plan_outputs(const std::vector<std::string> &inputs,
-                                        const std::string &destination, const std::string &format) {
-  std::error_code none;
-  if (!fs::is_directory(destination, none)) {
+std::vector<OutputTarget> plan_outputs(const std::vector<std::string> &inputs,
+                                       const std::string &destination, const std::string &format) {
+  std::error_code ignored;
+  if (!fs::is_directory(destination, ignored)) {
     if (inputs.size() > 1)
       throw CLI::ValidationError(
           "OUT", "several files need a folder to go to, which " + destination + " is not");
     return {under_name(destination, format)};
   }
-  std::vector<PlannedOutput> outputs;
+  std::vector<OutputTarget> outputs;
   std::map<std::string, std::string> input_of_output;
   for (const std::string &input : inputs) {
     outputs.push_back(in_folder(destination, input, format));

@@ -1,30 +1,30 @@
-#include "cli/query_commands.h"
-
+// `orvalis energy` and `orvalis spectrum`: the queries of the library over the time of a file.
 #include <fmt/format.h>
 #include <fmt/ranges.h>
 #include <orvalis.h>
 
+#include <algorithm>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <span>
 #include <string>
 #include <vector>
 
-#include "cli/audio_options.h"
 #include "cli/audio_source.h"
-#include "cli/report.h"
+#include "cli/commands.h"
+#include "cli/options.h"
 
 namespace orvalis::cli {
 namespace {
 
-/// One query: how many blocks a second it is asked of, and what it answers to one.
+/// One query, and the blocks of audio that it is applied to.
 struct Query {
   const char *name;
   const char *summary;
   const char *notes;
   int blocks_per_second;
   const char *json_field;
-  std::vector<std::int32_t> (*ask)(std::span<const std::int16_t> block, int rate_hz);
+  std::vector<std::int32_t> (*values)(std::span<const std::int16_t> block, int rate_hz);
   std::vector<std::string> (*columns)(int rate_hz);
 };
 
@@ -79,56 +79,73 @@ struct QueryOptions {
   AudioSettings audio;
 };
 
-void print_answers(const Query &query, const QueryOptions &options) {
+/// Calls `process` for each whole block of `length` samples.
+template <class Process>
+void for_each_block(AudioSource &source, std::size_t length, Process process) {
+  std::vector<std::int16_t> block;
+  for (auto chunk = source.read(); !chunk.empty(); chunk = source.read()) {
+    while (!chunk.empty()) {
+      const auto part = chunk.first(std::min(chunk.size(), length - block.size()));
+      block.insert(block.end(), part.begin(), part.end());
+      chunk = chunk.subspan(part.size());
+      if (block.size() < length) continue;
+      process(std::span<const std::int16_t>(block));
+      block.clear();
+    }
+  }
+}
+
+void print_query(const Query &query, const QueryOptions &options, Console &console) {
   AudioSource source(options.file, options.audio);
   const int rate_hz = source.rate_hz();
   const bool json = options.format == "json";
-  if (!json) print_line(fmt::format("start,{}", fmt::join(query.columns(rate_hz), ",")));
+  if (!json) console.print_line(fmt::format("start,{}", fmt::join(query.columns(rate_hz), ",")));
   std::int64_t number = 0;
-  source.for_each_block(
-      static_cast<std::size_t>(rate_hz / query.blocks_per_second),
+  for_each_block(
+      source, static_cast<std::size_t>(rate_hz / query.blocks_per_second),
       [&](std::span<const std::int16_t> block) {
         const double start = static_cast<double>(number++) / query.blocks_per_second;
-        const auto answer = query.ask(block, rate_hz);
+        const auto values = query.values(block, rate_hz);
         if (!json) {
-          print_line(fmt::format("{:.2f},{}", start, fmt::join(answer, ",")));
-        } else if (answer.size() == 1) {
-          print_line(
-              nlohmann::ordered_json{{"start", start}, {query.json_field, answer[0]}}.dump());
+          console.print_line(fmt::format("{:.2f},{}", start, fmt::join(values, ",")));
+        } else if (values.size() == 1) {
+          console.print_line(
+              nlohmann::ordered_json{{"start", start}, {query.json_field, values[0]}}.dump());
         } else {
-          print_line(nlohmann::ordered_json{{"start", start}, {query.json_field, answer}}.dump());
+          console.print_line(
+              nlohmann::ordered_json{{"start", start}, {query.json_field, values}}.dump());
         }
       });
   source.check_complete();
 }
 
-void add_query(CLI::App &app, const Query &query, int &exit_status) {
+void add_query(CLI::App &app, const Query &query, Run &run) {
   const auto options = std::make_shared<QueryOptions>();
   CLI::App *command = app.add_subcommand(query.name, query.summary);
   command->footer(query.notes);
   command->add_option("FILE", options->file, "Audio file; \"-\" is standard input")
       ->required()
       ->type_name("");
-  command->add_option("--format", options->format, "csv, or json (an object a line)")
+  command->add_option("--format", options->format, "csv, or json (one object per line)")
       ->check(CLI::IsMember({"csv", "json"}).description(""))
       ->type_name("NAME")
       ->capture_default_str();
   add_audio_options(*command, options->audio);
-  command->callback([options, &query, &exit_status] {
+  command->callback([options, &query, &run] {
     try {
-      print_answers(query, *options);
+      print_query(query, *options, run.console);
     } catch (const AudioError &error) {
-      print_input_error(options->file, error);
-      exit_status = 1;
+      run.console.print_note(options->file, error.what());
+      run.exit_status = 1;
     }
   });
 }
 
 }  // namespace
 
-void add_query_commands(CLI::App &app, int &exit_status) {
-  add_query(app, kEnergy, exit_status);
-  add_query(app, kSpectrum, exit_status);
+void add_query_commands(CLI::App &app, Run &run) {
+  add_query(app, kEnergy, run);
+  add_query(app, kSpectrum, run);
 }
 
 }  // namespace orvalis::cli

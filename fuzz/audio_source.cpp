@@ -33,12 +33,13 @@ private:
 };
 
 orvalis::cli::AudioSettings settings_of(std::uint8_t byte) {
+  using orvalis::cli::Channels;
   constexpr int kRates[] = {16000, 8000, 44100, 11025};
   return {.raw = byte % 4 == 3,
           .raw_rate_hz = kRates[byte / 4 % 4],
           .raw_channels = 1 + byte / 16 % 4,
           .channel = byte / 64,
-          .pair = byte % 8 == 6,
+          .channels = byte % 8 == 6 ? Channels::kPair : Channels::kMean,
           .wide_only = byte % 8 >= 6};
 }
 
@@ -55,7 +56,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
     while (heard < kMostSamples) {
       const auto samples = source.read();
       if (samples.empty()) break;
-      require(!settings.pair || samples.size() % 2 == 0, "pairs come whole");
+      require(settings.channels != orvalis::cli::Channels::kPair || samples.size() % 2 == 0,
+              "pairs come whole");
       heard += samples.size();
     }
     if (heard < kMostSamples) source.check_complete();

@@ -61,11 +61,11 @@ TEST(AudioSource, PairsAreTheirTwoChannels) {
       ASSERT_NEAR(static_cast<double>(left.size()), 15000 * 16000.0 / rate, 1);
       for (std::size_t i = 0; i < left.size(); ++i)
         expected.insert(expected.end(), {left[i], right[i]});
-      EXPECT_EQ(read_all(folder / "pairs.wav", {.pair = true, .wide_only = true}), expected)
+      EXPECT_EQ(read_all(folder / "pairs.wav", {.channels = Channels::kPair, .wide_only = true}),
+                expected)
           << rate;
     }
   }
-  EXPECT_EQ(AudioSource(folder / "pairs.wav", {.pair = true}).source_channels(), 2);
 }
 
 TEST(AudioSource, OtherFormatsAreRoundedAndClipped) {

@@ -1,4 +1,4 @@
-#include "cli/detector_stage.h"
+#include "cli/detect.h"
 
 #include <MCRAvad.h>
 #include <orvalis.h>
@@ -7,8 +7,6 @@
 #include <cstdlib>
 #include <new>
 #include <utility>
-
-#include "cli/split_names.h"
 
 namespace orvalis::cli {
 namespace {
@@ -40,7 +38,7 @@ Trace trace_of(const UtteranceFrame &frame, const EpdReasons &why) {
           {"pause_frames", number(why.pauseFrames)}};
 }
 
-/// Energies and bins are those of the frame and its predecessor.
+/// Energies and bins are those of the frame and its predecessor together.
 Trace trace_of(const McraReasons &why) {
   return {{"answer", std::int64_t{why.answer}},
           {"energy", why.energy},
@@ -53,61 +51,69 @@ Trace trace_of(const McraReasons &why) {
           {"frame_snr", why.frameSnr}};
 }
 
+/// The hangover that bridges silence shorter than `min_silence_ms`. Silence comes in whole frames,
+/// and a hangover includes the frame of speech that ends it.
+std::int32_t bridging_hangover_ms(std::int32_t min_silence_ms, int rate_hz) {
+  const std::int32_t frame_ms = 1000 * MCRA_FRAME_SAMPLES / rate_hz;
+  return (min_silence_ms + frame_ms - 1) / frame_ms * frame_ms;
+}
+
+bool needs_lead_in(LeadIn lead_in, const std::string &input) {
+  return lead_in == LeadIn::kAlways || (lead_in == LeadIn::kNotOfStandardInput && input != "-");
+}
+
 }  // namespace
 
-DetectorStage::DetectorStage(std::string name, UtteranceSettings detector, SplitSettings split,
-                             std::unique_ptr<Excerpts> excerpts, Report &report, Reported reported)
-    : name_(std::move(name)),
-      rate_hz_(detector.rate_hz),
-      split_(std::move(split)),
-      excerpts_(std::move(excerpts)),
-      report_(report),
-      reported_(reported) {
-  if (reported != Reported::kUtterances) {
-    detector.on_frame = [](const UtteranceFrame *frame, void *stage) {
-      static_cast<DetectorStage *>(stage)->note_frame(*frame);
-    };
-    detector.user = this;
+Detector::Detector(const std::string &input, int rate_hz, const DetectorSettings &settings,
+                   std::unique_ptr<Split> split, Report &report)
+    : rate_hz_(rate_hz), reported_(settings.reported), split_(std::move(split)), report_(report) {
+  UtteranceSettings stream = settings.stream;
+  stream.rate_hz = rate_hz;
+  stream.lead_in = needs_lead_in(settings.lead_in, input) ? 1 : 0;
+  if (stream.detector == UTTERANCE_MCRA) {
+    stream.mcra = &settings.mcra;
+    stream.hangover_ms = bridging_hangover_ms(settings.min_silence_ms, rate_hz);
   }
-  if (detector.lead_in == kLeadInForFiles) detector.lead_in = name_ == "-" ? 0 : 1;
-  stream_.reset(OpenUtteranceStream(&detector));
+  if (reported_ != Reported::kUtterances) {
+    stream.on_frame = [](const UtteranceFrame *frame, void *detector) {
+      static_cast<Detector *>(detector)->note_frame(*frame);
+    };
+    stream.user = this;
+  }
+  stream_.reset(OpenUtteranceStream(&stream));
   if (!stream_) throw std::bad_alloc();
 }
 
-void DetectorStage::push(std::span<const std::int16_t> input, std::vector<std::int16_t> &output) {
-  output.insert(output.end(), input.begin(), input.end());
-  if (excerpts_) excerpts_->hear(input);
-  while (!input.empty()) {
-    const auto taken =
-        PushUtteranceAudio(stream_.get(), input.data(), static_cast<std::int32_t>(input.size()));
-    input = input.subspan(static_cast<std::size_t>(taken));
+void Detector::push(std::span<const std::int16_t> audio) {
+  if (split_) split_->push(audio);
+  while (!audio.empty()) {
+    const auto count =
+        PushUtteranceAudio(stream_.get(), audio.data(), static_cast<std::int32_t>(audio.size()));
+    audio = audio.subspan(static_cast<std::size_t>(count));
     report_new();
   }
 }
 
-void DetectorStage::flush(std::vector<std::int16_t> &) {
+void Detector::flush() {
   FlushUtteranceStream(stream_.get());
   report_new();
 }
 
-void DetectorStage::note_frame(const UtteranceFrame &frame) {
+void Detector::note_frame(const UtteranceFrame &frame) {
   Trace trace;
-  if (reported_ == Reported::kTrace) {
+  if (reported_ == Reported::kTrace)
     trace = frame.mcra != nullptr ? trace_of(*frame.mcra) : trace_of(frame, *frame.epd);
-  }
   frames_.push_back({frame.start, frame.speech, std::move(trace)});
 }
 
-void DetectorStage::report_new() {
+void Detector::report_new() {
   for (Utterance found; NextUtterance(stream_.get(), &found) == 1;) {
     if (reported_ != Reported::kUtterances) continue;
-    // First, so that what is reported is there.
-    if (excerpts_)
-      excerpts_->write(found.start, found.end, part_name(split_.folder, name_, found.number),
-                       split_.replace);
+    // The file first: it exists once its utterance is reported.
+    if (split_) split_->write(found);
     report_.utterance(found);
   }
-  if (excerpts_) excerpts_->forget_before(EarliestUtteranceStart(stream_.get()));
+  if (split_) split_->forget_before(EarliestUtteranceStart(stream_.get()));
   for (const Frame &frame : frames_) {
     if (reported_ == Reported::kTrace) {
       const auto start_s = static_cast<double>(frame.start) / rate_hz_;
@@ -118,6 +124,23 @@ void DetectorStage::report_new() {
     ++frame_count_;
   }
   frames_.clear();
+}
+
+void detect(Job &job, const DetectSettings &settings, Report &report) {
+  AudioSource source(job.input(), settings.audio);
+  const int rate_hz = source.rate_hz();
+  report.begin_file(job.input(), rate_hz);
+  Detector detector(job.input(), rate_hz, settings.detector,
+                    split_source(settings.detector.split, job.input(), settings.audio, rate_hz),
+                    report);
+  for (auto chunk = source.read(); !chunk.empty(); chunk = source.read()) {
+    detector.push(chunk);
+    job.show_progress(source.seconds_read(), source.length_seconds());
+  }
+  detector.flush();
+  report.end_file(source.samples_read());
+  // Last, so that of a damaged file everything that could be decided is reported.
+  source.check_complete();
 }
 
 }  // namespace orvalis::cli

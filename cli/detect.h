@@ -1,0 +1,79 @@
+// One input through a voice detector into a report.
+#pragma once
+
+#include <utterance_stream.h>
+
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "cli/audio_source.h"
+#include "cli/jobs.h"
+#include "cli/report.h"
+#include "cli/split.h"
+
+namespace orvalis::cli {
+
+enum class Reported { kUtterances, kFrames, kTrace };
+
+/// When the detector learns the noise of a recording before it judges the beginning.
+enum class LeadIn { kNever, kAlways, kNotOfStandardInput };
+
+struct DetectorSettings {
+  /// All but rate_hz, lead_in, mcra and, for the MCRA detector, hangover_ms.
+  UtteranceSettings stream = UTTERANCE_SETTINGS_DEFAULT;
+  LeadIn lead_in = LeadIn::kNever;
+  McraSettings mcra = MCRA_SETTINGS_DEFAULT;
+  std::int32_t min_silence_ms = 300;  ///< Of the MCRA detector: shorter silence is bridged
+  Reported reported = Reported::kUtterances;
+  SplitSettings split;
+};
+
+/// A voice detector that reports what it finds. The report outlives it.
+class Detector {
+public:
+  /// `split` may be null.
+  Detector(const std::string &input, int rate_hz, const DetectorSettings &settings,
+           std::unique_ptr<Split> split, Report &report);
+
+  Detector(const Detector &) = delete;
+  Detector &operator=(const Detector &) = delete;
+
+  /// Throws AudioError if an utterance cannot be written.
+  void push(std::span<const std::int16_t> audio);
+  void flush();
+
+private:
+  struct Close {
+    void operator()(UtteranceStream *stream) const { CloseUtteranceStream(stream); }
+  };
+  struct Frame {
+    std::int64_t start;
+    int decision;
+    Trace trace;
+  };
+
+  void note_frame(const UtteranceFrame &frame);
+  void report_new();
+
+  int rate_hz_;
+  Reported reported_;
+  std::unique_ptr<Split> split_;
+  Report &report_;
+  std::vector<Frame> frames_;  ///< Not reported yet: nothing may be thrown through the library
+  std::int64_t frame_count_ = 0;
+  std::unique_ptr<UtteranceStream, Close> stream_;
+};
+
+struct DetectSettings {
+  AudioSettings audio;
+  DetectorSettings detector;
+};
+
+/// Reports what is found in the job's input while it is read. Throws AudioError, after everything
+/// that could be decided has been reported.
+void detect(Job &job, const DetectSettings &settings, Report &report);
+
+}  // namespace orvalis::cli

@@ -1,0 +1,237 @@
+// `orvalis epd` and `orvalis vad`: the utterances of each file, by one detector or the other.
+#include <orvalis.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "cli/commands.h"
+#include "cli/detect.h"
+#include "cli/jobs.h"
+#include "cli/options.h"
+
+namespace orvalis::cli {
+namespace {
+
+struct DetectOptions {
+  std::vector<std::string> files;
+  DetectSettings settings;
+  std::string format = "table";
+  std::size_t jobs = 1;
+  bool log = false;
+  std::string dump_folder;
+};
+
+/// Frames and traces need a format that holds them; for a trace that is csv unless one is given.
+void check_format(const CLI::App &command, DetectOptions &options) {
+  const Reported reported = options.settings.detector.reported;
+  if (reported == Reported::kTrace && command.count("--format") == 0) options.format = "csv";
+  const auto format = std::ranges::find(report_formats(), options.format, &ReportFormat::name);
+  if (reported == Reported::kFrames && !format->frames)
+    throw CLI::ValidationError("--frames", "the format " + options.format + " holds no frames");
+  if (reported == Reported::kTrace && !format->trace)
+    throw CLI::ValidationError("--trace",
+                               "the format " + options.format + " holds no trace; use csv or json");
+}
+
+void prepare_dump(DetectOptions &options) {
+  if (options.dump_folder.empty()) return;
+  if (options.files.size() > 1)
+    throw CLI::ValidationError("--dump", "several files are given, but only one can be dumped");
+  if (SetDumpRoot(options.dump_folder.c_str()) != 0)
+    throw CLI::ValidationError("--dump", "the folder's name is too long");
+  make_folder("--dump", std::filesystem::path(options.dump_folder) / "sdcard/VRpreprocess");
+  options.settings.detector.stream.pcm_dump = 1;
+}
+
+int run_detection(const CLI::App &command, DetectOptions &options, Console &console) {
+  check_inputs(options.files);
+  check_format(command, options);
+  const auto report = make_report(options.format, "--format", options.files.size(), console);
+  const ProtectedFiles inputs(options.files);
+  SplitSettings &split = options.settings.detector.split;
+  split.overwriting.protected_files = &inputs;
+  prepare_split(split, options.files);
+  prepare_dump(options);
+  if (options.log) console.show_engine_log();
+
+  return process_files(options.files, options.jobs, console, [&](Job &job) {
+    ReportInTurn in_turn(*report, job);
+    detect(job, options.settings, in_turn);
+  });
+}
+
+CLI::App *add_command(CLI::App &app, const char *name, const char *summary,
+                      DetectOptions &options) {
+  CLI::App *command = app.add_subcommand(name, summary);
+  add_files_option(*command, options.files);
+  add_report_option(*command, "--format", options.format);
+  return command;
+}
+
+constexpr const char *kTraceText =
+    "Print the decision on each frame and what led to\nit, as csv or json";
+
+constexpr const char *kEpdNotes = R"(Input:
+  Any file that libsndfile reads (WAV, FLAC, Ogg, MP3, AIFF, AU, ...), at any rate.
+  Audio of 16 bits at 8 or 16 kHz is processed as it is. Other rates are resampled to
+  16 kHz, other sample formats rounded to 16 bits; what exceeds full scale clips.
+  Several channels are averaged unless --channel picks one.
+  "-" reads standard input: WAV (or AIFF, AU, Ogg), or with --raw samples alone.
+  Each utterance is printed as soon as it is decided. Nothing is decided before the
+  first 10 s are there, except with --raw - or --no-lead-in.
+
+Files of utterances:
+  --split clips writes the utterances of take.wav to clips/take-001.wav,
+  clips/take-002.wav and so on: the samples of the input, with its rate, channels and
+  sample format. For standard input they are the samples that the engine was given, in
+  clips/stdin-001.wav and so on.
+
+Output:
+  Times are seconds of the input. "start" and "end" are the borders of the
+  utterance; "began" and "ended" are the times of the detector's first and last
+  decision for speech. "open" marks an utterance that was still going on when the
+  audio ended.
+    table     for a reader
+    json      one object per line; *_sample fields count samples at its "rate"
+    csv       for a spreadsheet
+    labels    a label track for Audacity (one file)
+    textgrid  an interval tier for Praat (one file, written at its end)
+    rttm      SPEAKER lines for diarisation tools
+
+Exit status:
+  0 all files were processed; 1 a file could not be read or split (the others were
+  processed); 2 wrong usage.
+
+Examples:
+  orvalis epd meeting.wav
+  orvalis epd --format json --hangover 800 a.flac b.mp3
+  orvalis epd --pad-before 0 --pad-after 0 --channel 2 call.wav
+  orvalis epd --raw --rate 8000 line.raw
+  orvalis epd --split clips --pad-before 300 --pad-after 400 meeting.wav
+  orvalis epd --jobs 4 --format csv *.flac >all.csv
+  orvalis epd --format labels take.wav >take.txt
+  arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis epd --raw -)";
+
+void add_epd_command(CLI::App &app, Run &run) {
+  const auto options = std::make_shared<DetectOptions>();
+  DetectorSettings &detector = options->settings.detector;
+  CLI::App *epd =
+      add_command(app, "epd", "Find the utterances in audio files or live audio", *options);
+  epd->footer(kEpdNotes);
+  const UtteranceOptions utterances = add_utterance_options(*epd, detector);
+  epd->add_option_function<std::string>(
+         "--gain",
+         [&detector](const std::string &gain) {
+           detector.stream.input_gain = gain == "0.25" ? 1 : gain == "4" ? 2 : 0;
+         },
+         "Gain of the input: 0.25, 1 or 4 (wraps beyond 16 bits)")
+      ->check(CLI::IsMember({"0.25", "1", "4"}).description(""))
+      ->type_name("G")
+      ->default_str("1");
+  epd->add_flag("--force", detector.split.overwriting.allowed, "Replace existing files")
+      ->needs(utterances.split);
+  auto *frames = epd->add_flag_callback(
+      "--frames", [&detector] { detector.reported = Reported::kFrames; },
+      "Print the decision on each frame of 10 ms instead\nof utterances");
+  auto *trace = epd->add_flag_callback(
+      "--trace", [&detector] { detector.reported = Reported::kTrace; }, kTraceText);
+  trace->excludes(frames);
+  for (CLI::Option *option : utterances.all) {
+    frames->excludes(option);
+    trace->excludes(option);
+  }
+  auto *jobs = add_jobs_option(*epd, options->jobs);
+  epd->add_flag("--log", options->log, "Show the engine's log lines on standard error")
+      ->excludes(jobs);
+  epd->add_option("--dump", options->dump_folder,
+                  "Let the engine write its dump files below this\nfolder (of one file)")
+      ->check(not_empty())
+      ->type_name("DIR");
+  add_audio_options(*epd, options->settings.audio);
+  epd->callback(
+      [options, epd, &run] { run.exit_status = run_detection(*epd, *options, run.console); });
+}
+
+constexpr const char *kVadNotes =
+    R"(This detector estimates the noise in each bin of the spectrum, and decides on frames
+of 160 samples: 10 ms at 16 kHz, 20 ms at 8 kHz. Other rates are resampled to 16 kHz.
+
+By default the noise estimate may only fall. That covers words best, but background
+that becomes more than 3 dB louder counts as speech from then on. With --history it may
+rise as well, and words are found in parts, which --min-silence joins.
+
+Output:
+  As for epd. "start" and "end" are the borders of a segment; "began" and "ended" are
+  the times of the detector's first and last decision for speech.
+
+Trace:
+  energy, smoothed_energy, minimum_energy and speech_bins are those of a frame and its
+  predecessor together. A frame is speech if energy exceeds energy_threshold,
+  smoothed_energy exceeds smoothed_threshold, and speech_bins exceeds
+  speech_bins_threshold.
+
+Examples:
+  orvalis vad meeting.wav
+  orvalis vad --format json --min-silence 500 --pad-before 0 a.flac b.mp3
+  orvalis vad --trace meeting.wav >trace.csv
+  arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis vad --history --raw -)";
+
+void add_mcra_options(CLI::App &vad, McraSettings &mcra) {
+  vad.add_flag_callback(
+      "--history", [&mcra] { mcra.historyUpdate = 1; },
+      "Let the noise estimate rise as well as fall: its\nminima are those of 20 frames");
+  vad.add_option("--energy-margin", mcra.energyMargin, "Factor of the smoothed-energy test")
+      ->check(from_to(0, 1000000))
+      ->type_name("N")
+      ->capture_default_str();
+  vad.add_flag_callback(
+      "--margin-over-minima", [&mcra] { mcra.calibrationEnable = 1; },
+      "Apply the margin to the energy of the minima");
+  vad.add_flag_callback(
+      "--low-threshold", [&mcra] { mcra.lowThresholdSelect = 1; },
+      "Minimum energy threshold 0.097 instead of 0.1");
+  vad.add_flag_callback(
+      "--calibrate", [&mcra] { mcra.calibrationMode = mcra.calibrationEnable = 1; },
+      "Learn the energy threshold from frames 80 to 294;\nimplies --margin-over-minima");
+  vad.add_option("--exponent", mcra.exponent, "Exponent of the learnt threshold")
+      ->check(CLI::Range(0.01, 2.0).description(""))
+      ->type_name("X")
+      ->default_str("0.84");
+}
+
+void add_vad_command(CLI::App &app, Run &run) {
+  const auto options = std::make_shared<DetectOptions>();
+  DetectorSettings &detector = options->settings.detector;
+  detector.stream.detector = UTTERANCE_MCRA;
+  detector.stream.min_speech_ms = 100;
+  CLI::App *vad =
+      add_command(app, "vad", "Find segments of speech with the MCRA detector", *options);
+  vad->footer(kVadNotes);
+  std::vector<CLI::Option *> times = {
+      add_time_option(*vad, "--min-speech", detector.stream.min_speech_ms,
+                      "Shortest segment that is reported"),
+      add_time_option(*vad, "--min-silence", detector.min_silence_ms,
+                      "Shortest silence that separates two segments")};
+  for (CLI::Option *padding : add_padding_options(*vad, detector.stream, "segment"))
+    times.push_back(padding);
+  auto *trace = vad->add_flag_callback(
+      "--trace", [&detector] { detector.reported = Reported::kTrace; }, kTraceText);
+  for (CLI::Option *option : times) trace->excludes(option);
+  add_mcra_options(*vad, detector.mcra);
+  add_jobs_option(*vad, options->jobs);
+  add_audio_options(*vad, options->settings.audio);
+  vad->callback(
+      [options, vad, &run] { run.exit_status = run_detection(*vad, *options, run.console); });
+}
+
+}  // namespace
+
+void add_detect_commands(CLI::App &app, Run &run) {
+  add_epd_command(app, run);
+  add_vad_command(app, run);
+}
+
+}  // namespace orvalis::cli
