@@ -52,8 +52,8 @@ int parse_and_run(int argc, char **argv, orvalis::cli::Run &run) {
   return run.exit_status;
 }
 
-/// If a standard stream is closed, the first file that is opened would take its place, and get what
-/// is printed there.
+/// Keeps descriptors 0 to 2 occupied: if one is closed, the first file that is opened would get it,
+/// and with it what is printed.
 void occupy_standard_streams() {
   int descriptor = open("/dev/null", O_RDONLY);
   while (descriptor >= 0 && descriptor <= STDERR_FILENO) descriptor = open("/dev/null", O_RDONLY);
@@ -64,8 +64,8 @@ void occupy_standard_streams() {
 
 int main(int argc, char **argv) {
   occupy_standard_streams();
-  // A reader that has gone, and a limit on the size of files, make the write fail that meets them;
-  // they do not end the process.
+  // When a reader has gone, or a file reaches its size limit, the write fails instead of the
+  // process.
   std::signal(SIGPIPE, SIG_IGN);
   std::signal(SIGXFSZ, SIG_IGN);
   orvalis::cli::Run run;

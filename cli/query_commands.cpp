@@ -48,7 +48,7 @@ std::vector<std::string> spectrum_columns(int rate_hz) {
 
 constexpr Query kEnergy = {
     "energy",
-    "Print the energy of every 20 ms of a file",
+    "Print the energy of each 20 ms of a file",
     "A line for each whole block: where it starts in seconds, and its energy in whole dB\n"
     "with its mean removed, 0 for silence and 90 for a square wave of full scale.\n\n"
     "Examples:\n"
@@ -61,7 +61,7 @@ constexpr Query kEnergy = {
 
 constexpr Query kSpectrum = {
     "spectrum",
-    "Print the power spectrum of every 10 ms of a file",
+    "Print the power spectrum of each 10 ms of a file",
     "A line for each whole frame: where it starts in seconds, and the power of 128 bins at\n"
     "16 kHz or 64 at 8 kHz. A bin is 2 re^2 + 2 im^2 of a transform over sample pairs, even\n"
     "samples real and odd ones imaginary, without a window.\n\n"

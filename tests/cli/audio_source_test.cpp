@@ -23,8 +23,8 @@ constexpr int kWavFloat = SF_FORMAT_WAV | SF_FORMAT_FLOAT;
 std::vector<short> read_all(const std::string &path, const AudioSettings &settings = {}) {
   AudioSource source(path, settings);
   std::vector<short> samples;
-  for (auto piece = source.read(); !piece.empty(); piece = source.read())
-    samples.insert(samples.end(), piece.begin(), piece.end());
+  for (auto chunk = source.read(); !chunk.empty(); chunk = source.read())
+    samples.insert(samples.end(), chunk.begin(), chunk.end());
   source.check_complete();
   return samples;
 }
@@ -79,7 +79,7 @@ TEST(AudioSource, OtherFormatsAreRoundedAndClipped) {
   EXPECT_EQ(read_all(folder / "float.wav"),
             (std::vector<short>{0, 32767, -32768, 32767, -32768, 0, 1, -1, -300, 32767, 0}));
 
-  // 24 bits lie in the upper bytes of an int: -1, 127, 129, -129 and the greatest.
+  // 24 bits lie in the upper bytes of an int: -1, 127, 129, -129 and the largest.
   write_audio<int>(folder / "24.wav", {-1 * 256, 127 * 256, 129 * 256, -129 * 256, 0x7fffff00},
                    16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_24);
   EXPECT_EQ(read_all(folder / "24.wav"), (std::vector<short>{0, 0, 1, -1, 32767}));
@@ -101,11 +101,11 @@ TEST(AudioSource, ResamplingKeepsTimeAndLevel) {
       tone[i] = static_cast<float>(wave(static_cast<double>(i) / rate));
     write_audio(folder / "tone.wav", tone, rate, 1, kWavFloat);
 
-    const std::vector<short> heard = read_all(folder / "tone.wav");
-    EXPECT_NEAR(static_cast<double>(heard.size()),
+    const std::vector<short> samples = read_all(folder / "tone.wav");
+    EXPECT_NEAR(static_cast<double>(samples.size()),
                 16000.0 * static_cast<double>(tone.size()) / rate, 1);
     for (std::size_t i = 1000; i < 15000; ++i)
-      ASSERT_NEAR(heard[i], 32768 * wave(static_cast<double>(i) / 16000), 4) << rate << ' ' << i;
+      ASSERT_NEAR(samples[i], 32768 * wave(static_cast<double>(i) / 16000), 4) << rate << ' ' << i;
   }
 }
 

@@ -1,4 +1,4 @@
-// Audio for the commands that give audio, and what is to come of it.
+// Input for the commands that write audio, and the output to expect.
 #pragma once
 
 #include <enhancement_stream.h>
@@ -53,7 +53,7 @@ inline Pcm noisy_pairs() {
   return pairs;
 }
 
-/// What the library's stream gives.
+/// The output of the library's stream.
 inline Pcm enhanced(const EnhancementSettings &settings, const Pcm &input) {
   EnhancementStream *stream = OpenEnhancementStream(&settings);
   Pcm output(input.size() + ENHANCEMENT_HELD_BACK);

@@ -1,4 +1,4 @@
-// What `orvalis denoise`, `level` and `process` make of audio.
+// The audio that `orvalis denoise`, `level` and `process` write.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -11,7 +11,7 @@ namespace {
 
 const std::string kPairs = "denoise --mics 2 --channels 2";
 
-TEST_F(Enhanced, GivesWhatTheStreamGives) {
+TEST_F(Enhanced, OutputIsTheStreams) {
   const Pcm mono = noisy_speech(), pairs = noisy_pairs();
   for (const int length : {0, 1, 161, 16001, 40071}) {
     SCOPED_TRACE(length);
@@ -42,16 +42,16 @@ TEST_F(Enhanced, NoiseFallsInPausesAndSilenceStays) {
   const struct {
     std::string options;
     const Pcm &input;
-    double least_db, most_db;
+    double min_db, max_db;
   } kCases[] = {
       {"denoise", mono, 12, 14.5}, {"denoise --level 18", mono, 17, 20}, {kPairs, pairs, 11, 15}};
-  for (const auto &[options, input, least_db, most_db] : kCases) {
+  for (const auto &[options, input, min_db, max_db] : kCases) {
     const Pcm output = through(options, input);
     const double fall =
         power_db(mono, 16000, kPause - 1600) - power_db(output, 16000, kPause - 1600);
     std::printf("%s: noise falls by %.1f dB\n", options.c_str(), fall);
-    EXPECT_GE(fall, least_db) << options;
-    EXPECT_LE(fall, most_db) << options;
+    EXPECT_GE(fall, min_db) << options;
+    EXPECT_LE(fall, max_db) << options;
   }
   const Pcm silence(5000);
   for (const std::string command : {"denoise", "denoise --level 18", "level"})
@@ -59,14 +59,14 @@ TEST_F(Enhanced, NoiseFallsInPausesAndSilenceStays) {
   EXPECT_EQ(through(kPairs, Pcm(10000)), silence);
 }
 
-/// The lag of `late` behind `early` at which the two are most alike.
+/// The lag of `late` behind `early` of their largest correlation.
 int lag_of(const Pcm &late, const Pcm &early) {
-  constexpr int kMost = 200;
+  constexpr int kMaxLag = 200;
   double best = 0;
-  int lag_of_best = -kMost - 1;
-  for (int lag = -kMost; lag <= kMost; ++lag) {
+  int lag_of_best = -kMaxLag - 1;
+  for (int lag = -kMaxLag; lag <= kMaxLag; ++lag) {
     double sum = 0;
-    for (int i = kMost; i + kMost < std::min(std::ssize(late), std::ssize(early)); ++i)
+    for (int i = kMaxLag; i + kMaxLag < std::min(std::ssize(late), std::ssize(early)); ++i)
       sum += double(late[static_cast<std::size_t>(i + lag)]) * early[static_cast<std::size_t>(i)];
     if (sum > best) {
       best = sum;
@@ -84,7 +84,7 @@ TEST_F(Enhanced, OutputIsNoLaterThanInput) {
   EXPECT_EQ(lag_of(through(kPairs + " --no-align", pairs), mono), 160);
   EXPECT_EQ(lag_of(through("level", mono), mono), 0);
 
-  // Speech at other rates: as it was recorded, and drawn out.
+  // Speech at other rates: recorded so, and interpolated.
   const Pcm narrow = load_recording(kNarrow);
   const std::map<int, Pcm> speech = {
       {8000, Pcm(narrow.begin(), narrow.begin() + 40001)},
@@ -138,7 +138,7 @@ TEST_F(Enhanced, JobsChangeNothing) {
   }
 }
 
-TEST_F(Enhanced, ChannelsNeedAWord) {
+TEST_F(Enhanced, SeveralChannelsNeedAnOption) {
   const Pcm mono = noisy_speech();
   Pcm stereo, doubled;
   for (const std::int16_t sample : mono) {
@@ -170,7 +170,7 @@ TEST_F(Enhanced, ChannelsNeedAWord) {
   }
 }
 
-/// What the tool says of samples at full scale.
+/// The tool's note on samples at full scale.
 std::string clipping_note(const char *where, const Pcm &samples) {
   const auto clipped = [](std::int16_t sample) { return sample == 32767 || sample == -32768; };
   std::array<char, 100> text;
@@ -181,7 +181,7 @@ std::string clipping_note(const char *where, const Pcm &samples) {
   return text.data();
 }
 
-TEST_F(Enhanced, LevelTellsWhatIsLoudOrClipped) {
+TEST_F(Enhanced, LevelReportsWhatIsLoudOrClipped) {
   // A second of a tone that is not loud, then half a second of one that is and clips.
   Pcm samples;
   for (int i = 0; i < 24000; ++i)

@@ -1,4 +1,4 @@
-// `orvalis epd` on several files at once, and what a terminal sees of long work.
+// `orvalis epd` on several files at once, and the progress line on a terminal.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <poll.h>
@@ -33,7 +33,7 @@ TEST_F(Jobs, OrderIsThatOfTheFiles) {
   }
 }
 
-TEST_F(Jobs, WhoseTurnItIsPrintsLive) {
+TEST_F(Jobs, TheCurrentJobPrintsLive) {
   const std::string samples = read_file(kNarrow).substr(kWavHeader);
   const std::string files = " " + kWide + " - " + kWideOpen;
   ChildProcess child(command("epd --jobs 3 --raw --rate 8000" + files), folder_.path());
@@ -51,7 +51,7 @@ TEST_F(Jobs, OutputThatFailsEndsThemAll) {
   EXPECT_EQ(full.err, "orvalis: standard output: No space left on device\n");
 }
 
-/// A terminal that only shows.
+/// A terminal without a keyboard.
 class Terminal {
 public:
   Terminal() : screen_(posix_openpt(O_RDWR | O_NOCTTY)) {
@@ -66,19 +66,19 @@ public:
   Terminal(const Terminal &) = delete;
   Terminal &operator=(const Terminal &) = delete;
 
-  /// Whether this system gives terminals at all: a bare root folder has no /dev/pts.
+  /// Whether this system has terminals: a bare root folder lacks /dev/pts.
   bool exists() const { return line_ >= 0; }
 
   const std::string &name() const { return name_; }
 
-  /// What was shown since the last call; the system may need a moment to bring it here.
+  /// What was shown since the last call, including what arrives within 0.3 s.
   std::string shown() const {
     std::string text;
-    char piece[4096];
+    char chunk[4096];
     for (pollfd screen{screen_, POLLIN, 0}; poll(&screen, 1, 300) > 0;) {
-      const ssize_t got = read(screen_, piece, sizeof piece);
+      const ssize_t got = read(screen_, chunk, sizeof chunk);
       if (got <= 0) break;
-      text.append(piece, static_cast<std::size_t>(got));
+      text.append(chunk, static_cast<std::size_t>(got));
     }
     return text;
   }
@@ -90,8 +90,8 @@ private:
 
 TEST_F(Jobs, LongWorkIsShownOnATerminalAndWiped) {
   const Terminal terminal;
-  if (!terminal.exists()) GTEST_SKIP() << "the system gives no terminal";
-  // A reader who pauses keeps the tool waiting, however quick it is.
+  if (!terminal.exists()) GTEST_SKIP() << "the system has no terminals";
+  // A slow reader makes the work long.
   const std::string slow = " | { sleep 1.2; cat; }";
   const std::string frames = "epd --frames " + kNarrow;
   for (const std::string &work : {frames, "denoise --keep-rate " + kNarrow + " -"}) {
@@ -116,7 +116,7 @@ TEST_F(Jobs, LongWorkIsShownOnATerminalAndWiped) {
   run("epd " + kWide + " 2>" + terminal.name());
   EXPECT_EQ(terminal.shown(), "") << "short work needs no line";
 
-  // The line gives way to what is printed on the same terminal.
+  // The line is cleared before anything is printed on the same terminal.
   ChildProcess live(command("epd --raw --rate 8000 - >") + terminal.name() + " 2>&1",
                     folder_.path());
   const std::string samples = read_file(kNarrow).substr(kWavHeader);

@@ -1,4 +1,4 @@
-// The tool's label formats, read as the programs they are for read them.
+// The tool's label formats, parsed as their programs do.
 #include <gtest/gtest.h>
 
 #include <filesystem>
@@ -106,7 +106,7 @@ TEST_F(LabelFormats, RttmNamesTheFileAndGivesDurations) {
 TEST_F(LabelFormats, TextGridCoversTheFileWithoutHoles) {
   const std::string text = labels("--format textgrid " + kNarrow);
   EXPECT_EQ(text.find("File type = \"ooTextFile\"\nObject class = \"TextGrid\"\n"), 0u);
-  // As Praat reads: the values in their order, whatever stands before them.
+  // Praat reads values by their order and skips what stands before them.
   std::vector<std::string> values;
   std::istringstream lines(text);
   for (std::string line; std::getline(lines, line);) {

@@ -40,7 +40,7 @@ TEST_F(Outputs, FormatFollowsNameOrOption) {
   EXPECT_EQ(run("level " + kWide + " " + (folder_ / "a.raw")).status, 0);
   EXPECT_EQ(samples_of(read_file(folder_ / "a.raw")), expected);
 
-  // Into a folder, inputs keep their names, with an ending that tells the format.
+  // In a folder, outputs have the names of their inputs, with the ending of their format.
   const std::string out = folder_ / "out";
   fs::create_directory(out);
   const std::string raw = write("r.raw", bytes_of(Pcm(1000, 99))), odd = write("x.s16", "1234");
@@ -55,14 +55,14 @@ TEST_F(Outputs, StreamsBeginBeforeTheInputEnds) {
   ChildProcess child(command("denoise --raw - -"), folder_.path());
   child.write(bytes_of(speech).substr(0, 16000));
   EXPECT_TRUE(child.prints(std::string("WAVEfmt ")));
-  // All but a frame that is not whole and the delay.
+  // All but an incomplete frame and the delay.
   for (int tries = 0; tries < 1000 && child.output().size() < 16000 - 2 * 208; ++tries)
     std::this_thread::sleep_for(std::chrono::milliseconds(10));
   EXPECT_GE(child.output().size(), 16000u - 2 * 208);
   child.write(bytes_of(speech).substr(16000));
   EXPECT_EQ(child.finish(), 0);
 
-  // What was streamed can be read as it comes, and once it is a file.
+  // The stream can be read from a pipe, and from a file.
   const std::string streamed = child.output();
   EXPECT_EQ(samples_of(streamed.substr(kWavHeader)), through("denoise", speech));
   const auto expected = unnamed("--raw --lead-in -", streamed.substr(kWavHeader));
@@ -87,7 +87,7 @@ TEST_F(Outputs, NoFileIsLost) {
       EXPECT_EQ(read_file(take), bytes) << arguments;
     }
   }
-  // Nor by the output of another input, or as a part.
+  // Nor by the output of another input, nor by an utterance's file.
   fs::create_directory(folder_ / "other");
   const std::string other = write("other/take.wav", bytes);
   fs::create_symlink(other, folder_ / "alias.wav");
@@ -145,7 +145,7 @@ TEST_F(Outputs, NothingHalfWrittenIsLeft) {
   }
   EXPECT_TRUE(fs::is_empty(out));
 
-  // Where standard error is closed, no note may find its way into the output.
+  // If standard error is closed, notes must not end up in the output.
   const std::string noted = "level --raw --rate 8000 - " + out;
   EXPECT_NE(run(noted + "a.raw", "some samples").err, "");
   EXPECT_EQ(run(noted + "b.raw 2>&-", "some samples").status, 0);

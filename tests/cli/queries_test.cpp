@@ -1,4 +1,4 @@
-// `orvalis energy` and `orvalis spectrum` against the library's own answers.
+// `orvalis energy` and `orvalis spectrum` against the library's own functions.
 #include <gtest/gtest.h>
 
 #include <nlohmann/json.hpp>
@@ -14,10 +14,10 @@
 namespace orvalis::test {
 namespace {
 
-/// Runs a query in both formats and holds every line to `answer(first sample)`.
-template <class Answer>
+/// Runs a query in both formats and compares each line with `values(first sample)`.
+template <class Values>
 void expect_answers(const std::string &command, const std::string &name, double step_s,
-                    std::size_t lines, const std::string &field, Answer answer) {
+                    std::size_t lines, const std::string &field, Values values) {
   SCOPED_TRACE(command);
   const TemporaryFolder folder;
   const auto output = [&](const std::string &format) {
@@ -32,7 +32,7 @@ void expect_answers(const std::string &command, const std::string &name, double 
   EXPECT_EQ(row.rfind("start,", 0), 0u);
   for (std::size_t i = 0; i < lines; ++i) {
     ASSERT_TRUE(std::getline(csv, row) && std::getline(json, object)) << i;
-    const std::vector<std::int32_t> expected = answer(i);
+    const std::vector<std::int32_t> expected = values(i);
     std::istringstream cells(row);
     std::string cell;
     std::getline(cells, cell, ',');

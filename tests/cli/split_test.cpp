@@ -25,7 +25,7 @@ protected:
     return names;
   }
 
-  /// Splits an input and holds every part to its samples. `frames_per_s` counts them in `source`.
+  /// Splits an input and compares each part with the samples of `source`.
   void expect_parts(const std::string &input, const std::string &stem, const Audio &source,
                     int subtype, const std::string &bytes = {}) const {
     SCOPED_TRACE(input);
@@ -66,7 +66,7 @@ TEST_F(Split, PartsAreTheSourcesOwnSamples) {
     std::vector<int> samples;
     for (int frame = 0; frame < 12 * rate_hz; ++frame) {
       const int sample = speech[static_cast<std::size_t>(frame * 8000LL / rate_hz)];
-      // What 16 bits do not hold differs from channel to channel.
+      // The channels differ in the lower bits, which 16-bit samples do not have.
       for (int c = 0; c < channels; ++c)
         samples.push_back(sample * 65536 + (frame + c) % 256 * 256);
     }
@@ -76,8 +76,8 @@ TEST_F(Split, PartsAreTheSourcesOwnSamples) {
   }
 }
 
-TEST_F(Split, PipesGiveWhatTheEngineHeard) {
-  // All of it, so that much can be forgotten on the way; and 8 kHz in two channels, of which one.
+TEST_F(Split, PartsOfPipesAreWhatTheEngineWasGiven) {
+  // All of it, so that much is forgotten on the way; and one of two channels at 8 kHz.
   const std::string wav = read_file(kNarrow);
   expect_parts("-", "stdin", read_audio(kNarrow), SF_FORMAT_PCM_16, wav);
   expect_parts("- <" + kNarrow, "stdin", read_audio(kNarrow), SF_FORMAT_PCM_16);
@@ -128,22 +128,22 @@ TEST_F(Split, NothingHalfWrittenIsLeft) {
   }
 }
 
-TEST_F(Split, DumpsHoldWhatWasJudgedAndAnswered) {
+TEST_F(Split, DumpsHoldInputAndDecisions) {
   for (const std::string frames : {"--frames ", ""}) {
     const std::string root = folder_ / ("dump" + frames);
     epd(frames + "--dump '" + root + "' " + kWide);
-    Pcm heard, answered;
+    Pcm input, decided;
     for (const auto &name : names_in(root + "/sdcard/VRpreprocess")) {
       const std::string file = root + "/sdcard/VRpreprocess/" + name;
-      (name.ends_with("_inputEPD.pcm") ? heard : answered) = load_recording(file);
+      (name.ends_with("_inputEPD.pcm") ? input : decided) = load_recording(file);
     }
     Pcm expected = load_recording(kWide);
     expected.resize(expected.size() / 160 * 160);
-    EXPECT_EQ(heard, expected);
-    const auto answers = epd("--frames " + kWide);
-    ASSERT_EQ(answered.size(), 160 * answers.size());
-    for (std::size_t i = 0; i < answered.size(); ++i)
-      ASSERT_EQ(answered[i] >= 1000, answers[i / 160]["answer"] == 1) << i;
+    EXPECT_EQ(input, expected);
+    const auto frames_found = epd("--frames " + kWide);
+    ASSERT_EQ(decided.size(), 160 * frames_found.size());
+    for (std::size_t i = 0; i < decided.size(); ++i)
+      ASSERT_EQ(decided[i] >= 1000, frames_found[i / 160]["answer"] == 1) << i;
   }
 }
 

@@ -1,4 +1,4 @@
-// What `orvalis epd` makes of its inputs and options.
+// `orvalis epd`: inputs, options and errors.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -14,7 +14,7 @@
 namespace orvalis::test {
 namespace {
 
-TEST_F(Tool, TableAndJsonTellTheSame) {
+TEST_F(Tool, TableAndJsonAgree) {
   const std::string files = kWide + " " + kNarrow + " " + kWideOpen;
   std::string expected;
   std::string name;
@@ -56,7 +56,7 @@ TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
     EXPECT_EQ(unnamed(raw + "--lead-in -", samples), expected);
     EXPECT_EQ(unnamed(raw + write("samples", samples)), expected);
 
-    // A live recorder's header, which cannot tell the length, and the same audio in two channels.
+    // A live recorder's header, without a length; and the same audio in two channels.
     const std::string open_end = wav.substr(0, kWavHeader - 4) + "\xff\xff\xff\xff" + samples;
     EXPECT_EQ(unnamed("-", open_end), expected);
     std::string doubled;
@@ -64,29 +64,29 @@ TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
       doubled += samples.substr(i, 2) + samples.substr(i, 2);
     EXPECT_EQ(unnamed(raw + "--lead-in --channels 2 -", doubled), expected);
 
-    // Live samples are not waited for.
+    // Live samples get no lead-in.
     const auto at_once = unnamed("--no-lead-in " + path);
     EXPECT_EQ(unnamed(raw + "-", samples), at_once);
     EXPECT_GT(at_once[0]["start"], expected[0]["start"]);
   }
 }
 
-TEST_F(Tool, PiecesOnAPipeDoNotMatter) {
+TEST_F(Tool, ChunksOnAPipeDoNotMatter) {
   const std::string samples = read_file(kWide).substr(kWavHeader);
-  for (const std::size_t piece : {1, 7, 160, 1000}) {
-    const std::string options = piece == 7 ? "--lead-in " : "--no-lead-in ";
+  for (const std::size_t chunk : {1, 7, 160, 1000}) {
+    const std::string options = chunk == 7 ? "--lead-in " : "--no-lead-in ";
     const auto expected = unnamed(options + kWide);
     ChildProcess child(command("epd --format json --raw - " + options), folder_.path());
-    for (std::size_t at = 0; at < samples.size(); at += 2 * piece)
-      child.write(samples.substr(at, 2 * piece));
+    for (std::size_t at = 0; at < samples.size(); at += 2 * chunk)
+      child.write(samples.substr(at, 2 * chunk));
     EXPECT_EQ(child.finish(), 0);
     auto found = json_lines(child.output());
     for (Json &line : found) line.erase("file");
-    EXPECT_EQ(found, expected) << piece;
+    EXPECT_EQ(found, expected) << chunk;
   }
 }
 
-TEST_F(Tool, FormatsAreHeardAlike) {
+TEST_F(Tool, FormatsGiveSimilarUtterances) {
   const auto expected = epd(kWide);
   Pcm clipped;
   std::vector<float> plain, loud;
@@ -105,7 +105,7 @@ TEST_F(Tool, FormatsAreHeardAlike) {
     EXPECT_NEAR(found[0]["start"], expected[0]["start"], 0.1) << std::hex << format;
     EXPECT_NEAR(found[0]["end"], expected[0]["end"], 0.3) << std::hex << format;
   }
-  // Above full scale audio clips and does not wrap, just as if it had been clipped before.
+  // Audio beyond full scale clips and does not wrap.
   write_audio(folder_ / "loud.wav", loud, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_FLOAT);
   write_audio(folder_ / "clipped.wav", clipped, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
   EXPECT_EQ(unnamed(folder_ / "loud.wav"), unnamed(folder_ / "clipped.wav"));
@@ -152,7 +152,7 @@ TEST_F(Tool, OptionsReachTheDetector) {
   EXPECT_LT(epd("--content-type 2 " + kWide)[0]["ended"], epd(kWide)[0]["ended"]);
   EXPECT_EQ(epd("--gain 1 " + kNarrow), plain);
 
-  // A gain of 4 undoes what the audio lacks, and divides by 4 what it has too much.
+  // Gains of 4 and 0.25 make up for audio that is 4 times too quiet or too loud.
   Pcm quiet, loud;
   for (const short sample : load_recording(kNarrow)) {
     quiet.push_back(static_cast<short>(sample / 32));
@@ -172,9 +172,9 @@ TEST_F(Tool, FramesAgreeWithUtterances) {
     const auto frames = epd("--frames " + options);
     const auto utterances = epd(options);
     ASSERT_FALSE(utterances.empty());
-    const auto answer = [](const Json &frame) { return frame["answer"] == 1; };
-    const auto first = std::ranges::find_if(frames, answer);
-    const auto last = std::ranges::find_if(frames.rbegin(), frames.rend(), answer);
+    const auto is_speech = [](const Json &frame) { return frame["answer"] == 1; };
+    const auto first = std::ranges::find_if(frames, is_speech);
+    const auto last = std::ranges::find_if(frames.rbegin(), frames.rend(), is_speech);
     ASSERT_NE(first, frames.end());
     EXPECT_EQ((*first)["frame"], first - frames.begin());
     EXPECT_NEAR((*first)["start"].get<double>() + 0.01, utterances.front()["began"], 1e-9);
@@ -202,7 +202,7 @@ TEST_F(Tool, SilenceAndNoAudioAreNoErrors) {
   }
 }
 
-TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
+TEST_F(Tool, BadFilesAreNamedAndTheOthersProcessed) {
   const std::string wav = read_file(kWide);
   const Pcm samples = load_recording(kWide);
   write_audio(folder_ / "whole.flac", samples, 16000, 1, SF_FORMAT_FLAC | SF_FORMAT_PCM_16);
@@ -229,7 +229,7 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
   }
   EXPECT_FALSE(std::getline(messages, message)) << message;
 
-  // Each good file, and what the halves of two hold.
+  // Each good file, and what was found in the halves of two.
   const auto found = json_lines(result.out);
   const auto good = epd(kWide);
   EXPECT_EQ(std::ranges::count(found, good.at(0)), 8);
@@ -238,7 +238,7 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersDone) {
     EXPECT_TRUE(std::ranges::any_of(found, [&](const Json &one) { return one["file"] == cut; }));
 
   EXPECT_EQ(run("epd --channel 2 " + kWide).status, 1);
-  // A format that needs seeking must not pass for silence on a pipe.
+  // On a pipe, a format that needs seeking is an error and not silence.
   EXPECT_EQ(run("epd -", read_file(folder_ / "whole.caf")).status, 1);
   EXPECT_EQ(run("epd -", "no audio at all").err.find("orvalis: standard input: "), 0U);
 }
@@ -274,7 +274,8 @@ TEST_F(Tool, WrongUsageEndsWith2) {
     EXPECT_EQ(result.out, "") << arguments;
     EXPECT_EQ(result.err.find("orvalis: "), 0U) << result.err;
   }
-  EXPECT_FALSE(std::filesystem::exists("d")) << "wrong usage is met before anything is made";
+  EXPECT_FALSE(std::filesystem::exists("d"))
+      << "wrong usage is reported before anything is created";
   const Result help = run("epd --help");
   EXPECT_EQ(help.status, 0);
   for (const char *word : {"--hangover", "--raw", "--channel", "arecord", "Exit status"})
@@ -282,7 +283,7 @@ TEST_F(Tool, WrongUsageEndsWith2) {
   EXPECT_NE(run("version").out.find("library 160705\n"), std::string::npos);
 }
 
-TEST_F(Tool, LiveAudioIsAnsweredBeforeItEnds) {
+TEST_F(Tool, LiveAudioIsReportedBeforeItEnds) {
   const std::string samples = read_file(kNarrow).substr(kWavHeader);
   ChildProcess child(command("epd --raw --rate 8000 -"), folder_.path());
   // The first utterance is over after 2.5 s, the second begins after 3.3 s.
@@ -295,7 +296,7 @@ TEST_F(Tool, LiveAudioIsAnsweredBeforeItEnds) {
 }
 
 TEST_F(Tool, OutputThatFailsEndsWith1) {
-  // More than a pipe holds, so that the reader is gone for certain before the end.
+  // More output than a pipe holds, so that the reader has certainly gone before the end.
   const std::string status_file = folder_ / "status";
   ChildProcess child("{ " + command("epd --frames --format json " + kNarrow) + "; echo $? >" +
                          status_file + "; } | true",

@@ -1,4 +1,4 @@
-// `orvalis vad`: what the tool makes of files and options; traces of both detectors.
+// `orvalis vad`: inputs and options; traces of both detectors.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -15,7 +15,7 @@
 namespace orvalis::test {
 namespace {
 
-using Answers = std::vector<bool>;
+using Decisions = std::vector<bool>;
 
 struct Voice {
   const char *options;
@@ -29,7 +29,7 @@ const Voice kVoices[] = {{"", 0, 0, 0, 0, 2, 0.84F},
                          {"--margin-over-minima --energy-margin 7", 0, 0, 1, 0, 7, 0.84F},
                          {"--low-threshold --energy-margin 0", 0, 0, 0, 1, 0, 0.84F}};
 
-Answers answers_of(const Voice &voice, Pcm pcm) {
+Decisions decisions_of(const Voice &voice, Pcm pcm) {
   VADINFO record{};
   VADINFO *vad = &record;
   initialVADINFO(&vad);
@@ -38,35 +38,35 @@ Answers answers_of(const Voice &voice, Pcm pcm) {
   vad->calibrationEnable = voice.enable;
   vad->lowThresholdSelect = voice.low;
   vad->energyMargin = voice.margin;
-  Answers answers;
+  Decisions decisions;
   for (std::size_t at = 0; at + 160 <= pcm.size(); at += 160)
-    answers.push_back(processVAD(&vad, &pcm[at], 160, voice.exponent) == 1);
-  return answers;
+    decisions.push_back(processVAD(&vad, &pcm[at], 160, voice.exponent) == 1);
+  return decisions;
 }
 
 using Vad = Tool;
 
-TEST_F(Vad, TraceGivesTheAnswersAndTheirReasons) {
+TEST_F(Vad, TraceHoldsDecisionsAndTheirReasons) {
   for (const std::string &file : {kWide, kNarrow}) {
     const Pcm pcm = load_recording(file);
     for (const Voice &voice : kVoices) {
       SCOPED_TRACE(voice.options + (" " + file));
-      const Answers answers = answers_of(voice, pcm);
+      const Decisions decisions = decisions_of(voice, pcm);
       const Result result =
           run(std::string("vad --trace --format json ") + voice.options + " " + file);
       EXPECT_EQ(result.err, "");
       const auto lines = json_lines(result.out);
-      ASSERT_EQ(lines.size(), answers.size());
-      for (std::size_t i = 0; i < answers.size(); ++i) {
+      ASSERT_EQ(lines.size(), decisions.size());
+      for (std::size_t i = 0; i < decisions.size(); ++i) {
         const Json &line = lines[i];
         ASSERT_EQ(line["frame"], i);
         ASSERT_DOUBLE_EQ(line["start"], static_cast<double>(i) * (file == kWide ? 0.01 : 0.02));
-        ASSERT_EQ(line["answer"] == 1, answers[i]) << i;
+        ASSERT_EQ(line["answer"] == 1, decisions[i]) << i;
         const bool reasons =
             line["energy"].get<float>() > line["energy_threshold"].get<float>() &&
             line["smoothed_energy"].get<float>() > line["smoothed_threshold"].get<float>() &&
             line["speech_bins"] > line["speech_bins_threshold"];
-        ASSERT_EQ(reasons, answers[i]) << line;
+        ASSERT_EQ(reasons, decisions[i]) << line;
       }
     }
   }
@@ -153,7 +153,7 @@ TEST_F(Vad, FormatsJobsAndRefusalsAreThoseOfEpd) {
   }
 }
 
-TEST_F(Vad, TraceOfEpdGivesAnswersAndLevels) {
+TEST_F(Vad, TraceOfEpdHoldsDecisionsAndLevels) {
   const Pcm pcm = load_recording(kWide);
   const auto lines =
       json_lines(run("epd --trace --no-lead-in --format json --content-type 2 " + kWide).out);
