@@ -12,6 +12,10 @@ std::unique_lock<std::mutex> lock_opening() {
   return std::unique_lock(opening);
 }
 
+std::filesystem::path file_name_of(const std::string &input) {
+  return input == "-" ? "stdin" : std::filesystem::path(input).filename();
+}
+
 std::string message_of(int error) { return std::generic_category().message(error); }
 
 SF_VIRTUAL_IO *FileBytes::functions() {

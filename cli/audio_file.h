@@ -3,6 +3,7 @@
 
 #include <sndfile.h>
 
+#include <filesystem>
 #include <memory>
 #include <mutex>
 #include <stdexcept>
@@ -25,11 +26,14 @@ using Sndfile = std::unique_ptr<SNDFILE, SndfileCloser>;
 /// this lock from opening a file until the reason has been read.
 std::unique_lock<std::mutex> lock_opening();
 
+/// The name of an input without its folder, for outputs that are named after it: "stdin" for "-".
+std::filesystem::path file_name_of(const std::string &input);
+
 /// The system's text for a value of errno.
 std::string message_of(int error);
 
-/// The bytes of a file, for libsndfile to work on. Keeps the first error, which libsndfile does not
-/// report, and when it closes a file not even notice.
+/// The bytes of a file that libsndfile works on. Keeps the first error: libsndfile does not report
+/// its reason, and ignores errors while closing.
 class FileBytes {
 public:
   /// Owns `descriptor`.

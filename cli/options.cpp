@@ -133,7 +133,7 @@ std::unique_ptr<Report> make_report(const std::string &format, const std::string
 void prepare_split(const SplitSettings &split, const std::vector<std::string> &inputs) {
   if (split.folder.empty()) return;
   if (const std::string pair = same_parts(inputs); !pair.empty())
-    throw CLI::ValidationError("--split", pair + " would give files of the same names");
+    throw CLI::ValidationError("--split", pair + " would have parts of the same names");
   make_folder("--split", split.folder);
 }
 

@@ -52,14 +52,14 @@ UtteranceOptions add_utterance_options(CLI::App &command, DetectorSettings &sett
 
 // The functions below throw CLI::ValidationError.
 
-/// Standard input can be read only once.
+/// Refuses standard input if it is named twice: it can be read only once.
 void check_inputs(const std::vector<std::string> &inputs);
 
 /// The report that `option` selects, on some inputs. Refuses a format that cannot describe as many.
 std::unique_ptr<Report> make_report(const std::string &format, const std::string &option,
                                     std::size_t inputs, Console &console);
 
-/// Creates the folder for --split, if it is given. Refuses inputs whose files would have the same
+/// Creates the folder for --split, if it is given. Refuses inputs whose parts would have the same
 /// names.
 void prepare_split(const SplitSettings &split, const std::vector<std::string> &inputs);
 

@@ -43,7 +43,8 @@ struct SampleFormat {
 /// throw AudioError, with the file's name in the message.
 class OutputFile {
 public:
-  /// Existing files are respected here and once more when committing.
+  /// Throws if `overwriting` does not allow to replace `path`. Whether that exists is checked once
+  /// more when committing.
   OutputFile(const std::string &path, const SampleFormat &format, const Overwriting &overwriting);
   ~OutputFile();
 

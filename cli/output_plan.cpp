@@ -15,7 +15,7 @@ namespace fs = std::filesystem;
 
 /// In a folder, an output gets the input's name, and its format if that can be written.
 OutputTarget in_folder(const std::string &folder, const std::string &input, std::string format) {
-  const fs::path name = input == "-" ? "stdin" : fs::path(input).filename();
+  const fs::path name = file_name_of(input);
   const std::string own_format = format_of_name(name);
   if (format.empty()) format = own_format.empty() ? "wav" : own_format;
   const bool keeps_name = format == own_format;
@@ -28,7 +28,7 @@ OutputTarget under_name(const std::string &name, std::string format) {
   const bool streamed = is_streamed(name);
   if (format.empty() && streamed) format = "wav";
   if (format.empty())
-    throw CLI::ValidationError("FILE", fmt::format("{} does not end in a format: name one with "
+    throw CLI::ValidationError("FILE", fmt::format("{} has no known ending: choose a format with "
                                                    "--format ({})",
                                                    name, fmt::join(output_format_names(), ", ")));
   if (streamed && !can_be_streamed(format))
@@ -44,7 +44,7 @@ std::vector<OutputTarget> plan_outputs(const std::vector<std::string> &inputs,
   if (!fs::is_directory(destination, ignored)) {
     if (inputs.size() > 1)
       throw CLI::ValidationError(
-          "OUT", "several files need a folder to go to, which " + destination + " is not");
+          "OUT", "several inputs need a folder for the outputs, which " + destination + " is not");
     return {under_name(destination, format)};
   }
   std::vector<OutputTarget> outputs;

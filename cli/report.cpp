@@ -5,8 +5,9 @@
 #include <algorithm>
 #include <cctype>
 #include <cmath>
-#include <filesystem>
 #include <nlohmann/json.hpp>
+
+#include "cli/audio_file.h"
 
 namespace orvalis::cli {
 namespace {
@@ -233,7 +234,7 @@ public:
 private:
   /// The file's name without folder, ending and white space, as tools match it.
   std::string file_id() const {
-    std::string id = name_ == "-" ? "stdin" : std::filesystem::path(name_).stem().string();
+    std::string id = file_name_of(name_).stem();
     std::ranges::replace_if(
         id, [](unsigned char c) { return std::isspace(c) != 0; }, '_');
     return id;

@@ -38,8 +38,8 @@ public:
   /// Appends the samples that are ready.
   void push(std::span<const std::int16_t> input, std::vector<std::int16_t> &output);
 
-  /// Appends the rest, so that `length` samples have come out altogether: the filter alone is one
-  /// or two off.
+  /// Appends the rest, cut or extended so that the whole output has `length` samples: the filter
+  /// alone misses that by one or two.
   void flush(std::int64_t length, std::vector<std::int16_t> &output);
 
 private:

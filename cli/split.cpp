@@ -12,9 +12,7 @@
 namespace orvalis::cli {
 namespace {
 
-std::string stem_of(const std::string &input) {
-  return input == "-" ? "stdin" : std::filesystem::path(input).stem().string();
-}
+std::string stem_of(const std::string &input) { return file_name_of(input).stem(); }
 
 /// Names the files and opens them.
 class Parts {

@@ -1,4 +1,5 @@
-// Each utterance in a file of its own: take.wav gives take-001.wav, take-002.wav ...
+// Each utterance in a file of its own, a part of the input: take-001.wav, take-002.wav ... of
+// take.wav.
 #pragma once
 
 #include <utterance_stream.h>
@@ -32,7 +33,7 @@ public:
   virtual void write(const Utterance &found) = 0;
 };
 
-/// Two inputs whose files would have the same names, as "a and b"; "" if there are none.
+/// Two inputs whose parts would have the same names, as "a and b"; "" if there are none.
 std::string same_parts(const std::vector<std::string> &inputs);
 
 /// Copies the input's own samples, with its rate, channels and sample format, or in floating point
