@@ -165,16 +165,19 @@ public final class EndPointDetector implements AutoCloseable {
    */
   public List<Utterance> push(short[] pcm, int offset, int count) {
     SafeLayer.checkRange(pcm, offset, count);
-    synchronized (handle) {
+    handle.enter();
+    try {
       long stream = handle.address();
       if (flushed) throw new IllegalStateException("pushed after the flush");
       List<Utterance> found = new ArrayList<>();
       int done = 0;
       do {
-        done += SafeLayer.pushAudio(stream, pcm, offset + done, count - done);
+        done += SafeLayer.check(SafeLayer.pushAudio(stream, pcm, offset + done, count - done));
         collect(stream, found);
       } while (done < count);
       return found;
+    } finally {
+      handle.leave();
     }
   }
 
@@ -184,13 +187,16 @@ public final class EndPointDetector implements AutoCloseable {
    * @throws IllegalStateException after close
    */
   public List<Utterance> flush() {
-    synchronized (handle) {
+    handle.enter();
+    try {
       long stream = handle.address();
       flushed = true;
-      SafeLayer.flushStream(stream);
+      SafeLayer.check(SafeLayer.flushStream(stream));
       List<Utterance> found = new ArrayList<>();
       collect(stream, found);
       return found;
+    } finally {
+      handle.leave();
     }
   }
 
@@ -202,6 +208,6 @@ public final class EndPointDetector implements AutoCloseable {
 
   private static void collect(long stream, List<Utterance> found) {
     long[] fields = new long[6];
-    while (SafeLayer.nextUtterance(stream, fields) == 1) found.add(new Utterance(fields));
+    while (SafeLayer.check(SafeLayer.nextUtterance(stream, fields)) == 1) found.add(new Utterance(fields));
   }
 }

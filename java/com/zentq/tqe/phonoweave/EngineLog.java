@@ -12,12 +12,20 @@ import java.util.logging.Logger;
 public final class EngineLog {
   private static volatile Logger target;
 
+  /** Set on a thread as long as it is in a handler. */
+  private static final ThreadLocal<Boolean> HANDLING = new ThreadLocal<>();
+
   private EngineLog() {}
 
   /**
    * Sends lines to a logger: debug lines as {@link Level#FINE}, information as {@link Level#INFO},
    * errors as {@link Level#SEVERE}. What the logger throws is lost. Lines of threads that Java does
    * not know are left out.
+   *
+   * <p>The logger's handlers run inside the call that caused the line. From there every call on an
+   * object that is in use, {@code close()} included, throws {@link IllegalStateException}: on the
+   * object whose call this is, and, instead of waiting, on one that another thread uses. Lines that a
+   * handler itself causes are left out. A handler must not wait for another thread's call.
    *
    * @param logger the receiver
    */
@@ -40,7 +48,18 @@ public final class EngineLog {
     SafeLayer.setLogDestination(SafeLayer.LOG_TO_STANDARD_ERROR);
   }
 
+  /** Whether this thread is in a handler. */
+  static boolean isHandling() {
+    return HANDLING.get() != null;
+  }
+
   static void write(int priority, String text) {
-    target.log(priority >= 6 ? Level.SEVERE : priority >= 4 ? Level.INFO : Level.FINE, text);
+    if (isHandling()) return; // a handler that makes objects would be called without end
+    HANDLING.set(true);
+    try {
+      target.log(priority >= 6 ? Level.SEVERE : priority >= 4 ? Level.INFO : Level.FINE, text);
+    } finally {
+      HANDLING.remove();
+    }
   }
 }

@@ -31,7 +31,8 @@ final class EnhancementStream {
 
   /** The output that these samples complete. */
   short[] push(short[] pcm, int offset, int count) {
-    synchronized (handle) {
+    handle.enter();
+    try {
       long stream = handle.address();
       SafeLayer.checkRange(pcm, offset, count);
       short[] out = new short[count / microphones + SafeLayer.MOST_BEYOND_A_PUSH];
@@ -39,12 +40,15 @@ final class EnhancementStream {
       if (ready < 0) throw new IllegalStateException("pushed after the flush");
       loud = SafeLayer.isLoud(stream);
       return Arrays.copyOf(out, ready);
+    } finally {
+      handle.leave();
     }
   }
 
   /** The rest of the output; nothing the second time. */
   short[] flush() {
-    synchronized (handle) {
+    handle.enter();
+    try {
       long stream = handle.address();
       short[] out = new short[SafeLayer.MOST_OF_A_FLUSH];
       int ready = SafeLayer.flushEnhancement(stream, out);
@@ -53,13 +57,18 @@ final class EnhancementStream {
       }
       loud = SafeLayer.isLoud(stream);
       return Arrays.copyOf(out, ready);
+    } finally {
+      handle.leave();
     }
   }
 
   /** Whether the newest frame was loud. */
   boolean isLoud() {
-    synchronized (handle) {
+    handle.enter();
+    try {
       return loud;
+    } finally {
+      handle.leave();
     }
   }
 

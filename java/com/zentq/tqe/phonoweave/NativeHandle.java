@@ -4,13 +4,17 @@ import java.lang.ref.PhantomReference;
 import java.lang.ref.Reference;
 import java.lang.ref.ReferenceQueue;
 import java.util.Collections;
+import java.util.Iterator;
+import java.util.Queue;
 import java.util.Set;
 import java.util.concurrent.ConcurrentHashMap;
+import java.util.concurrent.ConcurrentLinkedQueue;
+import java.util.concurrent.locks.ReentrantLock;
 
 /**
- * One engine handle and its owner's lock. Whoever uses the address holds the lock meanwhile, so that
- * nothing releases it under a running call: neither another thread's close, nor the release of a
- * handle whose owner was forgotten.
+ * One engine handle and the mark that it is in use. Every call on the owner enters first and leaves
+ * at its end, so that nothing releases the handle during a call: neither a close, on this thread or
+ * another, nor the release of handles whose owners were forgotten.
  *
  * <p>Forgotten handles are released when the next one is made, so no thread has to wait for them.
  */
@@ -25,6 +29,10 @@ final class NativeHandle extends PhantomReference<Object> {
   private static final Set<NativeHandle> LIVING =
       Collections.newSetFromMap(new ConcurrentHashMap<NativeHandle, Boolean>());
 
+  /** Forgotten handles that are not released yet, because their last call was still running. */
+  private static final Queue<NativeHandle> PUT_OFF = new ConcurrentLinkedQueue<>();
+
+  private final ReentrantLock use = new ReentrantLock();
   private final Release release;
   private long address;
 
@@ -43,10 +51,20 @@ final class NativeHandle extends PhantomReference<Object> {
     LIVING.add(this);
   }
 
-  /** Releases the handles whose owners were collected without having been closed. */
+  /** Releases the handles whose owners were collected without having been closed, but for busy ones. */
   static void releaseForgotten() {
     for (Reference<?> found = FORGOTTEN.poll(); found != null; found = FORGOTTEN.poll()) {
-      ((NativeHandle) found).close();
+      PUT_OFF.add((NativeHandle) found);
+    }
+    for (Iterator<NativeHandle> all = PUT_OFF.iterator(); all.hasNext(); ) {
+      NativeHandle handle = all.next();
+      if (handle.use.isHeldByCurrentThread() || !handle.use.tryLock()) continue;
+      try {
+        handle.release();
+      } finally {
+        handle.leave();
+      }
+      all.remove();
     }
   }
 
@@ -55,14 +73,49 @@ final class NativeHandle extends PhantomReference<Object> {
     return LIVING.size();
   }
 
-  /** The address; to be called, and used, with this handle's lock held. */
+  /**
+   * Begins a call, once no other thread is in one. A log handler's call does not wait: its thread is
+   * inside a call already, and two such threads could wait for each other for ever.
+   *
+   * @throws IllegalStateException in a log handler, if this handle is in use
+   */
+  void enter() {
+    if (use.isHeldByCurrentThread()) {
+      throw new IllegalStateException("called by a log handler from inside its own call");
+    }
+    if (!EngineLog.isHandling()) {
+      use.lock();
+    } else if (!use.tryLock()) {
+      throw new IllegalStateException("in use by another thread, for which no log handler waits");
+    }
+  }
+
+  /** Ends a call. */
+  void leave() {
+    use.unlock();
+  }
+
+  /** The address; to be called, and used, between enter and leave. */
   long address() {
     if (address == 0) throw new IllegalStateException("used after close");
     return address;
   }
 
-  /** Releases the address; does nothing if that has happened. */
-  synchronized void close() {
+  /**
+   * Releases the address; does nothing if that has happened.
+   *
+   * @throws IllegalStateException in a log handler, if this handle is in use
+   */
+  void close() {
+    enter();
+    try {
+      release();
+    } finally {
+      leave();
+    }
+  }
+
+  private void release() {
     if (address == 0) return;
     release.release(address);
     address = 0;

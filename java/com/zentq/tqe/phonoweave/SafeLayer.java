@@ -25,6 +25,12 @@ final class SafeLayer {
     }
   }
 
+  /** What a native returned, which throws if it refused. */
+  static int check(int result) {
+    if (result < 0) throw new IllegalStateException("the engine refused the call");
+    return result;
+  }
+
   /**
    * 0 if memory runs out or a setting is refused. The settings are rate, input gain, content type,
    * hangover, paddings before and after, method, least speech and lead-in.
