@@ -1,10 +1,12 @@
 package com.zentq.tqe.phonoweave;
 
-import java.io.File;
-import java.io.FileOutputStream;
 import java.io.IOException;
 import java.io.InputStream;
 import java.io.OutputStream;
+import java.nio.file.Files;
+import java.nio.file.Path;
+import java.nio.file.attribute.FileAttribute;
+import java.nio.file.attribute.PosixFilePermissions;
 import java.util.Locale;
 
 /** Loads libOrvalis.so once: from java.library.path, or else from this jar's own resources. */
@@ -28,13 +30,14 @@ final class NativeLibrary {
     String resource = "/META-INF/native/" + platform + "/libOrvalis.so";
     try (InputStream library = NativeLibrary.class.getResourceAsStream(resource)) {
       if (library == null) throw unavailable("this jar has none for " + platform, notInPath);
-      File copy = File.createTempFile("libOrvalis", ".so");
+      Path copy = createCopy();
       try {
         write(library, copy);
-        System.load(copy.getPath());
+        System.load(copy.toString());
       } finally {
         // A library that is loaded needs its name no longer.
-        if (!copy.delete()) copy.deleteOnExit();
+        delete(copy);
+        delete(copy.getParent());
       }
     } catch (IOException error) {
       throw unavailable("the jar's own could not be unpacked: " + error, notInPath);
@@ -64,11 +67,25 @@ final class NativeLibrary {
     return system + "-" + (processor.equals("amd64") ? "x86_64" : processor);
   }
 
-  private static void write(InputStream from, File to) throws IOException {
-    try (OutputStream out = new FileOutputStream(to)) {
-      byte[] piece = new byte[1 << 16];
-      for (int count = from.read(piece); count > 0; count = from.read(piece)) {
-        out.write(piece, 0, count);
+  /** An empty file in a folder of its own: from the beginning, no other user can read or replace it. */
+  static Path createCopy() throws IOException {
+    Path folder = Files.createTempDirectory("libOrvalis", only("rwx------"));
+    return Files.createFile(folder.resolve("libOrvalis.so"), only("rw-------"));
+  }
+
+  private static FileAttribute<?> only(String owner) {
+    return PosixFilePermissions.asFileAttribute(PosixFilePermissions.fromString(owner));
+  }
+
+  private static void delete(Path path) {
+    if (!path.toFile().delete()) path.toFile().deleteOnExit();
+  }
+
+  private static void write(InputStream from, Path to) throws IOException {
+    try (OutputStream out = Files.newOutputStream(to)) {
+      byte[] chunk = new byte[1 << 16];
+      for (int count = from.read(chunk); count > 0; count = from.read(chunk)) {
+        out.write(chunk, 0, count);
       }
     }
   }
