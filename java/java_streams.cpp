@@ -1,5 +1,5 @@
-// The natives behind the safe Java classes: both streams, and log lines on their way to Java.
-// Registered when the library is loaded, so that no name of them is exported.
+// The natives of SafeLayer: both streams, and the sink that passes log lines to Java. They are
+// registered when the library is loaded, so that their names are not exported.
 #include <jni.h>
 
 #include <algorithm>
@@ -19,21 +19,21 @@ UtteranceStream *stream_of(jlong handle) {
   return reinterpret_cast<UtteranceStream *>(static_cast<intptr_t>(handle));
 }
 
-/// 0 if memory runs out or a setting is refused. The settings come in the order of the record.
+/// 0 if memory runs out or a setting is refused. The values have the order of UtteranceSettings.
 jlong JNICALL open_stream(JNIEnv *env, jclass, jintArray values) {
   UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   int32_t *const fields[] = {&settings.rate_hz,     &settings.input_gain,    &settings.content_type,
                              &settings.hangover_ms, &settings.pad_before_ms, &settings.pad_after_ms,
                              &settings.detector,    &settings.min_speech_ms, &settings.lead_in};
-  jint given[std::size(fields)];
+  jint numbers[std::size(fields)];
   if (values == nullptr || env->GetArrayLength(values) != jint{std::size(fields)}) return 0;
-  env->GetIntArrayRegion(values, 0, jint{std::size(fields)}, given);
-  for (std::size_t i = 0; i < std::size(fields); ++i) *fields[i] = given[i];
+  env->GetIntArrayRegion(values, 0, jint{std::size(fields)}, numbers);
+  for (std::size_t i = 0; i < std::size(fields); ++i) *fields[i] = numbers[i];
   return reinterpret_cast<intptr_t>(OpenUtteranceStream(&settings));
 }
 
-/// Samples that cross from Java at a time.
-constexpr jint kPiece = 1024;
+/// Samples that are copied from Java at a time.
+constexpr jint kMaxChunk = 1024;
 
 bool holds(JNIEnv *env, jshortArray pcm, jint offset, jint count) {
   return pcm != nullptr && offset >= 0 && count >= 0 && offset <= env->GetArrayLength(pcm) - count;
@@ -43,12 +43,12 @@ bool holds(JNIEnv *env, jshortArray pcm, jint offset, jint count) {
 jint JNICALL push_audio(JNIEnv *env, jclass, jlong stream, jshortArray pcm, jint offset,
                         jint count) {
   if (!holds(env, pcm, offset, count)) return -1;
-  jshort piece[kPiece];
+  jshort chunk[kMaxChunk];
   jint done = 0;
   while (done < count) {
-    const jint samples = std::min(count - done, kPiece);
-    env->GetShortArrayRegion(pcm, offset + done, samples, piece);
-    const jint taken = PushUtteranceAudio(stream_of(stream), piece, samples);
+    const jint samples = std::min(count - done, kMaxChunk);
+    env->GetShortArrayRegion(pcm, offset + done, samples, chunk);
+    const jint taken = PushUtteranceAudio(stream_of(stream), chunk, samples);
     if (taken < 0) return -1;
     done += taken;
     if (taken < samples) break;
@@ -56,16 +56,17 @@ jint JNICALL push_audio(JNIEnv *env, jclass, jlong stream, jshortArray pcm, jint
   return done;
 }
 
-/// Stores start, end, began, ended, number and open of the next utterance: 1 if there was one.
+/// Stores start, end, began, ended, number and open of the next utterance. Returns 1 if there was
+/// one.
 jint JNICALL next_utterance(JNIEnv *env, jclass, jlong stream, jlongArray fields) {
   Utterance found;
-  const jint answer = NextUtterance(stream_of(stream), &found);
-  if (answer == 1) {
+  const jint result = NextUtterance(stream_of(stream), &found);
+  if (result == 1) {
     const jlong values[] = {found.start, found.end,    found.began,
                             found.ended, found.number, found.open};
     env->SetLongArrayRegion(fields, 0, std::size(values), values);
   }
-  return answer;
+  return result;
 }
 
 jint JNICALL flush_stream(JNIEnv *, jclass, jlong stream) {
@@ -98,22 +99,22 @@ jint JNICALL enhancement_delay(JNIEnv *, jclass, jlong stream) {
 jint JNICALL enhance(JNIEnv *env, jclass, jlong stream, jshortArray pcm, jint offset, jint count,
                      jshortArray output) {
   if (!holds(env, pcm, offset, count)) return -1;
-  jshort in[kPiece], out[kPiece + ENHANCEMENT_HELD_BACK];
+  jshort in[kMaxChunk], out[kMaxChunk + ENHANCEMENT_HELD_BACK];
   jint done = 0, ready = 0;
   do {
-    const jint samples = std::min(count - done, kPiece);
+    const jint samples = std::min(count - done, kMaxChunk);
     env->GetShortArrayRegion(pcm, offset + done, samples, in);
-    const jint given =
+    const jint written =
         PushEnhancementAudio(enhancement_of(stream), in, samples, out, std::size(out));
-    if (given < 0) return -1;
-    env->SetShortArrayRegion(output, ready, given, out);
+    if (written < 0) return -1;
+    env->SetShortArrayRegion(output, ready, written, out);
     done += samples;
-    ready += given;
+    ready += written;
   } while (done < count);
   return ready;
 }
 
-/// How many samples of output were left; -1 if half a pair waits.
+/// How many samples of output were left; -1 if the last pair of samples is incomplete.
 jint JNICALL flush_enhancement(JNIEnv *env, jclass, jlong stream, jshortArray output) {
   jshort out[ENHANCEMENT_HELD_BACK];
   const jint ready = FlushEnhancementStream(enhancement_of(stream), out, std::size(out));
@@ -131,17 +132,17 @@ jint JNICALL close_enhancement(JNIEnv *, jclass, jlong stream) {
   return CloseEnhancementStream(enhancement_of(stream));
 }
 
-// Where lines go that are meant for Java. Set before the first of them, and then kept.
+// What send_line_to_java calls. Set before the first line, and never changed.
 constinit std::atomic<JavaVM *> java_machine = nullptr;
 constinit std::atomic<jclass> java_receiver = nullptr;
 constinit std::atomic<jmethodID> java_receive = nullptr;
 
-/// Lines of threads that Java does not know are left out.
+/// Lines of threads that Java does not know are dropped.
 void send_line_to_java(int priority, const char *, const char *text, void *) {
   void *found = nullptr;
   if (java_machine.load()->GetEnv(&found, kJniVersion) != JNI_OK) return;
   auto *env = static_cast<JNIEnv *>(found);
-  // A line may tell of a failure whose exception is pending; it is still to be seen afterwards.
+  // The line may report a failure whose exception is pending: keep it for the caller.
   const jthrowable pending = env->ExceptionOccurred();
   env->ExceptionClear();
   if (const jstring line = env->NewStringUTF(text)) {
@@ -157,7 +158,7 @@ void send_line_to_java(int priority, const char *, const char *text, void *) {
 
 void drop_line(int, const char *, const char *, void *) {}
 
-/// Whether lines can be sent to `receiver`, a class with a static method line(int, String).
+/// Prepares `receiver`, a class with a static method line(int, String), for log lines.
 bool can_send_to(JNIEnv *env, jclass receiver) {
   if (java_receiver.load() != nullptr) return true;
   JavaVM *machine = nullptr;
@@ -170,7 +171,7 @@ bool can_send_to(JNIEnv *env, jclass receiver) {
   return java_receiver.load() != nullptr;
 }
 
-/// 0: standard error, 1: nowhere, 2: the receiver. The caller takes care that calls do not overlap.
+/// 0: standard error, 1: nowhere, 2: the receiver. Calls must not overlap.
 void JNICALL set_log_destination(JNIEnv *env, jclass receiver, jint destination) {
   if (destination == 0) {
     SetLogSink(nullptr, nullptr);
@@ -181,7 +182,7 @@ void JNICALL set_log_destination(JNIEnv *env, jclass receiver, jint destination)
   }
 }
 
-/// JNI's record has no room for constants.
+/// JNINativeMethod takes no pointers to constants.
 JNINativeMethod native(const char *name, const char *signature, void *function) {
   return {const_cast<char *>(name), const_cast<char *>(signature), function};
 }
@@ -211,8 +212,7 @@ extern "C" JNIEXPORT jint JNICALL JNI_OnLoad(JavaVM *machine, void *) {
       native("closeEnhancement", "(J)I", address(close_enhancement)),
       native("setLogDestination", "(I)V", address(set_log_destination)),
   };
-  // An application that brings a Loquent of its own, without the safe classes, is served all the
-  // same.
+  // Without the safe classes, which a shrinker may have removed, Loquent works all the same.
   const jclass safe_layer = env->FindClass("com/zentq/tqe/phonoweave/SafeLayer");
   if (safe_layer == nullptr ||
       env->RegisterNatives(safe_layer, natives, std::size(natives)) != JNI_OK)

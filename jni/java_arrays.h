@@ -1,5 +1,5 @@
-// How samples cross from Java and back: the one place that judges arrays and counts, and the one
-// that copies.
+// How samples get from Java to the engine and back: arrays and counts are checked here, and samples
+// copied.
 #pragma once
 
 #include <jni.h>
@@ -15,14 +15,14 @@ namespace orvalis {
 
 /// What a caller's array and count allow.
 enum class Access {
-  kSamples,  ///< there are samples to work on
-  kNothing,  ///< the count asks for none: no array is touched
-  kRefused,  ///< the count asks for more than there is
+  kSamples,  ///< there are samples to process
+  kNothing,  ///< the count is 0 or less: no array is touched
+  kRefused,  ///< the count is larger than the array
 };
 
-/// Judges an array and the count of its elements that a method is to use. Whatever a correct caller
-/// never does costs one log line.
-inline Access judge(JNIEnv *env, const char *method, jarray array, jint count) {
+/// Checks the array and count that a method was given. What a correct caller never does is logged
+/// in one line.
+inline Access check(JNIEnv *env, const char *method, jarray array, jint count) {
   const jint length = array == nullptr ? 0 : env->GetArrayLength(array);
   if (array == nullptr || count < 0 || count > length) {
     log_line(kLogError, kLogTag, "TQE: %s: %d samples asked of an array of %d", method,
@@ -32,25 +32,26 @@ inline Access judge(JNIEnv *env, const char *method, jarray array, jint count) {
   return count > length ? Access::kRefused : Access::kSamples;
 }
 
-inline jshort *take_elements(JNIEnv *env, jshortArray array) {
+inline jshort *get_elements(JNIEnv *env, jshortArray array) {
   return env->GetShortArrayElements(array, nullptr);
 }
-inline jint *take_elements(JNIEnv *env, jintArray array) {
+inline jint *get_elements(JNIEnv *env, jintArray array) {
   return env->GetIntArrayElements(array, nullptr);
 }
-inline void give_back(JNIEnv *env, jshortArray array, jshort *elements) {
+inline void release_elements(JNIEnv *env, jshortArray array, jshort *elements) {
   env->ReleaseShortArrayElements(array, elements, 0);
 }
-inline void give_back(JNIEnv *env, jintArray array, jint *elements) {
+inline void release_elements(JNIEnv *env, jintArray array, jint *elements) {
   env->ReleaseIntArrayElements(array, elements, 0);
 }
 
-/// The elements of an array from taking to release, which writes them back.
+/// The elements of an array. The Java machine copies the whole array to get them, and back to
+/// release them.
 template <class Array>
 class Elements {
 public:
   Elements(JNIEnv *env, Array array)
-      : env_(env), array_(array), elements_(take_elements(env, array)) {
+      : env_(env), array_(array), elements_(get_elements(env, array)) {
     // The caller learns of it from the result, not from an exception.
     if (elements_ == nullptr) env->ExceptionClear();
   }
@@ -61,24 +62,24 @@ public:
   auto *data() const { return elements_; }
 
   void release() {
-    if (elements_ != nullptr) give_back(env_, array_, elements_);
+    if (elements_ != nullptr) release_elements(env_, array_, elements_);
     elements_ = nullptr;
   }
 
 private:
   JNIEnv *env_;
   Array array_;
-  decltype(take_elements(nullptr, Array{})) elements_;
+  decltype(get_elements(nullptr, Array{})) elements_;
 };
 
-/// A working copy of samples, followed by zeros as far as the engine may reach: small ones on the
-/// stack, larger ones on the heap.
+/// A working copy of samples, followed by zeros as far as the engine may read: a small one on the
+/// stack, a large one on the heap.
 class WorkingCopy {
 public:
   WorkingCopy(std::size_t count, std::size_t room)
       : count_(count),
-        data_(room <= kMostOnStack ? on_stack_
-                                   : static_cast<int16_t *>(std::calloc(room, sizeof(int16_t)))) {
+        data_(room <= kMaxOnStack ? on_stack_
+                                  : static_cast<int16_t *>(std::calloc(room, sizeof(int16_t)))) {
     if (data_ == on_stack_) std::memset(on_stack_ + count, 0, (room - count) * sizeof(int16_t));
   }
   ~WorkingCopy() {
@@ -94,14 +95,14 @@ public:
   void store_to(jshort *samples) const { std::memcpy(samples, data_, count_ * sizeof *data_); }
 
 private:
-  static constexpr std::size_t kMostOnStack = 1024;
+  static constexpr std::size_t kMaxOnStack = 1024;
 
   std::size_t count_;
   int16_t *data_;
-  int16_t on_stack_[kMostOnStack];
+  int16_t on_stack_[kMaxOnStack];
 };
 
-/// Logs that memory ran out, and returns what a method answers then.
+/// Logs that memory ran out, and returns the methods' result for that.
 inline jint out_of_memory(const char *method) {
   log_line(kLogError, kLogTag, "TQE: %s: out of memory", method);
   return -1;

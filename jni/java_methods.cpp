@@ -1,5 +1,5 @@
-// The native methods of com.zentq.tqe.phonoweave.Loquent: each judges its arrays, works on a copy,
-// and makes one call of the flat C interface. Handles are the caller's word.
+// The native methods of com.zentq.tqe.phonoweave.Loquent: each checks its arrays, copies their
+// samples and makes one call of the flat C interface. Handles are not checked, as in C.
 #include <jni.h>
 
 #include "Voice_Engine/epd/queries.h"
@@ -9,8 +9,8 @@
 namespace {
 
 using orvalis::Access;
+using orvalis::check;
 using orvalis::Elements;
-using orvalis::judge;
 using orvalis::out_of_memory;
 using orvalis::WorkingCopy;
 
@@ -21,12 +21,12 @@ Instance *instance_of(jlong handle) {
 
 jlong handle_of(const void *instance) { return reinterpret_cast<intptr_t>(instance); }
 
-/// Samples that frame calls may reach for `count` given ones: whole frames of any length, and the
-/// 160 samples of the suppressor from the beginning of the last one.
+/// Samples that frame calls may read for a count above 0: whole frames of any length, and the 160
+/// samples that the suppressor reads from the beginning of the last one.
 std::size_t room_for_frames(jint count) {
-  constexpr std::size_t kLongestFrame = 320;
-  const auto frames = (static_cast<std::size_t>(count) + kLongestFrame - 1) / kLongestFrame;
-  return frames * kLongestFrame + 160;
+  constexpr std::size_t kMaxFrame = 320;
+  const auto frames = (static_cast<std::size_t>(count) + kMaxFrame - 1) / kMaxFrame;
+  return frames * kMaxFrame + 160;
 }
 
 /// The same for blocks of 20 ms.
@@ -38,31 +38,42 @@ std::size_t room_for_blocks(jint count, jint rate_hz) {
   return (samples + length - 1) / length * length;
 }
 
-/// What becomes of the copy once the engine has worked on it.
-enum class Result { kDropped, kWrittenBack };
+/// The samples that a method was given.
+struct Samples {
+  JNIEnv *env;
+  const char *method;
+  jshortArray pcm;
+  jint count;
+};
 
-/// Makes the one call of the flat interface: on a copy of the samples, or on none where the count
-/// asks for none. `room` tells how many samples the engine may reach for a good count.
-template <class Room, class Call>
-jint on_copy(JNIEnv *env, const char *method, jshortArray pcm, jint count, Result result, Room room,
-             Call call) {
-  const Access access = judge(env, method, pcm, count);
+/// Whether the caller's array gets the processed samples.
+enum class Mode { kReadOnly, kInPlace };
+
+/// Makes the one call of the flat interface: on a copy of the samples, or on null if the count is 0
+/// or less. Otherwise the engine may read `room` samples.
+template <class Call>
+jint on_copy(const Samples &samples, std::size_t room, Mode mode, Call call) {
+  const auto [env, method, pcm, count] = samples;
+  const Access access = check(env, method, pcm, count);
   if (access == Access::kRefused) return -1;
   if (access == Access::kNothing) return call(nullptr);
 
-  WorkingCopy copy(static_cast<std::size_t>(count), room(count));
+  WorkingCopy copy(static_cast<std::size_t>(count), room);
   if (copy.data() == nullptr) return out_of_memory(method);
   Elements<jshortArray> elements(env, pcm);
   if (elements.data() == nullptr) return out_of_memory(method);
   copy.fill_from(elements.data());
-  if (result == Result::kDropped) elements.release();
-  const jint answer = call(copy.data());
-  if (result == Result::kWrittenBack) copy.store_to(elements.data());
-  return answer;
+  if (mode == Mode::kReadOnly) elements.release();
+  const jint result = call(copy.data());
+  if (mode == Mode::kInPlace) copy.store_to(elements.data());
+  return result;
 }
 
-/// The detector itself leaves a partial last frame alone.
-std::size_t room_for_detector(jint count) { return static_cast<std::size_t>(count); }
+/// Detection only reads; it ignores a partial last frame.
+template <class Call>
+jint detect(const Samples &samples, Call call) {
+  return on_copy(samples, static_cast<std::size_t>(samples.count), Mode::kReadOnly, call);
+}
 
 }  // namespace
 
@@ -84,32 +95,28 @@ LOQUENT(jlong, initializeDRC)(JNIEnv *, jobject, jint rate_hz, jint dump_flag) {
 
 LOQUENT(jint, processEPDFrame)
 (JNIEnv *env, jobject, jlong handle, jshortArray pcm, jint count) {
-  return on_copy(env, "processEPDFrame", pcm, count, Result::kDropped, room_for_detector,
-                 [&](const int16_t *samples) {
-                   return ProcessEPDFrame(instance_of<EpdInstance>(handle), samples, count);
-                 });
+  return detect({env, "processEPDFrame", pcm, count}, [&](const int16_t *samples) {
+    return ProcessEPDFrame(instance_of<EpdInstance>(handle), samples, count);
+  });
 }
 
 LOQUENT(jint, ProcessEPDFrameByCnttype)
 (JNIEnv *env, jobject, jlong handle, jshortArray pcm, jint count, jint content_type) {
-  return on_copy(env, "ProcessEPDFrameByCnttype", pcm, count, Result::kDropped, room_for_detector,
-                 [&](const int16_t *samples) {
-                   return ProcessEPDFrameByCnttype(instance_of<EpdInstance>(handle), samples, count,
-                                                   content_type);
-                 });
+  return detect({env, "ProcessEPDFrameByCnttype", pcm, count}, [&](const int16_t *samples) {
+    return ProcessEPDFrameByCnttype(instance_of<EpdInstance>(handle), samples, count, content_type);
+  });
 }
 
 LOQUENT(jint, processDRC)(JNIEnv *env, jobject, jlong handle, jshortArray pcm, jint count) {
-  return on_copy(env, "processDRC", pcm, count, Result::kWrittenBack, room_for_frames,
+  return on_copy({env, "processDRC", pcm, count}, room_for_frames(count), Mode::kInPlace,
                  [&](int16_t *samples) { return ProcessDRC(handle, samples, count); });
 }
 
 LOQUENT(jint, computeEnergyFrame)
 (JNIEnv *env, jobject, jshortArray pcm, jint count, jint rate_hz) {
-  return on_copy(
-      env, "computeEnergyFrame", pcm, count, Result::kDropped,
-      [&](jint samples) { return room_for_blocks(samples, rate_hz); },
-      [&](const int16_t *samples) { return ComputeEnergy(samples, count, rate_hz); });
+  return on_copy({env, "computeEnergyFrame", pcm, count}, room_for_blocks(count, rate_hz),
+                 Mode::kReadOnly,
+                 [&](const int16_t *samples) { return ComputeEnergy(samples, count, rate_hz); });
 }
 
 LOQUENT(jint, processDoNSFrame)
@@ -117,9 +124,9 @@ LOQUENT(jint, processDoNSFrame)
  jint out_count) {
   constexpr char kMethod[] = "processDoNSFrame";
   auto *ns = instance_of<NsInstance>(handle);
-  Access access = judge(env, kMethod, in, in_count);
-  // The output is worked on as far as the input goes.
-  if (access == Access::kSamples) access = judge(env, kMethod, out, in_count);
+  Access access = check(env, kMethod, in, in_count);
+  // As many samples of the output are used as of the input.
+  if (access == Access::kSamples) access = check(env, kMethod, out, in_count);
   if (access == Access::kRefused) return -1;
   if (access == Access::kNothing)
     return ProcessDoNSFrame(ns, nullptr, in_count, nullptr, out_count);
@@ -135,9 +142,9 @@ LOQUENT(jint, processDoNSFrame)
   in_copy.fill_from(in_elements.data());
   out_copy.fill_from(out_elements.data());
   in_elements.release();  // before the output's, which has to stay if both are one array
-  const jint answer = ProcessDoNSFrame(ns, in_copy.data(), in_count, out_copy.data(), out_count);
+  const jint result = ProcessDoNSFrame(ns, in_copy.data(), in_count, out_copy.data(), out_count);
   out_copy.store_to(out_elements.data());
-  return answer;
+  return result;
 }
 
 LOQUENT(jint, getSpectrum)
@@ -145,8 +152,8 @@ LOQUENT(jint, getSpectrum)
   constexpr char kMethod[] = "getSpectrum";
   constexpr jint kSamples = ORVALIS_FRAME_16K;
   constexpr jint kBins = ORVALIS_BINS_16K;
-  if (judge(env, kMethod, pcm, kSamples) != Access::kSamples ||
-      judge(env, kMethod, spectrum, kBins) != Access::kSamples)
+  if (check(env, kMethod, pcm, kSamples) != Access::kSamples ||
+      check(env, kMethod, spectrum, kBins) != Access::kSamples)
     return 0;
 
   Elements<jshortArray> samples(env, pcm);
@@ -160,9 +167,9 @@ LOQUENT(jint, getSpectrum)
   std::memcpy(frame, samples.data(), sizeof frame);
   std::memcpy(power, bins.data(), sizeof power);
   samples.release();
-  const jint answer = getSpectrum(frame, power, rate_hz);
+  const jint result = getSpectrum(frame, power, rate_hz);
   std::memcpy(bins.data(), power, sizeof power);
-  return answer;
+  return result;
 }
 
 LOQUENT(jint, resetEPDparams)(JNIEnv *, jobject, jlong handle) {

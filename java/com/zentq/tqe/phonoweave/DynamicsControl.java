@@ -1,12 +1,13 @@
 package com.zentq.tqe.phonoweave;
 
 /**
- * Levels recorded speech of 16 kHz that comes in pieces of any length: +12 dB for frames that peak
- * below -18 dBFS, 3:1 compression above, 0 dB at full scale. The output, taken together, does not
- * depend on how the audio was cut; it is as long as the input and not late.
+ * Evens out the level of speech at 16 kHz, in chunks of any size: +12 dB for frames that peak below
+ * -18 dBFS, 3:1 compression above, 0 dB at full scale. The output as a whole does not depend on the
+ * chunk sizes. It is as long as the input and not delayed.
  *
- * <p><b>Threads.</b> Any thread may call; calls on one instance wait for each other. An instance that
- * is forgotten rather than closed is released when another one is made.
+ * <p><b>Threads.</b> Any thread may call; calls on one instance wait for each other, but not in a
+ * log handler (see {@link EngineLog#toLogger}). An instance that is not closed is released after it
+ * was collected as garbage, when another object is created.
  */
 public final class DynamicsControl implements AutoCloseable {
   private final EnhancementStream stream = new EnhancementStream(this, 1, 0, true, true);
@@ -24,18 +25,18 @@ public final class DynamicsControl implements AutoCloseable {
   }
 
   /**
-   * Takes samples and returns those of the output that they complete: none or any number of whole
-   * frames. The array is not changed.
+   * Processes samples and returns the output that is ready: any number of whole frames, or none.
+   * The array is not changed.
    *
-   * @throws IllegalArgumentException if the samples are not all in the array
-   * @throws IllegalStateException after the flush or after close
+   * @throws IllegalArgumentException if the range is not within the array
+   * @throws IllegalStateException after flush or close
    */
   public short[] push(short[] pcm, int offset, int count) {
     return stream.push(pcm, offset, count);
   }
 
   /**
-   * Ends the audio and returns the rest of the output; nothing when called again.
+   * Ends the audio and returns the rest of the output; an empty array when called again.
    *
    * @throws IllegalStateException after close
    */
@@ -44,8 +45,8 @@ public final class DynamicsControl implements AutoCloseable {
   }
 
   /**
-   * Whether the audio was loud when the last whole frame came in: more than 100 samples of the last
-   * ten frames, the newest counted twice, beyond a quarter of full scale.
+   * Whether the audio was loud at the last whole frame: more than 100 samples of the last ten
+   * frames, of which the newest counts twice, were beyond a quarter of full scale.
    */
   public boolean isLoud() {
     return stream.isLoud();

@@ -4,31 +4,31 @@ import java.util.ArrayList;
 import java.util.List;
 
 /**
- * Finds utterances in audio that comes in pieces of any length. No result depends on how the audio
- * was cut.
+ * Finds utterances in audio, in chunks of any size. The results do not depend on the chunk sizes.
  *
  * <pre>{@code
  * try (EndPointDetector detector = EndPointDetector.at(16000).hangoverMillis(800).open()) {
- *   for (short[] piece = read(); piece != null; piece = read()) {
- *     detector.push(piece).forEach(System.out::println);
+ *   for (short[] chunk = read(); chunk != null; chunk = read()) {
+ *     detector.push(chunk).forEach(System.out::println);
  *   }
  *   detector.flush().forEach(System.out::println);
  * }
  * }</pre>
  *
- * <p><b>Threads.</b> Any thread may call; calls on one detector wait for each other. A detector that
- * is forgotten rather than closed is released when another one is made.
+ * <p><b>Threads.</b> Any thread may call; calls on one detector wait for each other, but not in a
+ * log handler (see {@link EngineLog#toLogger}). A detector that is not closed is released after it
+ * was collected as garbage, when another object is created.
  */
 public final class EndPointDetector implements AutoCloseable {
-  /** Which decisions on frames the utterances are made of. */
+  /** The detector that decides for each frame whether it is speech. */
   public enum Method {
     /** The detector of {@link Loquent}, which confirms speech over several frames. */
     CHANNEL_ENERGY,
-    /** Follows the noise in every bin of the spectrum and decides each frame at once. */
+    /** Tracks the noise in every bin of the spectrum and decides each frame by itself. */
     MCRA
   }
 
-  /** Settings of a detector. Times are milliseconds from 0 on. */
+  /** Settings of a detector. Times are in milliseconds, 0 or more. */
   public static final class Settings {
     private final int rateHz;
     private int inputGain;
@@ -47,7 +47,7 @@ public final class EndPointDetector implements AutoCloseable {
       this.rateHz = rateHz;
     }
 
-    /** 0 takes the input as it is, 1 divides it by 4, 2 multiplies it by 4 (wrapping around). */
+    /** 0 leaves the input as it is, 1 divides it by 4, 2 multiplies it by 4 (wrapping around). */
     public Settings inputGain(int code) {
       if (code < 0 || code > 2) {
         throw new IllegalArgumentException("the input gain is 0, 1 or 2, not " + code);
@@ -56,19 +56,19 @@ public final class EndPointDetector implements AutoCloseable {
       return this;
     }
 
-    /** Timing: 0 and 1 are patient; 2 and more are quicker and refuse short sounds. */
+    /** Timing: 0 and 1 are slower; 2 and more are faster and ignore short sounds. */
     public Settings contentType(int type) {
       contentType = type;
       return this;
     }
 
-    /** Longest silence that joins what is before and after it; 500 unless set. */
+    /** Longest silence within an utterance; 500 unless set. */
     public Settings hangoverMillis(int millis) {
       hangoverMillis = checkTime(millis);
       return this;
     }
 
-    /** Time to add before an utterance; 150 unless set. Padding never crosses a neighbour. */
+    /** Time to add before an utterance; 150 unless set. Padded utterances never overlap. */
     public Settings padBeforeMillis(int millis) {
       padBeforeMillis = checkTime(millis);
       return this;
@@ -87,15 +87,15 @@ public final class EndPointDetector implements AutoCloseable {
       return this;
     }
 
-    /** What holds less speech, without padding, is no utterance; 0 unless set. */
+    /** Shortest utterance to report, measured without padding; 0 unless set. */
     public Settings minSpeechMillis(int millis) {
       minSpeechMillis = checkTime(millis);
       return this;
     }
 
     /**
-     * For recordings, whose first word may come at once: the detector waits for the first 10 s and
-     * learns the noise from their quietest part. Off unless set; live audio does without.
+     * For recordings, which may begin with a word: the detector waits for the first 10 s and learns
+     * the noise from their quietest part. Off unless set; leave it off for live audio.
      */
     public Settings leadIn(boolean wanted) {
       leadIn = wanted;
@@ -105,7 +105,7 @@ public final class EndPointDetector implements AutoCloseable {
     /**
      * Opens a detector.
      *
-     * @throws IllegalArgumentException if a setting does not go with the method
+     * @throws IllegalArgumentException if the method does not support a setting
      * @throws IllegalStateException if memory runs out
      */
     public EndPointDetector open() {
@@ -144,7 +144,7 @@ public final class EndPointDetector implements AutoCloseable {
   }
 
   /**
-   * Settings for audio of a rate, to be changed and opened.
+   * Default settings for audio at a rate; change them, then open the detector.
    *
    * @param rateHz 16000 or 8000
    */
@@ -158,10 +158,10 @@ public final class EndPointDetector implements AutoCloseable {
   }
 
   /**
-   * Hears samples and returns the utterances that they decide. The array is not changed.
+   * Processes samples and returns the utterances whose end is now known. The array is not changed.
    *
-   * @throws IllegalArgumentException if the samples are not all in the array
-   * @throws IllegalStateException after the flush or after close
+   * @throws IllegalArgumentException if the range is not within the array
+   * @throws IllegalStateException after flush or close
    */
   public List<Utterance> push(short[] pcm, int offset, int count) {
     SafeLayer.checkRange(pcm, offset, count);
@@ -182,7 +182,7 @@ public final class EndPointDetector implements AutoCloseable {
   }
 
   /**
-   * Ends the audio and returns the utterances that are left; none when called again.
+   * Ends the audio and returns the remaining utterances; none when called again.
    *
    * @throws IllegalStateException after close
    */
@@ -200,7 +200,7 @@ public final class EndPointDetector implements AutoCloseable {
     }
   }
 
-  /** Releases the detector. Utterances not returned are lost. Does nothing the second time. */
+  /** Releases the detector and drops utterances not yet returned. Does nothing the second time. */
   @Override
   public void close() {
     handle.close();
@@ -208,6 +208,8 @@ public final class EndPointDetector implements AutoCloseable {
 
   private static void collect(long stream, List<Utterance> found) {
     long[] fields = new long[6];
-    while (SafeLayer.check(SafeLayer.nextUtterance(stream, fields)) == 1) found.add(new Utterance(fields));
+    while (SafeLayer.check(SafeLayer.nextUtterance(stream, fields)) == 1) {
+      found.add(new Utterance(fields));
+    }
   }
 }

@@ -19,15 +19,16 @@ public final class EngineLog {
 
   /**
    * Sends lines to a logger: debug lines as {@link Level#FINE}, information as {@link Level#INFO},
-   * errors as {@link Level#SEVERE}. What the logger throws is lost. Lines of threads that Java does
-   * not know are left out.
+   * errors as {@link Level#SEVERE}. What the logger throws is ignored. Lines of threads that Java
+   * does not know are dropped.
    *
-   * <p>The logger's handlers run inside the call that caused the line. From there every call on an
-   * object that is in use, {@code close()} included, throws {@link IllegalStateException}: on the
-   * object whose call this is, and, instead of waiting, on one that another thread uses. Lines that a
-   * handler itself causes are left out. A handler must not wait for another thread's call.
+   * <p>The logger's handlers run during the call that caused the line. Their own calls on an object
+   * in use, {@code close()} included, throw {@link IllegalStateException}: on the object whose call
+   * caused the line, and on one that another thread uses, as handlers do not wait. Lines that a
+   * handler's calls cause are dropped. A handler must not wait for another thread that calls the
+   * engine, nor use or free the {@link Loquent} handle whose call it runs in.
    *
-   * @param logger the receiver
+   * @param logger where the lines go
    */
   public static synchronized void toLogger(Logger logger) {
     if (logger == null) throw new IllegalArgumentException("no logger");
@@ -54,7 +55,7 @@ public final class EngineLog {
   }
 
   static void write(int priority, String text) {
-    if (isHandling()) return; // a handler that makes objects would be called without end
+    if (isHandling()) return; // or a handler that creates objects would never end
     HANDLING.set(true);
     try {
       target.log(priority >= 6 ? Level.SEVERE : priority >= 4 ? Level.INFO : Level.FINE, text);

@@ -2,7 +2,7 @@ package com.zentq.tqe.phonoweave;
 
 import java.util.Arrays;
 
-/** The library's enhancement stream: suppression and dynamics control of audio cut in any way. */
+/** The library's enhancement stream: suppression and dynamics control, in chunks of any size. */
 final class EnhancementStream {
   private final NativeHandle handle;
   private final int microphones;
@@ -10,7 +10,7 @@ final class EnhancementStream {
   private boolean loud;
 
   /**
-   * Opens a stream, which is released when its owner is forgotten.
+   * Opens a stream, which is released some time after its owner was collected.
    *
    * @throws IllegalStateException if memory runs out
    */
@@ -29,13 +29,13 @@ final class EnhancementStream {
     return delay;
   }
 
-  /** The output that these samples complete. */
+  /** The output that is ready after these samples. */
   short[] push(short[] pcm, int offset, int count) {
     handle.enter();
     try {
       long stream = handle.address();
       SafeLayer.checkRange(pcm, offset, count);
-      short[] out = new short[count / microphones + SafeLayer.MOST_BEYOND_A_PUSH];
+      short[] out = new short[count / microphones + SafeLayer.MAX_EXTRA_PER_PUSH];
       int ready = SafeLayer.enhance(stream, pcm, offset, count, out);
       if (ready < 0) throw new IllegalStateException("pushed after the flush");
       loud = SafeLayer.isLoud(stream);
@@ -50,10 +50,10 @@ final class EnhancementStream {
     handle.enter();
     try {
       long stream = handle.address();
-      short[] out = new short[SafeLayer.MOST_OF_A_FLUSH];
+      short[] out = new short[SafeLayer.MAX_PER_FLUSH];
       int ready = SafeLayer.flushEnhancement(stream, out);
       if (ready < 0) {
-        throw new IllegalStateException("the last sample of one channel has no partner");
+        throw new IllegalStateException("the last pair of samples is incomplete");
       }
       loud = SafeLayer.isLoud(stream);
       return Arrays.copyOf(out, ready);

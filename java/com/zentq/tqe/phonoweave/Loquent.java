@@ -1,23 +1,28 @@
 package com.zentq.tqe.phonoweave;
 
 /**
- * The engine's native methods as they are: handles, whole frames, status numbers.
+ * The engine's native methods: handles, whole frames, status numbers.
  *
- * <p>Most callers want {@link EndPointDetector}, {@link NoiseSuppressor} and {@link DynamicsControl}
- * instead, which take audio of any length and guard their handles. The methods here are for callers
- * that cut frames themselves.
+ * <p>Most callers want {@link EndPointDetector}, {@link NoiseSuppressor} and {@link
+ * DynamicsControl} instead, which take chunks of any size and guard their handles. The methods here
+ * are for callers that have whole frames.
  *
  * <p>Audio is signed 16-bit. A frame is 160 samples at 16 kHz or 80 samples at 8 kHz; two
  * microphones are interleaved, 160 pairs a frame. Other rates must be converted first.
  *
  * <p><b>Handles</b> are addresses. 0 is refused by every method, and so is the -1 of a failed
- * {@link #initializeDRC}; any other number that is not a living handle of the right kind is the
- * caller's error and may end the process. <b>Arrays and counts</b> are judged: a null array or a
+ * {@link #initializeDRC}; any other number that is not an open handle of the right kind is the
+ * caller's error and may crash the process. <b>Arrays and counts</b> are checked: a null array or a
  * count above the array's length gives -1 ({@link #getSpectrum}: 0), leaves arrays as they are and
- * logs one error line; a count of 0 or less asks for nothing.
+ * logs one error line; with a count of 0 or less nothing is processed.
+ *
+ * <p><b>Warning:</b> the Java machine may copy a whole array for a call, whatever the count, and
+ * write the whole copy back. So a call on a few samples of a long array is slow, and what another
+ * thread writes to the array meanwhile may be lost, even in arrays that are said not to be changed.
+ * Pass arrays of the count's length that no other thread writes to.
  *
  * <p><b>Threads:</b> different threads may use different instances at the same time, those with two
- * microphones excepted. Calls on one instance must not overlap, and no call may follow its release.
+ * microphones excepted. Calls on one instance must not overlap, and none may follow its release.
  */
 public final class Loquent {
   static {
@@ -33,29 +38,31 @@ public final class Loquent {
    * Creates an end-point detector.
    *
    * <p>The mode is gain * 10000 + rate * 1000 + sub-mode. Gain: 0 leaves the input as it is, 1
-   * divides it by 4, 2 multiplies it by 4, wrapping around beyond 16 bits. Rate: 0 is 16 kHz, 1 is 8
-   * kHz. Sub-mode: 0.
+   * divides it by 4, 2 multiplies it by 4, wrapping around beyond 16 bits. Rate: 0 is 16 kHz, 1 is
+   * 8 kHz. Sub-mode: 0.
    *
    * @param mode 0 for 16 kHz, 1000 for 8 kHz
-   * @param dumpFlag 1 appends what was heard and answered to raw files under /sdcard/VRpreprocess
+   * @param dumpFlag 1 appends input and decisions to raw files under /sdcard/VRpreprocess
    * @return the handle; 0 if memory runs out
    */
   public static native long initializeEPD(int mode, int dumpFlag);
 
   /**
-   * Judges whole frames of 160 (16 kHz) or 80 (8 kHz) samples. The array is not changed.
+   * Decides whether whole frames of 160 (16 kHz) or 80 (8 kHz) samples are speech. The array is not
+   * changed.
    *
-   * <p>Pass one frame at a time, for of several frames the answers are folded into one. Frames with
-   * more than 60 zeros in a row are not judged; the first 39 judged frames are never speech.
+   * <p>Pass one frame at a time, as there is one result for all frames of a call. Frames with more
+   * than 60 zeros in a row are skipped; of the others, the first 39 are never speech.
    *
-   * @return 1 if a frame was answered with speech or the end of speech; 0 if none was, if the count
-   *     is below 1, or if it ends in a partial frame; -1 if the handle is 0 or the array too short
+   * @return 1 if a frame was decided to be speech or the end of speech; 0 if none was, if the count
+   *     is below 1, or if the last frame is partial; -1 if the handle is 0 or the array too short
    */
   public static native int processEPDFrame(long handle, short[] pcm, int count);
 
   /**
-   * The same with a choice of timing: content types 0 and 1 confirm speech by 6 voiced frames and end
-   * it by 25 frames of pause; 2 and more take 4 and 14, and refuse utterances below 20 frames.
+   * The same with a choice of timing: content types 0 and 1 confirm speech after 6 voiced frames
+   * and end it after a pause of 25 frames; 2 and more take 4 and 14, and ignore utterances below 20
+   * frames.
    *
    * @return as {@link #processEPDFrame}
    */
@@ -63,8 +70,8 @@ public final class Loquent {
       long handle, short[] pcm, int count, int contentType);
 
   /**
-   * Forgets the utterance in progress, keeps what was learnt of the noise, and turns hangover log
-   * lines on again.
+   * Resets the utterance in progress but not the noise estimate, and turns the hangover log lines
+   * on again.
    *
    * @return 0; -1 if the handle is 0
    */
@@ -86,24 +93,25 @@ public final class Loquent {
   public static native int freeMemoryEPD(long handle);
 
   /**
-   * Creates a noise suppressor for 16 kHz. All suppressors of two microphones that are made here share
-   * one state: have only one of them, or use {@link NoiseSuppressor}.
+   * Creates a noise suppressor for 16 kHz. All suppressors for two microphones that are created
+   * here share one state: use only one of them, or {@link NoiseSuppressor}.
    *
    * @param mode for one microphone 0 (13 dB) or 2 (18.4 dB); not used for two
    * @param microphones 1: frames of 160 samples, output 48 samples late; 2: frames of 160 pairs,
-   *     output 160 pairs late; any other suppresses nothing
+   *     output 160 pairs late; any other number suppresses nothing
    * @param unused not used
    * @return the handle; 0 if memory runs out
    */
   public static native long initializeDoNS(int mode, int microphones, int unused);
 
   /**
-   * Suppresses the noise of whole frames. The input is not changed; it may be the output's array.
+   * Suppresses the noise of whole frames. Input and output may be the same array; otherwise the
+   * input is not changed.
    *
-   * <p>Frames that are not suppressed leave their part of the output as it is: those with more than
-   * 60 zeros in a row, the first ones until the level has settled, and, with two microphones, very
-   * quiet ones. Fill the output with the delayed input before the call. A partial last frame is
-   * worked on as if zeros followed.
+   * <p>Where a frame is not suppressed, the output stays as it is: frames with more than 60 zeros
+   * in a row, the first ones until the level has settled, and, with two microphones, very quiet
+   * ones. Fill the output with the delayed input before the call. A partial last frame is processed
+   * as if zeros followed.
    *
    * @param inCount samples to take from the input and to store in the output
    * @param outCount the same number
@@ -121,8 +129,8 @@ public final class Loquent {
   public static native int freeMemoryDoNS(long handle);
 
   /**
-   * Creates a dynamics control, which levels recorded speech: +12 dB for frames that peak below -18
-   * dBFS, 3:1 compression above, 0 dB at full scale.
+   * Creates a dynamics control, which evens out the level of speech: +12 dB for frames that peak
+   * below -18 dBFS, 3:1 compression above, 0 dB at full scale.
    *
    * @param rateHz 16000; audio of any other rate is left as it is
    * @param dumpFlag 1 appends the audio before and after to raw files under /sdcard
@@ -131,12 +139,12 @@ public final class Loquent {
   public static native long initializeDRC(int rateHz, int dumpFlag);
 
   /**
-   * Levels whole frames of 160 samples in place. A partial last frame is worked on as if zeros
-   * followed.
+   * Evens out the level of whole frames of 160 samples in place. A partial last frame is processed
+   * as if zeros followed.
    *
-   * @return 1 if the audio was loud: more than 100 samples of the last ten frames, the newest counted
-   *     twice, beyond a quarter of full scale; 0 if it was not, if the count is below 1, or if the
-   *     rate is not 16000; -1 if the handle is 0 or -1 or the array too short
+   * @return 1 if the audio was loud: more than 100 samples of the last ten frames, of which the
+   *     newest counts twice, were beyond a quarter of full scale; 0 if it was not, if the count is
+   *     below 1, or if the rate is not 16000; -1 if the handle is 0 or -1 or the array too short
    */
   public static native int processDRC(long handle, short[] pcm, int count);
 

@@ -12,11 +12,12 @@ import java.util.concurrent.ConcurrentLinkedQueue;
 import java.util.concurrent.locks.ReentrantLock;
 
 /**
- * One engine handle and the mark that it is in use. Every call on the owner enters first and leaves
- * at its end, so that nothing releases the handle during a call: neither a close, on this thread or
- * another, nor the release of handles whose owners were forgotten.
+ * A handle of the library, and whether it is in use. Every call on its owner enters first and
+ * leaves last, so that nothing releases the handle during a call: neither close, on this thread or
+ * another, nor the release of forgotten handles, whose owners were collected without being closed.
  *
- * <p>Forgotten handles are released when the next one is made, so no thread has to wait for them.
+ * <p>Forgotten handles are released when the next one is created, so no thread has to wait for
+ * them.
  */
 final class NativeHandle extends PhantomReference<Object> {
   interface Release {
@@ -29,7 +30,7 @@ final class NativeHandle extends PhantomReference<Object> {
   private static final Set<NativeHandle> LIVING =
       Collections.newSetFromMap(new ConcurrentHashMap<NativeHandle, Boolean>());
 
-  /** Forgotten handles that are not released yet, because their last call was still running. */
+  /** Forgotten handles that are still to be released: their last call may be running. */
   private static final Queue<NativeHandle> PUT_OFF = new ConcurrentLinkedQueue<>();
 
   private final ReentrantLock use = new ReentrantLock();
@@ -37,7 +38,7 @@ final class NativeHandle extends PhantomReference<Object> {
   private long address;
 
   /**
-   * Takes charge of an address.
+   * Takes over an address, which is passed to release at the end.
    *
    * @throws IllegalStateException if it is that of a failed creation
    */
@@ -51,7 +52,7 @@ final class NativeHandle extends PhantomReference<Object> {
     LIVING.add(this);
   }
 
-  /** Releases the handles whose owners were collected without having been closed, but for busy ones. */
+  /** Releases the handles whose owners were collected without being closed; those in use wait. */
   static void releaseForgotten() {
     for (Reference<?> found = FORGOTTEN.poll(); found != null; found = FORGOTTEN.poll()) {
       PUT_OFF.add((NativeHandle) found);
@@ -74,19 +75,19 @@ final class NativeHandle extends PhantomReference<Object> {
   }
 
   /**
-   * Begins a call, once no other thread is in one. A log handler's call does not wait: its thread is
-   * inside a call already, and two such threads could wait for each other for ever.
+   * Begins a call once no other thread is in one. In a log handler it does not wait: the thread is
+   * in a call already, and two such threads could wait for each other forever.
    *
    * @throws IllegalStateException in a log handler, if this handle is in use
    */
   void enter() {
     if (use.isHeldByCurrentThread()) {
-      throw new IllegalStateException("called by a log handler from inside its own call");
+      throw new IllegalStateException("called by a log handler during its own call");
     }
     if (!EngineLog.isHandling()) {
       use.lock();
     } else if (!use.tryLock()) {
-      throw new IllegalStateException("in use by another thread, for which no log handler waits");
+      throw new IllegalStateException("in use by another thread; log handlers do not wait");
     }
   }
 

@@ -67,7 +67,7 @@ final class NativeLibrary {
     return system + "-" + (processor.equals("amd64") ? "x86_64" : processor);
   }
 
-  /** An empty file in a folder of its own: from the beginning, no other user can read or replace it. */
+  /** An empty file in a folder of its own, which no other user can open at any time. */
   static Path createCopy() throws IOException {
     Path folder = Files.createTempDirectory("libOrvalis", only("rwx------"));
     return Files.createFile(folder.resolve("libOrvalis.so"), only("rw-------"));

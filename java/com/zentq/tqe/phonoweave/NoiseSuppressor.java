@@ -1,25 +1,26 @@
 package com.zentq.tqe.phonoweave;
 
 /**
- * Suppresses the noise of 16 kHz audio that comes in pieces of any length. The output, taken
- * together, does not depend on how the audio was cut.
+ * Suppresses the noise of audio at 16 kHz, in chunks of any size. The output as a whole does not
+ * depend on the chunk sizes.
  *
  * <pre>{@code
  * try (NoiseSuppressor suppressor = NoiseSuppressor.forOneMicrophone(NoiseSuppressor.Strength.NORMAL)) {
- *   for (short[] piece = read(); piece != null; piece = read()) {
- *     write(suppressor.push(piece));
+ *   for (short[] chunk = read(); chunk != null; chunk = read()) {
+ *     write(suppressor.push(chunk));
  *   }
  *   write(suppressor.flush());
  * }
  * }</pre>
  *
- * <p><b>Delay.</b> The output begins with {@link #delaySamples} samples that come before the input,
- * and the flush gives the last ones: of N samples pushed, all in all N + {@code delaySamples()} come
- * out. Audio that the engine does not suppress (null audio, the first frames until the level has
- * settled, very quiet frames of two microphones) comes out as it is, with the same delay.
+ * <p><b>Delay.</b> The output begins with {@link #delaySamples} samples from before the input, and
+ * {@link #flush} returns the last ones: N input samples give N + {@code delaySamples()} output
+ * samples in all. Audio that the engine does not suppress (null audio, the first frames until the
+ * level has settled, very quiet frames of two microphones) is passed through with the same delay.
  *
- * <p><b>Threads.</b> Any thread may call; calls on one suppressor wait for each other. A suppressor
- * that is forgotten rather than closed is released when another one is made.
+ * <p><b>Threads.</b> Any thread may call; calls on one suppressor wait for each other, but not in a
+ * log handler (see {@link EngineLog#toLogger}). A suppressor that is not closed is released after
+ * it was collected as garbage, when another object is created.
  */
 public final class NoiseSuppressor implements AutoCloseable {
   /** How much one microphone's noise is lowered. */
@@ -55,8 +56,8 @@ public final class NoiseSuppressor implements AutoCloseable {
   }
 
   /**
-   * A suppressor for two microphones, whose samples are interleaved. Both channels of its output are
-   * the same: the first one, cleaned.
+   * A suppressor for two microphones, whose samples are interleaved. Both channels of its output
+   * are the same: the first microphone without the noise.
    *
    * @throws IllegalStateException if memory runs out
    */
@@ -64,7 +65,7 @@ public final class NoiseSuppressor implements AutoCloseable {
     return new NoiseSuppressor(2, Strength.NORMAL.db);
   }
 
-  /** By how many samples the output is late: 48, or 320 (160 pairs) with two microphones. */
+  /** Delay of the output in samples: 48, or 320 (160 pairs) with two microphones. */
   public int delaySamples() {
     return microphones * stream.delay();
   }
@@ -75,20 +76,20 @@ public final class NoiseSuppressor implements AutoCloseable {
   }
 
   /**
-   * Takes samples and returns those of the output that they complete: none or any number of whole
-   * frames. The array is not changed.
+   * Processes samples and returns the output that is ready: any number of whole frames, or none.
+   * The array is not changed.
    *
-   * @throws IllegalArgumentException if the samples are not all in the array
-   * @throws IllegalStateException after the flush or after close
+   * @throws IllegalArgumentException if the range is not within the array
+   * @throws IllegalStateException after flush or close
    */
   public short[] push(short[] pcm, int offset, int count) {
     return toChannels(stream.push(pcm, offset, count));
   }
 
   /**
-   * Ends the audio and returns the rest of the output; nothing when called again.
+   * Ends the audio and returns the rest of the output; an empty array when called again.
    *
-   * @throws IllegalStateException after close, or if half a pair of samples is left
+   * @throws IllegalStateException after close, or if the last pair of samples is incomplete
    */
   public short[] flush() {
     return toChannels(stream.flush());

@@ -1,22 +1,23 @@
 package com.zentq.tqe.phonoweave;
 
 /**
- * The natives behind the safe classes. The library registers them by this class's name when it is
- * loaded, so the class must not cause that itself: whoever calls makes sure first.
+ * The natives of the safe classes. The library looks this class up and registers them when it is
+ * loaded, so the class must not load it: callers call {@link NativeLibrary#load} first.
  */
 final class SafeLayer {
   static final int LOG_TO_STANDARD_ERROR = 0;
   static final int LOG_OFF = 1;
   static final int LOG_TO_JAVA = 2;
 
-  /** Room that the output of a push may need beyond its input. */
-  static final int MOST_BEYOND_A_PUSH = 160;
+  /** How many more samples a push may return than it was given. */
+  static final int MAX_EXTRA_PER_PUSH = 160;
 
-  static final int MOST_OF_A_FLUSH = 319;
+  /** How many samples a flush may return. */
+  static final int MAX_PER_FLUSH = 319;
 
   private SafeLayer() {}
 
-  /** Throws if the samples are not all in the array. */
+  /** Throws if the range is not within the array. */
   static void checkRange(short[] pcm, int offset, int count) {
     if (pcm == null) throw new IllegalArgumentException("no samples");
     if (offset < 0 || count < 0 || offset > pcm.length - count) {
@@ -33,11 +34,11 @@ final class SafeLayer {
 
   /**
    * 0 if memory runs out or a setting is refused. The settings are rate, input gain, content type,
-   * hangover, paddings before and after, method, least speech and lead-in.
+   * hangover, padding before and after, method, min speech and lead-in.
    */
   static native long openStream(int[] settings);
 
-  /** How many samples were taken: fewer when utterances have to be fetched first. */
+  /** How many samples were taken: not all if utterances have to be fetched first. */
   static native int pushAudio(long stream, short[] pcm, int offset, int count);
 
   /** Stores start, end, began, ended, number and open; 1 if there was an utterance. */
@@ -47,7 +48,7 @@ final class SafeLayer {
 
   static native int closeStream(long stream);
 
-  /** 0 if memory runs out or a setting is out of range. */
+  /** 0 if memory runs out or a setting is refused. */
   static native long openEnhancement(
       int microphones, int suppressionDb, boolean level, boolean aligned);
 
@@ -56,7 +57,7 @@ final class SafeLayer {
   /** How many samples of output there were; -1 after the flush. */
   static native int enhance(long stream, short[] pcm, int offset, int count, short[] out);
 
-  /** How many samples of output were left; -1 if half a pair waits. */
+  /** How many samples of output were left; -1 if the last pair of samples is incomplete. */
   static native int flushEnhancement(long stream, short[] out);
 
   static native boolean isLoud(long stream);
@@ -65,7 +66,7 @@ final class SafeLayer {
 
   static native void setLogDestination(int destination);
 
-  /** The engine calls this, on the thread that caused the line. */
+  /** Called by the library, on the thread that caused the line. */
   @SuppressWarnings("unused")
   private static void line(int priority, String text) {
     EngineLog.write(priority, text);

@@ -1,6 +1,6 @@
 package com.zentq.tqe.phonoweave;
 
-/** A stretch of speech. Times are counts of samples since the detector was opened. */
+/** A stretch of speech. Times are in samples since the detector was opened. */
 public final class Utterance {
   /** First sample. */
   public final long start;
@@ -8,16 +8,16 @@ public final class Utterance {
   /** One past the last sample. */
   public final long end;
 
-  /** Samples heard when the detector first answered "speech". */
+  /** Samples processed when the detector first decided for speech. */
   public final long began;
 
-  /** Samples heard when it last did. */
+  /** Samples processed when it last did. */
   public final long ended;
 
   /** 1, 2, 3 and so on. */
   public final int number;
 
-  /** Whether there was still speech when the audio ended. */
+  /** Whether the audio ended during the utterance. */
   public final boolean open;
 
   Utterance(long[] fields) {
