@@ -283,6 +283,21 @@ class SafeClassesTest {
       new DynamicsControl().close();
     }
     assertEquals(0, NativeHandle.living());
+
+    NativeHandle inUse = new NativeHandle(new Object(), 1, address -> {});
+    inUse.enter();
+    while (!inUse.refersTo(null)) System.gc();
+    for (int tries = 0; tries < 20; ++tries) {
+      Thread.sleep(10);
+      NativeHandle.releaseForgotten();
+      Thread other = new Thread(NativeHandle::releaseForgotten);
+      other.start();
+      other.join();
+    }
+    assertEquals(1, NativeHandle.living());
+    inUse.leave();
+    NativeHandle.releaseForgotten();
+    assertEquals(0, NativeHandle.living());
   }
 
   @Test
