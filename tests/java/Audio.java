@@ -27,7 +27,7 @@ final class Audio {
     return load("speech8", "raw/hts1a.raw", 0);
   }
 
-  /** Two microphones: the second hears the voice later and lower, and another one from behind. */
+  /** Two microphones: the voice reaches the second later and quieter, with another one from behind. */
   static short[] twoMicrophones() {
     short[] voice = command();
     short[] other = sentence();

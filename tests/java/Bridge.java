@@ -10,7 +10,7 @@ final class Bridge {
 
   private Bridge() {}
 
-  /** One answer a frame; a negative content type takes ProcessEPDFrame. */
+  /** One result a frame; a negative content type takes ProcessEPDFrame. */
   static native int[] epd(int mode, short[] pcm, int frame, int contentType, int resetAt);
 
   static native int[] ns(int mode, int microphones, short[] in, short[] out, int frame);

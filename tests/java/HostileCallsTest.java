@@ -63,29 +63,29 @@ class HostileCallsTest {
         boolean tooMany = count > 0 && count > (pcm == null ? 0 : pcm.length);
         long none = random.nextInt(10) == 0 ? 0 : -1;
         int method = random.nextInt(7);
-        int answer = 0;
+        int result = 0;
         switch (method) {
           case 0:
-            answer = Loquent.processEPDFrame(none == 0 ? 0 : epd, pcm, count);
+            result = Loquent.processEPDFrame(none == 0 ? 0 : epd, pcm, count);
             break;
           case 1:
-            answer = Loquent.ProcessEPDFrameByCnttype(none == 0 ? 0 : epd, pcm, count, number());
+            result = Loquent.ProcessEPDFrameByCnttype(none == 0 ? 0 : epd, pcm, count, number());
             break;
           case 2:
             short[] out = random.nextInt(10) == 0 ? pcm : array();
             short[] outBefore = copy(out);
             int outCount = random.nextInt(4) == 0 ? number() : count;
-            answer = Loquent.processDoNSFrame(none == 0 ? 0 : ns, pcm, count, out, outCount);
+            result = Loquent.processDoNSFrame(none == 0 ? 0 : ns, pcm, count, out, outCount);
             if (count > 0 && count > (out == null ? 0 : out.length)) tooMany = true;
-            if (answer == -1) assertArrayEquals(outBefore, out, repeat);
+            if (result == -1) assertArrayEquals(outBefore, out, repeat);
             if (out == pcm) before = copy(pcm);
             break;
           case 3:
-            answer = Loquent.processDRC(random.nextInt(10) == 0 ? none : drc, pcm, count);
-            if (answer != -1) before = copy(pcm);
+            result = Loquent.processDRC(random.nextInt(10) == 0 ? none : drc, pcm, count);
+            if (result != -1) before = copy(pcm);
             break;
           case 4:
-            answer = Loquent.computeEnergyFrame(pcm, count, rate());
+            result = Loquent.computeEnergyFrame(pcm, count, rate());
             break;
           case 5:
             int[] bins = random.nextInt(8) == 0 ? null : new int[pick(0, 1, 64, 127, 128, 129)];
@@ -101,7 +101,7 @@ class HostileCallsTest {
         }
         if (tooMany) {
           ++refused;
-          assertEquals(-1, answer, repeat);
+          assertEquals(-1, result, repeat);
         }
         assertArrayEquals(before, pcm, repeat);
       }

@@ -29,21 +29,21 @@ class LoquentTest {
     int on(int at, short[] frame);
   }
 
-  /** The answer to each whole frame, none of which may be changed. */
-  private static int[] answers(short[] pcm, int frame, Call call) {
-    int[] answers = new int[pcm.length / frame];
-    for (int i = 0; i < answers.length; ++i) {
+  /** The result for each whole frame, none of which may be changed. */
+  private static int[] results(short[] pcm, int frame, Call call) {
+    int[] results = new int[pcm.length / frame];
+    for (int i = 0; i < results.length; ++i) {
       int at = i * frame;
       short[] samples = Arrays.copyOfRange(pcm, at, at + frame);
-      answers[i] = call.on(at, samples);
+      results[i] = call.on(at, samples);
       assertArrayEquals(Arrays.copyOfRange(pcm, at, at + frame), samples);
     }
-    return answers;
+    return results;
   }
 
   @ParameterizedTest
   @CsvSource({"0,-1", "0,0", "0,2", "10000,-1", "1000,-1", "1000,2", "21000,0"})
-  void detectorAnswersAsInC(int mode, int contentType) {
+  void detectorDecidesAsInC(int mode, int contentType) {
     boolean narrow = mode % 10000 == 1000;
     short[] pcm = Audio.withGap(narrow ? Audio.narrowBand() : Audio.sentence());
     int frame = narrow ? 80 : 160;
@@ -55,10 +55,10 @@ class LoquentTest {
               ? Loquent.processEPDFrame(epd, samples, frame)
               : Loquent.ProcessEPDFrameByCnttype(epd, samples, frame, contentType);
         };
-    int[] answers = answers(pcm, frame, call);
+    int[] results = results(pcm, frame, call);
     assertEquals(0, Loquent.freeMemoryEPD(epd));
-    assertArrayEquals(Bridge.epd(mode, pcm, frame, contentType, RESET_AT), answers);
-    assertTrue(Arrays.stream(answers).sum() > 0, "there is speech");
+    assertArrayEquals(Bridge.epd(mode, pcm, frame, contentType, RESET_AT), results);
+    assertTrue(Arrays.stream(results).sum() > 0, "there is speech");
   }
 
   @ParameterizedTest
@@ -83,7 +83,7 @@ class LoquentTest {
           System.arraycopy(out, 0, result, at, frame);
           return count;
         };
-    int[] counts = answers(pcm, frame, call);
+    int[] counts = results(pcm, frame, call);
     assertEquals(0, Loquent.freeMemoryDoNS(ns));
     assertEquals(0, Loquent.freeMemoryDoNS(inPlace));
     assertArrayEquals(Bridge.ns(mode, microphones, pcm, expected, frame), counts);
@@ -103,24 +103,24 @@ class LoquentTest {
     Call call =
         (at, samples) -> {
           short[] frame = samples.clone();
-          int answer = Loquent.processDRC(drc, frame, 160);
+          int loud = Loquent.processDRC(drc, frame, 160);
           System.arraycopy(frame, 0, result, at, 160);
-          return answer;
+          return loud;
         };
-    int[] answers = answers(original, 160, call);
+    int[] results = results(original, 160, call);
     assertEquals(0, Loquent.freeMemoryDRC(drc));
-    assertArrayEquals(Bridge.drc(rateHz, expected, 160), answers);
+    assertArrayEquals(Bridge.drc(rateHz, expected, 160), results);
     assertArrayEquals(expected, result);
     assertEquals(rateHz == 16000, !Arrays.equals(original, expected), "in place");
   }
 
   @ParameterizedTest
   @ValueSource(ints = {16000, 8000})
-  void queriesAnswerAsInC(int rateHz) {
+  void queriesReturnAsInC(int rateHz) {
     short[] pcm = Audio.command();
     int block = rateHz / 50;
     int[] energies =
-        answers(pcm, block, (at, samples) -> Loquent.computeEnergyFrame(samples, block, rateHz));
+        results(pcm, block, (at, samples) -> Loquent.computeEnergyFrame(samples, block, rateHz));
     assertArrayEquals(Bridge.energy(rateHz, pcm, block), energies);
     assertTrue(Arrays.stream(energies).max().getAsInt() > 40);
 
@@ -132,7 +132,7 @@ class LoquentTest {
           System.arraycopy(spectrum, 0, spectra, at / 160 * 128, 128);
           return spectrum[128] + spectrum[129];
         };
-    assertEquals(0, Arrays.stream(answers(pcm, 160, call)).sum(), "nothing behind the bins");
+    assertEquals(0, Arrays.stream(results(pcm, 160, call)).sum(), "nothing behind the bins");
     assertArrayEquals(Bridge.spectrum(rateHz, pcm), spectra);
   }
 
@@ -249,12 +249,12 @@ class LoquentTest {
     for (boolean off : new boolean[] {false, true}) {
       long epd = Loquent.initializeEPD(0, 0);
       if (off) assertEquals(0, Loquent.LogEpdSetting(epd, 1));
-      Runnable listen =
-          () -> answers(Audio.command(), 160, (at, pcm) -> Loquent.processEPDFrame(epd, pcm, 160));
-      boolean logged = linesOf(listen).stream().anyMatch(line -> line.contains(hangover));
+      Runnable process =
+          () -> results(Audio.command(), 160, (at, pcm) -> Loquent.processEPDFrame(epd, pcm, 160));
+      boolean logged = linesOf(process).stream().anyMatch(line -> line.contains(hangover));
       assertNotEquals(off, logged);
       Loquent.resetEPDparams(epd);
-      assertTrue(linesOf(listen).stream().anyMatch(line -> line.contains(hangover)));
+      assertTrue(linesOf(process).stream().anyMatch(line -> line.contains(hangover)));
       Loquent.freeMemoryEPD(epd);
     }
   }

@@ -16,9 +16,9 @@ import org.junit.jupiter.api.BeforeEach;
 import org.junit.jupiter.api.Test;
 import org.junit.jupiter.api.function.Executable;
 
-/** The safe classes: cuts, delays, ends, misuse and forgetting. */
+/** The safe classes: chunk sizes, delays, ends, misuse and objects never closed. */
 class SafeClassesTest {
-  private static final int CUTS = Integer.getInteger("cuts");
+  private static final int ROUNDS = Integer.getInteger("rounds");
 
   @BeforeEach
   void quiet() {
@@ -31,26 +31,26 @@ class SafeClassesTest {
         : NoiseSuppressor.forOneMicrophone(NoiseSuppressor.Strength.STRONG);
   }
 
-  /** Lengths of pieces that make up the whole. */
-  private static List<Integer> cut(int whole, Random random) {
+  /** Random sizes of chunks that add up to the whole. */
+  private static List<Integer> chunks(int whole, Random random) {
     int longest = 8 << random.nextInt(13);
-    List<Integer> pieces = new ArrayList<>();
-    for (int rest = whole; rest > 0; rest -= pieces.get(pieces.size() - 1)) {
-      pieces.add(Math.min(rest, random.nextInt(longest + 1)));
+    List<Integer> chunks = new ArrayList<>();
+    for (int rest = whole; rest > 0; rest -= chunks.get(chunks.size() - 1)) {
+      chunks.add(Math.min(rest, random.nextInt(longest + 1)));
     }
-    return pieces;
+    return chunks;
   }
 
   private interface Push {
     short[] push(short[] pcm, int offset, int count);
   }
 
-  /** All that comes out of the pieces and of the flush. */
+  /** The output of all chunks and of the flush. */
   private static short[] pushAll(
-      short[] pcm, List<Integer> pieces, Push push, Supplier<short[]> flush) {
+      short[] pcm, List<Integer> chunks, Push push, Supplier<short[]> flush) {
     ShortBuffer out = ShortBuffer.allocate(pcm.length + 1000);
     int at = 0;
-    for (int length : pieces) {
+    for (int length : chunks) {
       out.put(push.push(pcm, at, length));
       at += length;
     }
@@ -58,28 +58,28 @@ class SafeClassesTest {
     return Arrays.copyOf(out.array(), out.position());
   }
 
-  private static short[] suppress(int microphones, short[] pcm, List<Integer> pieces) {
+  private static short[] suppress(int microphones, short[] pcm, List<Integer> chunks) {
     try (NoiseSuppressor ns = suppressor(microphones)) {
-      return pushAll(pcm, pieces, ns::push, ns::flush);
+      return pushAll(pcm, chunks, ns::push, ns::flush);
     }
   }
 
-  private static short[] level(short[] pcm, List<Integer> pieces) {
+  private static short[] level(short[] pcm, List<Integer> chunks) {
     try (DynamicsControl drc = new DynamicsControl()) {
-      return pushAll(pcm, pieces, drc::push, drc::flush);
+      return pushAll(pcm, chunks, drc::push, drc::flush);
     }
   }
 
-  static String utterances(short[] pcm, List<Integer> pieces) {
-    return utterances(EndPointDetector.at(16000).hangoverMillis(100), pcm, pieces);
+  static String utterances(short[] pcm, List<Integer> chunks) {
+    return utterances(EndPointDetector.at(16000).hangoverMillis(100), pcm, chunks);
   }
 
   private static String utterances(
-      EndPointDetector.Settings settings, short[] pcm, List<Integer> pieces) {
+      EndPointDetector.Settings settings, short[] pcm, List<Integer> chunks) {
     try (EndPointDetector epd = settings.open()) {
       StringBuilder text = new StringBuilder();
       int at = 0;
-      for (int length : pieces) {
+      for (int length : chunks) {
         for (Utterance found : epd.push(pcm, at, length)) text.append(describe(found));
         at += length;
       }
@@ -93,7 +93,7 @@ class SafeClassesTest {
   }
 
   @Test
-  void resultsDoNotDependOnTheCut() {
+  void resultsDoNotDependOnChunkSizes() {
     long seed = Long.getLong("seed", System.nanoTime());
     Random random = new Random(seed);
     short[] mono = Audio.withGap(Arrays.copyOf(Audio.command(), 44_444));
@@ -103,13 +103,13 @@ class SafeClassesTest {
     short[] two = suppress(2, pairs, List.of(pairs.length));
     short[] levelled = level(mono, List.of(mono.length));
     assertTrue(utterances.startsWith("utterance 1: "), utterances);
-    for (int i = 0; i < CUTS; ++i) {
-      List<Integer> pieces = cut(mono.length, random);
-      String repeat = "cut " + i + "; repeat with -Dseed=" + seed;
-      assertEquals(utterances, utterances(mono, pieces), repeat);
-      assertArrayEquals(one, suppress(1, mono, pieces), repeat);
-      assertArrayEquals(two, suppress(2, pairs, cut(pairs.length, random)), repeat);
-      assertArrayEquals(levelled, level(mono, pieces), repeat);
+    for (int i = 0; i < ROUNDS; ++i) {
+      List<Integer> chunks = chunks(mono.length, random);
+      String repeat = "round " + i + "; repeat with -Dseed=" + seed;
+      assertEquals(utterances, utterances(mono, chunks), repeat);
+      assertArrayEquals(one, suppress(1, mono, chunks), repeat);
+      assertArrayEquals(two, suppress(2, pairs, chunks(pairs.length, random)), repeat);
+      assertArrayEquals(levelled, level(mono, chunks), repeat);
     }
   }
 
@@ -176,9 +176,9 @@ class SafeClassesTest {
   void shortInputsHaveTheirLength() {
     for (int samples : new int[] {0, 1, 7, 159, 160, 161}) {
       short[] pcm = Arrays.copyOfRange(Audio.command(), 16000, 16000 + samples);
-      List<Integer> pieces = List.of(samples);
-      assertEquals(samples == 0 ? 0 : samples + 48, suppress(1, pcm, pieces).length);
-      assertEquals(samples, level(pcm, pieces).length);
+      List<Integer> chunks = List.of(samples);
+      assertEquals(samples == 0 ? 0 : samples + 48, suppress(1, pcm, chunks).length);
+      assertEquals(samples, level(pcm, chunks).length);
     }
   }
 
@@ -197,7 +197,7 @@ class SafeClassesTest {
   }
 
   @Test
-  void misuseIsTold() {
+  void misuseThrows() {
     short[] pcm = new short[10];
     EndPointDetector epd = EndPointDetector.at(8000).open();
     NoiseSuppressor ns = suppressor(1);

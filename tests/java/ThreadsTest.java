@@ -12,12 +12,12 @@ import java.util.concurrent.Future;
 import java.util.concurrent.atomic.AtomicBoolean;
 import org.junit.jupiter.api.Test;
 
-/** Instances on threads of their own, while memory is collected all the time, answer as alone. */
+/** Instances on threads of their own, while memory is collected all the time, result as alone. */
 class ThreadsTest {
   private static final int THREADS = 16;
 
   /** All that one thread computes, by the raw methods and by the safe classes. */
-  private static String answers(short[] pcm) {
+  private static String results(short[] pcm) {
     StringBuilder text = new StringBuilder(SafeClassesTest.utterances(pcm, List.of(pcm.length)));
     long epd = Loquent.initializeEPD(0, 0);
     try (NoiseSuppressor ns =
@@ -34,10 +34,10 @@ class ThreadsTest {
   }
 
   @Test
-  void answersAreThoseOfOneThread() throws Exception {
+  void resultsAreThoseOfOneThread() throws Exception {
     EngineLog.off();
     short[][] recordings = {Audio.command(), Audio.sentence(), Audio.withGap(Audio.sentence())};
-    String[] alone = Arrays.stream(recordings).map(ThreadsTest::answers).toArray(String[]::new);
+    String[] alone = Arrays.stream(recordings).map(ThreadsTest::results).toArray(String[]::new);
     AtomicBoolean done = new AtomicBoolean();
     Thread collector =
         new Thread(
@@ -49,7 +49,7 @@ class ThreadsTest {
     List<Future<String>> together = new ArrayList<>();
     for (int i = 0; i < THREADS; ++i) {
       short[] pcm = recordings[i % recordings.length];
-      together.add(pool.submit(() -> answers(pcm)));
+      together.add(pool.submit(() -> results(pcm)));
     }
     for (int i = 0; i < THREADS; ++i) {
       assertEquals(alone[i % recordings.length], together.get(i).get(), "thread " + i);

@@ -27,14 +27,14 @@ jintArray java_array(JNIEnv *env, const std::vector<jint> &values) {
   return array;
 }
 
-/// One answer for each whole frame.
+/// One result for each whole frame.
 template <class Call>
-jintArray answers_of(JNIEnv *env, Pcm &samples, jint frame, Call call) {
-  std::vector<jint> answers;
+jintArray results_of(JNIEnv *env, Pcm &samples, jint frame, Call call) {
+  std::vector<jint> results;
   const auto length = static_cast<std::size_t>(frame);
   for (std::size_t at = 0; at + length <= samples.size(); at += length)
-    answers.push_back(call(static_cast<jint>(at) / frame, &samples[at]));
-  return java_array(env, answers);
+    results.push_back(call(static_cast<jint>(at) / frame, &samples[at]));
+  return java_array(env, results);
 }
 
 std::string c_string(JNIEnv *env, jbyteArray bytes) {
@@ -54,13 +54,13 @@ BRIDGE(jintArray, epd)
 (JNIEnv *env, jclass, jint mode, jshortArray pcm, jint frame, jint content_type, jint reset_at) {
   Pcm samples = samples_of(env, pcm);
   EpdInstance *epd = InitializeEPD(mode, 0);
-  const jintArray answers = answers_of(env, samples, frame, [&](jint number, int16_t *at) {
+  const jintArray results = results_of(env, samples, frame, [&](jint number, int16_t *at) {
     if (number == reset_at) ResetEPDparams(epd);
     return content_type < 0 ? ProcessEPDFrame(epd, at, frame)
                             : ProcessEPDFrameByCnttype(epd, at, frame, content_type);
   });
   FreeMemoryEPD(epd);
-  return answers;
+  return results;
 }
 
 BRIDGE(jintArray, ns)
@@ -68,28 +68,28 @@ BRIDGE(jintArray, ns)
   Pcm samples = samples_of(env, in);
   Pcm result = samples_of(env, out);
   NsInstance *ns = InitializeDoNS(mode, microphones, 0);
-  const jintArray answers = answers_of(env, samples, frame, [&](jint number, int16_t *at) {
+  const jintArray results = results_of(env, samples, frame, [&](jint number, int16_t *at) {
     return ProcessDoNSFrame(ns, at, frame, &result[static_cast<std::size_t>(number * frame)],
                             frame);
   });
   FreeMemoryNS(ns);
   env->SetShortArrayRegion(out, 0, static_cast<jsize>(result.size()), result.data());
-  return answers;
+  return results;
 }
 
 BRIDGE(jintArray, drc)(JNIEnv *env, jclass, jint rate_hz, jshortArray pcm, jint frame) {
   Pcm samples = samples_of(env, pcm);
   const int64_t drc = InitializeDRC(rate_hz, 0);
-  const jintArray answers = answers_of(
+  const jintArray results = results_of(
       env, samples, frame, [&](jint, int16_t *at) { return ProcessDRC(drc, at, frame); });
   FreeMemoryDRC(drc);
   env->SetShortArrayRegion(pcm, 0, static_cast<jsize>(samples.size()), samples.data());
-  return answers;
+  return results;
 }
 
 BRIDGE(jintArray, energy)(JNIEnv *env, jclass, jint rate_hz, jshortArray pcm, jint frame) {
   Pcm samples = samples_of(env, pcm);
-  return answers_of(env, samples, frame,
+  return results_of(env, samples, frame,
                     [&](jint, int16_t *at) { return ComputeEnergy(at, frame, rate_hz); });
 }
 
