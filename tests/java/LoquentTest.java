@@ -5,8 +5,14 @@ import static org.junit.jupiter.api.Assertions.assertEquals;
 import static org.junit.jupiter.api.Assertions.assertNotEquals;
 import static org.junit.jupiter.api.Assertions.assertTrue;
 
+import java.net.URL;
+import java.net.URLClassLoader;
+import java.nio.file.Files;
+import java.nio.file.Path;
+import java.nio.file.attribute.PosixFilePermissions;
 import java.util.ArrayList;
 import java.util.Arrays;
+import java.util.Collections;
 import java.util.List;
 import java.util.logging.Level;
 import java.util.logging.Logger;
@@ -16,9 +22,12 @@ import org.junit.jupiter.params.ParameterizedTest;
 import org.junit.jupiter.params.provider.CsvSource;
 import org.junit.jupiter.params.provider.ValueSource;
 
-/** The native methods against the flat C interface, and what they do to arrays. */
+/** The native methods against the flat C interface, what they do to arrays, and their loading. */
 class LoquentTest {
   private static final int RESET_AT = 100;
+
+  /** Never collected: the Java machine itself reads freed memory when it unloads a library. */
+  private static ClassLoader shrunk;
 
   @BeforeEach
   void quiet() {
@@ -259,19 +268,53 @@ class LoquentTest {
     }
   }
 
-  /** The engine's lines meanwhile; a logger that throws does no harm. */
   static List<String> linesOf(Runnable work) {
-    List<String> lines = new ArrayList<>();
+    return linesOf(work, () -> {});
+  }
+
+  /** The engine's lines meanwhile, on each of which a handler runs; that it throws does no harm. */
+  static List<String> linesOf(Runnable work, Runnable handler) {
+    List<String> lines = Collections.synchronizedList(new ArrayList<>());
     Logger logger = Logger.getAnonymousLogger();
     logger.setLevel(Level.ALL);
     logger.setFilter(
         line -> {
           lines.add(line.getLevel() + " " + line.getMessage());
+          handler.run();
           throw new IllegalStateException("a logger's own fault");
         });
     EngineLog.toLogger(logger);
     work.run();
     EngineLog.off();
     return lines;
+  }
+
+  @Test
+  void theCopyIsItsOwnersOnly() throws Exception {
+    Path copy = NativeLibrary.createCopy();
+    List<String> rights =
+        List.of(
+            PosixFilePermissions.toString(Files.getPosixFilePermissions(copy.getParent())),
+            PosixFilePermissions.toString(Files.getPosixFilePermissions(copy)));
+    Files.delete(copy);
+    Files.delete(copy.getParent());
+    assertEquals(List.of("rwx------", "rw-------"), rights);
+  }
+
+  /** As after shrinking. A class loader of its own has a library of its own, the jar's. */
+  @Test
+  void loquentNeedsNoSafeClasses() throws Exception {
+    List<String> kept = List.of(Loquent.class.getName(), NativeLibrary.class.getName());
+    URL jar = Loquent.class.getProtectionDomain().getCodeSource().getLocation();
+    shrunk =
+        new URLClassLoader(new URL[] {jar}, null) {
+          @Override
+          protected Class<?> findClass(String name) throws ClassNotFoundException {
+            if (!kept.contains(name)) throw new ClassNotFoundException(name);
+            return super.findClass(name);
+          }
+        };
+    Class<?> loquent = shrunk.loadClass(Loquent.class.getName());
+    assertEquals("160705", loquent.getMethod("GetVersion").invoke(null));
   }
 }

@@ -12,8 +12,8 @@ import org.junit.jupiter.api.Test;
 @Tag("memory")
 class MemoryTest {
   private static final int CYCLES = 1_000_000;
-  private static final int WARM_UP = 1_000_000; // until the compiler has done its work
-  private static final long MAX_GROWTH_KB = 4096;
+  private static final int WARM_UP = 200_000;
+  private static final long MAX_GROWTH_KB = 1024;
 
   private static long residentKb() throws IOException {
     System.gc();
@@ -25,21 +25,7 @@ class MemoryTest {
   }
 
   private static void cycles(int count) {
-    for (int i = 0; i < count; ++i) {
-      switch (i % 4) {
-        case 0:
-          EndPointDetector.at(16000).open().close();
-          break;
-        case 1:
-          NoiseSuppressor.forOneMicrophone(NoiseSuppressor.Strength.NORMAL).close();
-          break;
-        case 2:
-          NoiseSuppressor.forTwoMicrophones().close();
-          break;
-        default:
-          new DynamicsControl().close();
-      }
-    }
+    for (int i = 0; i < count; ++i) ThreadsTest.Target.of(i % ThreadsTest.KINDS).close().run();
   }
 
   @Test

@@ -11,6 +11,7 @@ import java.util.ArrayList;
 import java.util.Arrays;
 import java.util.List;
 import java.util.Random;
+import java.util.concurrent.CompletableFuture;
 import java.util.function.Supplier;
 import org.junit.jupiter.api.BeforeEach;
 import org.junit.jupiter.api.Test;
@@ -25,7 +26,7 @@ class SafeClassesTest {
     EngineLog.off();
   }
 
-  private static NoiseSuppressor suppressor(int microphones) {
+  static NoiseSuppressor suppressor(int microphones) {
     return microphones == 2
         ? NoiseSuppressor.forTwoMicrophones()
         : NoiseSuppressor.forOneMicrophone(NoiseSuppressor.Strength.STRONG);
@@ -127,7 +128,6 @@ class SafeClassesTest {
     }
   }
 
-  /** With the delayed first channel in the output, which is what comes where nothing is suppressed. */
   @Test
   void settingsReachTheDetector() {
     short[] pcm = Arrays.copyOfRange(Audio.command(), 8000, 40_000); // begins with speech
@@ -147,6 +147,7 @@ class SafeClassesTest {
     assertMisuse(() -> settings.contentType(0).inputGain(1).open(), IllegalArgumentException.class);
   }
 
+  /** With the delayed first channel in the output, which is what comes where nothing is suppressed. */
   @Test
   void suppressorIsTheEnginesFrameByFrame() {
     for (int microphones = 1; microphones <= 2; ++microphones) {
@@ -286,13 +287,11 @@ class SafeClassesTest {
 
     NativeHandle inUse = new NativeHandle(new Object(), 1, address -> {});
     inUse.enter();
-    while (!inUse.refersTo(null)) System.gc();
-    for (int tries = 0; tries < 20; ++tries) {
+    for (int tries = 0; tries < 20 || !inUse.refersTo(null); ++tries) {
+      System.gc();
       Thread.sleep(10);
       NativeHandle.releaseForgotten();
-      Thread other = new Thread(NativeHandle::releaseForgotten);
-      other.start();
-      other.join();
+      CompletableFuture.runAsync(NativeHandle::releaseForgotten).join();
     }
     assertEquals(1, NativeHandle.living());
     inUse.leave();

@@ -10,37 +10,11 @@ import static org.junit.jupiter.api.Assertions.assertThrows;
 
 import java.io.UnsupportedEncodingException;
 import java.nio.charset.Charset;
-import java.util.ArrayList;
-import java.util.List;
-import java.util.concurrent.Callable;
-import java.util.concurrent.CountDownLatch;
-import java.util.concurrent.ExecutorService;
-import java.util.concurrent.Executors;
-import java.util.concurrent.Future;
-import org.junit.jupiter.api.BeforeAll;
 import org.junit.jupiter.api.Test;
 
-/** The string helpers as native code calls them. No other class may: their first use is raced. */
+/** The string helpers as native code calls them. */
 class StringHelpersTest {
   private static final String TEXT = "Grüße, 音声 \uD83C\uDFA4";
-  private static final int THREADS = 16;
-
-  @BeforeAll
-  static void raceTheFirstUse() throws Exception {
-    Bridge.fromC(new byte[0]);
-    CountDownLatch start = new CountDownLatch(THREADS);
-    ExecutorService pool = Executors.newFixedThreadPool(THREADS);
-    Callable<String> first =
-        () -> {
-          start.countDown();
-          start.await();
-          return Bridge.newString(Bridge.getBytes("ascii"));
-        };
-    List<Future<String>> texts = new ArrayList<>();
-    for (int i = 0; i < THREADS; ++i) texts.add(pool.submit(first));
-    for (Future<String> text : texts) assertEquals("ascii", text.get());
-    pool.shutdown();
-  }
 
   private static byte[] ascii(String text) {
     return text.getBytes(ISO_8859_1);
