@@ -93,7 +93,7 @@ public:
 
 private:
   S1chnsState state_{};
-  Word16 buffer_[kMostFrameSamples] = {};
+  Word16 buffer_[kMaxFrameSamples] = {};
 };
 
 class VoiceDetection {
@@ -171,11 +171,11 @@ public:
 
 private:
   std::shared_ptr<DrcInstance> drc_;
-  Word16 buffer_[kMostFrameSamples] = {};
+  Word16 buffer_[kMaxFrameSamples] = {};
 };
 
 /// `Transform` runs in place over a frame followed by zeros.
-template <class Transform, class Sample = Word16, std::size_t kSize = kMostTransformSize>
+template <class Transform, class Sample = Word16, std::size_t kSize = kMaxTransformSize>
 class Transformation {
 public:
   static constexpr std::size_t kBytes = 0;

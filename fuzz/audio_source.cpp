@@ -12,7 +12,7 @@ namespace {
 
 using orvalis::fuzz::require;
 
-constexpr std::size_t kMostSamples = 200000;  // silence packs well; there is no end to wait for
+constexpr std::size_t kMaxSamples = 200000;  // silence packs well; there is no end to wait for
 
 /// A file in memory with a name that it can be opened by.
 class MemoryFile {
@@ -53,14 +53,14 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
     orvalis::cli::AudioSource source(file.path(), settings);
     require(source.rate_hz() == 8000 || source.rate_hz() == 16000, "audio comes at 8 or 16 kHz");
     std::size_t heard = 0;
-    while (heard < kMostSamples) {
+    while (heard < kMaxSamples) {
       const auto samples = source.read();
       if (samples.empty()) break;
       require(settings.channels != orvalis::cli::Channels::kPair || samples.size() % 2 == 0,
               "pairs come whole");
       heard += samples.size();
     }
-    if (heard < kMostSamples) source.check_complete();
+    if (heard < kMaxSamples) source.check_complete();
   } catch (const orvalis::cli::AudioError &) {
     // The tool tells the user and goes on with the next file; anything else would end it.
   }

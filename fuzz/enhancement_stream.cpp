@@ -14,7 +14,7 @@ using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 using Samples = std::vector<std::int16_t>;
 
-constexpr std::size_t kMostSamples = 24000;
+constexpr std::size_t kMaxSamples = 24000;
 constexpr std::int16_t kGuard = 12345;
 
 /// A stream with all that came out of it.
@@ -119,7 +119,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   Enhancer cut(settings), whole(settings);
   Samples heard;
   const std::uint8_t room_at_end = input.byte();
-  while (!input.is_empty() && heard.size() < kMostSamples) {
+  while (!input.is_empty() && heard.size() < kMaxSamples) {
     const std::uint8_t room = input.byte();
     const Samples audio = input.audio();
     heard.insert(heard.end(), audio.begin(), audio.end());

@@ -10,7 +10,7 @@ namespace {
 using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 
-constexpr std::size_t kMostSamples = 24000;  // a longer input teaches nothing new
+constexpr std::size_t kMaxSamples = 24000;  // a longer input teaches nothing new
 
 void check_line(int priority, const char *tag, const char *text, void * /*user*/) {
   require(priority == 3 || priority == 4 || priority == 6, "log lines have a known priority");
@@ -62,7 +62,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   EpdInstance *epd = InitializeEPD(mode, 0);
   require(epd != nullptr, "a detector is created");
 
-  for (std::size_t heard = 0; !input.is_empty() && heard < kMostSamples;) {
+  for (std::size_t heard = 0; !input.is_empty() && heard < kMaxSamples;) {
     switch (input.byte() % 8) {
       case 0:
         require(ResetEPDparams(epd) == 0, "a reset succeeds");

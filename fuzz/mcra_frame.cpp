@@ -12,7 +12,7 @@ namespace {
 using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 
-constexpr std::size_t kMostSamples = 96000;  // a calibration takes 93000
+constexpr std::size_t kMaxSamples = 96000;  // a calibration takes 93000
 
 void configure(VADINFO &vad, Input &input) {
   vad.historyUpdate = input.number();
@@ -69,7 +69,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   initialVADINFO(&vad);
   configure(*vad, input);
 
-  for (std::size_t heard = 0; !input.is_empty() && heard < kMostSamples;) {
+  for (std::size_t heard = 0; !input.is_empty() && heard < kMaxSamples;) {
     switch (input.byte() % 8) {
       case 0:
         reset_MCRA_params(&vad);

@@ -11,9 +11,9 @@ using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 using Audio = std::vector<std::int16_t>;
 
-constexpr std::size_t kMostSamples = 48000;  // a longer input teaches nothing new
-constexpr std::size_t kTail = 320;           // a frame that is worked on whole, and the 160 samples
-constexpr std::int16_t kGuard = 12345;       // that the suppressor takes of it, stay within
+constexpr std::size_t kMaxSamples = 48000;  // a longer input teaches nothing new
+constexpr std::size_t kTail = 320;          // a frame that is worked on whole, and the 160 samples
+constexpr std::int16_t kGuard = 12345;      // that the suppressor takes of it, stay within
 
 struct Suppressor {
   std::int32_t mics;
@@ -79,7 +79,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   const std::int64_t drc = InitializeDRC(rate, 0);
   require(drc != -1, "a dynamics control is created");
 
-  for (std::size_t heard = 0; !input.is_empty() && heard < kMostSamples;) {
+  for (std::size_t heard = 0; !input.is_empty() && heard < kMaxSamples;) {
     const std::uint8_t what = input.byte();
     if (what % 16 == 0) {
       const std::int32_t count = input.number();

@@ -17,7 +17,7 @@ using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 using Samples = std::vector<std::int16_t>;
 
-constexpr std::size_t kMostSamples = 96000;  // more than a lead-in is made of at 8 kHz
+constexpr std::size_t kMaxSamples = 96000;  // more than a lead-in is made of at 8 kHz
 
 /// The utterances taken so far, each judged as it comes.
 class Findings {
@@ -191,7 +191,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
 
   Listener cut(settings);
   Samples heard;
-  while (!input.is_empty() && heard.size() < kMostSamples) {
+  while (!input.is_empty() && heard.size() < kMaxSamples) {
     if (input.byte() % 8 == 0) {
       cut.take();
     } else {

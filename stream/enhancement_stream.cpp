@@ -22,15 +22,15 @@ struct EnhancementStream {
 
   EnhancementSettings settings;
   int32_t delay;
-  int32_t lead;  ///< samples of the delay that have not come out of the suppressor yet
+  int32_t lead;  ///< samples of the delay that are still to come out of the suppressor
   bool flushed = false;
-  int64_t heard = 0;  ///< samples taken, of all microphones
-  int64_t given = 0;  ///< samples put out behind the delay
+  int64_t pushed = 0;  ///< samples of all microphones
+  int64_t given = 0;   ///< samples put out after the delay
   NsInstance *ns = nullptr;
   DrcInstance *drc = nullptr;
   FrameCutter input;
-  FrameCutter suppressed;          ///< on its way to dynamics control
-  orvalis::S2chnsState pair = {};  ///< of two microphones
+  FrameCutter suppressed;          ///< input of dynamics control
+  orvalis::S2chnsState pair = {};  ///< record of two microphones
   EnhancementCounts counts = {{0, -1}, {0, -1}, {0, -1}, 0};
 };
 
@@ -111,7 +111,7 @@ void pass_on(EnhancementStream &stream, const int16_t *samples, int32_t count, i
   }
 }
 
-/// How many samples come out if the suppressor passes that many on.
+/// How many samples come out if the suppressor passes `passed_on` on.
 int64_t ready_of(const EnhancementStream &stream, int64_t passed_on) {
   const int64_t lead = std::min<int64_t>(stream.lead, passed_on);
   int64_t ready = passed_on - lead;
@@ -119,12 +119,13 @@ int64_t ready_of(const EnhancementStream &stream, int64_t passed_on) {
   return stream.settings.aligned == 0 ? lead + ready : ready;
 }
 
-/// Suppresses the noise of a frame. Where nothing is suppressed, the first channel comes out late.
+/// Suppresses the noise of a frame. A frame that is not suppressed gives the first channel,
+/// delayed.
 void suppress(EnhancementStream &stream, const int16_t *frame, int16_t *output) {
   const int32_t channels = stream.settings.microphones;
   for (int32_t i = 0; i < kFrame; ++i) output[i] = frame[(i - stream.delay) * channels];
   if (stream.ns == nullptr) return;
-  // The engine writes into what it is given, and gives as many channels.
+  // The engine overwrites its input, and its output has as many channels.
   int16_t in[2 * kFrame], out[2 * kFrame];
   const int32_t values = kFrame * channels;
   std::copy_n(frame, values, in);
@@ -133,13 +134,13 @@ void suppress(EnhancementStream &stream, const int16_t *frame, int16_t *output) 
   for (int32_t i = 0; i < kFrame; ++i) output[i] = out[i * channels];
 }
 
-/// Samples that the suppressor has not passed on: of the frame that is not whole, and of the delay.
+/// Samples that the suppressor has not passed on: of the incomplete frame, and of the delay.
 int32_t held_back(const EnhancementStream &stream) {
-  if (stream.heard == 0 || stream.flushed) return 0;
+  if (stream.pushed == 0 || stream.flushed) return 0;
   return stream.input.waiting_values() / stream.settings.microphones + stream.delay;
 }
 
-/// Draws out all that is held back.
+/// Puts out all that is held back.
 void drain(EnhancementStream &stream, int16_t *out) {
   int32_t rest = held_back(stream);
   stream.input.flush((rest + kFrame - 1) / kFrame, [&](const int16_t *frame) {
@@ -182,8 +183,8 @@ ORVALIS_EXPORT int32_t PushEnhancementAudio(EnhancementStream *stream, const int
   if (ready > room) return -1;
   const int32_t channels = stream->settings.microphones;
   for (int32_t i = 0; i < numSample; ++i)
-    if (is_full_scale(pcm[i])) note(stream->counts.clipped_in, (stream->heard + i) / channels);
-  stream->heard += numSample;
+    if (is_full_scale(pcm[i])) note(stream->counts.clipped_in, (stream->pushed + i) / channels);
+  stream->pushed += numSample;
   stream->input.push(pcm, numSample, [&](const int16_t *frame) {
     int16_t samples[kFrame];
     suppress(*stream, frame, samples);
@@ -195,7 +196,7 @@ ORVALIS_EXPORT int32_t PushEnhancementAudio(EnhancementStream *stream, const int
 ORVALIS_EXPORT int32_t FlushEnhancementStream(EnhancementStream *stream, int16_t *out,
                                               int32_t room) {
   if (stream == nullptr || room < 0 || (out == nullptr && room > 0)) return -1;
-  if (stream->heard % stream->settings.microphones != 0) return -1;
+  if (stream->pushed % stream->settings.microphones != 0) return -1;
   const int32_t rest = held_back(*stream);
   const int32_t skipped = stream->settings.aligned == 1 ? std::min(stream->lead, rest) : 0;
   const int32_t ready = rest - skipped + stream->suppressed.waiting_values();

@@ -8,36 +8,35 @@ namespace orvalis {
 
 inline constexpr std::int32_t kFrame = 160;  ///< samples a channel
 
-/// One channel, or two interleaved ones. Counts are of samples a channel unless they are said to be
-/// of values.
+/// One channel, or two interleaved ones. "Samples" count one channel, "values" all of them.
 class FrameCutter {
 public:
   explicit FrameCutter(std::int32_t channels) : channels_(channels) {}
 
   std::int32_t frame_values() const { return kFrame * channels_; }
 
-  /// Values of the frame that is not whole yet.
+  /// Values of the incomplete frame.
   std::int32_t waiting_values() const { return waiting_; }
 
-  /// Calls work(frame) for each frame that the values complete. In front of it stands the audio
-  /// before it, as far back as two frames, and zeros before the first of all.
+  /// Calls work(frame) for each frame that the values complete. The two frames before it are in
+  /// front of it in memory; at the beginning these are zeros.
   template <class Work>
   void push(const std::int16_t *samples, std::int32_t values, Work work) {
     while (values > 0) {
-      const std::int32_t piece = std::min(values, frame_values() - waiting_);
-      std::copy_n(samples, piece, frame() + waiting_);
-      samples += piece;
-      values -= piece;
-      waiting_ += piece;
+      const std::int32_t chunk = std::min(values, frame_values() - waiting_);
+      std::copy_n(samples, chunk, frame() + waiting_);
+      samples += chunk;
+      values -= chunk;
+      waiting_ += chunk;
       if (waiting_ == frame_values()) finish_frame(work);
     }
   }
 
-  /// Completes as many frames with the last audio mirrored, to and fro where it is short. There
-  /// must have been some, and no channel may be ahead of the other.
+  /// Completes `frames` frames with the end of the audio mirrored, forth and back if it is short.
+  /// There must have been audio, and as much of either channel.
   template <class Work>
   void flush(std::int32_t frames, Work work) {
-    std::int16_t tail[kMostValues];
+    std::int16_t tail[kMaxValues];
     const std::int32_t length = (past_ + waiting_) / channels_;
     std::copy_n(frame() - past_, past_ + waiting_, tail);
     const std::int32_t missing = frames * kFrame - waiting_ / channels_;
@@ -49,8 +48,8 @@ public:
   }
 
 private:
-  static constexpr std::int32_t kMostChannels = 2;
-  static constexpr std::int32_t kMostValues = 3 * kFrame * kMostChannels;
+  static constexpr std::int32_t kMaxChannels = 2;
+  static constexpr std::int32_t kMaxValues = 3 * kFrame * kMaxChannels;
 
   std::int16_t *frame() { return audio_ + 2 * frame_values(); }
 
@@ -64,9 +63,9 @@ private:
   }
 
   std::int32_t channels_;
-  std::int32_t past_ = 0;  // values in front of the frame that are audio
+  std::int32_t past_ = 0;  // values of audio in front of the frame
   std::int32_t waiting_ = 0;
-  std::int16_t audio_[kMostValues] = {};  // two frames of the past, and the one that is filled
+  std::int16_t audio_[kMaxValues] = {};  // two past frames, and the incomplete one
 };
 
 }  // namespace orvalis

@@ -18,7 +18,7 @@ DecisionTiming decision_timing(const UtteranceSettings &settings) {
   const KepdTiming timing =
       timing_of(static_cast<uint32_t>(settings.content_type), settings.rate_hz == 8000);
   const int32_t frame_samples = settings.rate_hz / 100;
-  // Utterances count their closing pause: only behind a short one can they be too short.
+  // The closing pause is part of an utterance, so only the short timing can refuse one.
   return {.frame_samples = frame_samples,
           .start_delay = timing.start_lag() * frame_samples,
           .end_delay = timing.end_lag() * frame_samples,
@@ -61,12 +61,12 @@ FrameDetector::Decision FrameDetector::process(const int16_t *frame) {
   if (mcra_ != nullptr) {
     Word16 windowed[MCRA_FRAME_SAMPLES];
     std::copy_n(frame, MCRA_FRAME_SAMPLES, windowed);
-    const bool speech = judge_mcra_frame(*mcra_, windowed, MCRA_FRAME_SAMPLES, exponent_);
+    const bool speech = process_mcra_frame(*mcra_, windowed, MCRA_FRAME_SAMPLES, exponent_);
     explain_frame(*mcra_, mcra_reasons_);
     return {.speech = speech, .is_null = false};
   }
-  const Word32 answer = EPD_Proc_Frame(epd_, frame, frame_samples_, content_type_, epd_reasons_);
-  return {.speech = answer == 1, .is_null = epd_reasons_.judged == 0};
+  const Word32 speech = EPD_Proc_Frame(epd_, frame, frame_samples_, content_type_, epd_reasons_);
+  return {.speech = speech == 1, .is_null = epd_reasons_.judged == 0};
 }
 
 void FrameDetector::lead_in(const int16_t *window) {

@@ -12,30 +12,28 @@ struct EpdInstance;
 
 namespace orvalis {
 
-inline constexpr int32_t kMaxFrameSamples = 160;
-
-/// Of the detector that the settings ask for.
+/// Of the detector that the settings select.
 DecisionTiming decision_timing(const UtteranceSettings &settings);
 
 class FrameDetector {
 public:
   struct Decision {
     bool speech;
-    bool is_null;  ///< null audio, which is not judged
+    bool is_null;  ///< null audio, on which nothing is decided
   };
 
-  /// Takes memory. False, holding none, if that runs out.
+  /// Allocates. False, with nothing allocated, if memory runs out.
   bool open(const UtteranceSettings &settings);
   void close();
 
-  /// Judges a frame of decision_timing().frame_samples, which stays as it is.
+  /// Decides on a frame of decision_timing().frame_samples, which is not changed.
   Decision process(const int16_t *frame);
 
-  /// Lets the channel-energy detector learn the noise from 100 ms. No dump and no utterance holds
-  /// them.
+  /// Lets the channel-energy detector learn the noise from 100 ms, which appear in no dump and no
+  /// utterance.
   void lead_in(const int16_t *window);
 
-  /// Why the last frame was answered as it was; null for the other detector.
+  /// Why the last frame was decided as it was; null for the other detector.
   const EpdReasons *epd_reasons() const { return epd_ != nullptr ? &epd_reasons_ : nullptr; }
   const McraReasons *mcra_reasons() const { return mcra_ != nullptr ? &mcra_reasons_ : nullptr; }
 

@@ -7,7 +7,8 @@
 namespace orvalis {
 namespace {
 
-/// Sums over a frame's samples. Those of a window stay below 2^41, its scaled variance below 2^52.
+/// Sums over the samples of a frame. Over a window they stay below 2^41, its scaled variance below
+/// 2^52.
 struct Sums {
   int64_t linear = 0;
   int64_t squared = 0;
@@ -36,7 +37,7 @@ int64_t scaled_variance(const Sums (&frames)[kLeadInWindow], int32_t frame_sampl
 
 const int16_t *quietest_window(const int16_t *pcm, int32_t frames, int32_t frame_samples) {
   const int16_t *quietest = nullptr;
-  int64_t least = 0;
+  int64_t min_variance = 0;
   Sums window[kLeadInWindow];  // ring of the latest frames
   int32_t run = 0;             // of frames without null audio
   for (int32_t i = 0; i < frames; ++i) {
@@ -46,8 +47,8 @@ const int16_t *quietest_window(const int16_t *pcm, int32_t frames, int32_t frame
     run = is_null_frame(frame, frame_samples, small_samples) ? 0 : run + 1;
     if (run < kLeadInWindow) continue;
     const int64_t variance = scaled_variance(window, frame_samples);
-    if (quietest != nullptr && variance >= least) continue;
-    least = variance;
+    if (quietest != nullptr && variance >= min_variance) continue;
+    min_variance = variance;
     quietest = frame - (kLeadInWindow - 1) * frame_samples;
   }
   return quietest;

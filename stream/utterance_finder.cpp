@@ -29,11 +29,11 @@ FinderSettings finder_settings(const UtteranceSettings &settings, const Decision
 void UtteranceFinder::process(bool speech, bool is_null, UtteranceQueue &queue) {
   processed_ += settings_.timing.frame_samples;
   if (speech) {
-    take_speech();
+    process_speech();
   } else {
-    take_silence(is_null, queue);
+    process_silence(is_null, queue);
   }
-  hand_out_decided(queue);
+  hand_out_complete(queue);
 }
 
 void UtteranceFinder::finish(int64_t input_end, UtteranceQueue &queue) {
@@ -52,16 +52,16 @@ int64_t UtteranceFinder::earliest_start() const {
   return std::max(start - settings_.pad_before, handed_out_end_);
 }
 
-void UtteranceFinder::take_speech() {
-  if (!running_) begin_piece();
+void UtteranceFinder::process_speech() {
+  if (!running_) begin_segment();
   run_ += 1;
   if (run_ > settings_.timing.refused_run) is_undecided_ = false;
   open_->ended = processed_;
 }
 
-void UtteranceFinder::take_silence(bool is_null, UtteranceQueue &queue) {
+void UtteranceFinder::process_silence(bool is_null, UtteranceQueue &queue) {
   if (running_) {
-    end_piece(is_null);
+    end_segment(is_null);
   } else if (!is_null) {
     is_interrupted_ = false;
   }
@@ -77,61 +77,62 @@ bool UtteranceFinder::hangover_is_over() const {
   return processed_ + settings_.timing.frame_samples - open_->ended > settings_.hangover;
 }
 
-void UtteranceFinder::begin_piece() {
-  // A piece that goes on after null audio belongs to the same utterance of the detector.
+void UtteranceFinder::begin_segment() {
+  // A segment that goes on after null audio belongs to the same utterance of the detector.
   const bool goes_on = is_interrupted_;
   if (!goes_on) run_ = 0;
-  if (!goes_on || !open_) before_piece_ = open_;
+  if (!goes_on || !open_) before_segment_ = open_;
   is_undecided_ = run_ < settings_.timing.refused_run;
   is_interrupted_ = false;
   running_ = true;
   const int64_t frame_start = processed_ - settings_.timing.frame_samples;
-  piece_start_ =
-      goes_on ? frame_start : std::max(frame_start - settings_.timing.start_delay, last_piece_end_);
+  segment_start_ = goes_on
+                       ? frame_start
+                       : std::max(frame_start - settings_.timing.start_delay, last_segment_end_);
   if (!open_) {
     open_ = Utterance{};
-    open_->start = piece_start_;
-    open_->end = piece_start_;
+    open_->start = segment_start_;
+    open_->end = segment_start_;
     open_->began = processed_;
   }
 }
 
-void UtteranceFinder::end_piece(bool is_null) {
+void UtteranceFinder::end_segment(bool is_null) {
   running_ = false;
   is_interrupted_ = is_null;
   const int64_t end = is_null ? open_->ended : open_->ended - settings_.timing.end_delay;
   open_->end = joined_end(end);
-  last_piece_end_ = std::max(end, piece_start_);
+  last_segment_end_ = std::max(end, segment_start_);
 }
 
-/// Where the open utterance ends if its last piece does at `piece_end`: a piece may have held
+/// The end of the open utterance if its last segment ends at `segment_end`: a segment may have held
 /// nothing but the closing pause.
-int64_t UtteranceFinder::joined_end(int64_t piece_end) const {
-  return piece_end > piece_start_ ? piece_end : open_->end;
+int64_t UtteranceFinder::joined_end(int64_t segment_end) const {
+  return segment_end > segment_start_ ? segment_end : open_->end;
 }
 
 bool UtteranceFinder::is_long_enough(int64_t end) const {
   return end - open_->start >= settings_.min_speech;
 }
 
-/// The open utterance will be handed out whatever comes.
+/// Whatever comes, the open utterance will be handed out.
 bool UtteranceFinder::open_is_certain() const {
   if (!open_ || is_undecided_) return false;
   const int64_t seen = open_->ended - settings_.timing.end_delay;
   return is_long_enough(running_ ? joined_end(seen) : open_->end);
 }
 
-/// Where the utterance behind the closed one starts, or no sooner than where.
+/// The start of the utterance after the closed one, or its earliest possible start.
 int64_t UtteranceFinder::next_start() const {
   if (open_) return open_->start;
-  return std::max(processed_ - settings_.timing.start_delay, last_piece_end_);
+  return std::max(processed_ - settings_.timing.start_delay, last_segment_end_);
 }
 
-/// Drops the pieces of an utterance that the detector took back, or has not accepted by now.
+/// Drops the segments of an utterance that the detector has refused, or not accepted by now.
 void UtteranceFinder::settle_refusal() {
   if (!is_undecided_) return;
   is_undecided_ = false;
-  open_ = before_piece_;
+  open_ = before_segment_;
 }
 
 void UtteranceFinder::close_open(UtteranceQueue &queue) {
@@ -143,14 +144,14 @@ void UtteranceFinder::close_open(UtteranceQueue &queue) {
   open_.reset();
 }
 
-/// Hands out the closed utterance if no decision to come can change it.
-void UtteranceFinder::hand_out_decided(UtteranceQueue &queue) {
+/// Hands out the closed utterance if no later decision can change it.
+void UtteranceFinder::hand_out_complete(UtteranceQueue &queue) {
   if (!closed_) return;
   const int64_t gap = next_start() - closed_->end;
   if (open_is_certain() || gap >= 2 * settings_.pad_after) hand_out(gap / 2, queue);
 }
 
-/// Hands out the closed utterance, padded. `room_after` is its share of the gap behind it.
+/// Hands out the closed utterance, padded. `room_after` is its part of the gap after it.
 void UtteranceFinder::hand_out(int64_t room_after, UtteranceQueue &queue) {
   Utterance utterance = *closed_;
   closed_.reset();

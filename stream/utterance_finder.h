@@ -1,5 +1,6 @@
-// From a detector's decisions to utterances: dated back by the detector's delay, joined over the
-// hangover, left out if they hold too little speech, padded.
+// From a detector's decisions to utterances. A segment is a run of decisions for speech, dated back
+// by the detector's delay. Segments are joined over the hangover to utterances; those with too
+// little speech are dropped, the others padded.
 #pragma once
 
 #include <cstdint>
@@ -20,7 +21,7 @@ public:
   const Utterance *front() const { return count_ == 0 ? nullptr : &slots_[first_]; }
 
 private:
-  // A frame decides at most two utterances and so does the end, beyond those that may wait.
+  // Beyond those that may wait, a frame completes at most two utterances, and so does the end.
   static constexpr int32_t kSlots = UTTERANCE_QUEUE_LENGTH + 4;
 
   Utterance slots_[kSlots] = {};
@@ -28,12 +29,12 @@ private:
   int32_t count_ = 0;
 };
 
-/// How a detector's decisions relate to the speech. In samples, but for the run.
+/// How a detector's decisions relate to the speech, in samples; the run is in decisions.
 struct DecisionTiming {
   int32_t frame_samples;
-  int64_t start_delay;  ///< of the first decision for speech behind the start of speech
-  int64_t end_delay;    ///< of the last one behind its end
-  int32_t refused_run;  ///< longest run of decisions for speech that the detector takes back
+  int64_t start_delay;  ///< from the start of speech to the first decision for it
+  int64_t end_delay;    ///< from its end to the last one
+  int32_t refused_run;  ///< maximum run of decisions for speech that the detector refuses later
 };
 
 /// In samples.
@@ -45,49 +46,49 @@ struct FinderSettings {
   int64_t min_speech;
 };
 
-/// What the settings of a stream ask of the finder.
+/// The finder's part of the settings of a stream.
 FinderSettings finder_settings(const UtteranceSettings &settings, const DecisionTiming &timing);
 
-/// Positions are samples.
+/// Positions are in samples.
 class UtteranceFinder {
 public:
   explicit UtteranceFinder(const FinderSettings &settings) : settings_(settings) {}
 
-  /// Takes the decision on the next frame. Null audio, which is not judged, is no speech.
+  /// Processes the decision on the next frame. Null audio is no speech.
   void process(bool speech, bool is_null, UtteranceQueue &queue);
 
-  /// Closes what is open; `input_end` counts the samples behind the last frame too.
+  /// Closes what is open. `input_end` includes the samples after the last whole frame.
   void finish(int64_t input_end, UtteranceQueue &queue);
 
-  /// No utterance that is still to be decided starts before this. Never goes back.
+  /// No utterance that is not complete yet starts before this. Never decreases.
   int64_t earliest_start() const;
 
 private:
-  void take_speech();
-  void take_silence(bool is_null, UtteranceQueue &queue);
+  void process_speech();
+  void process_silence(bool is_null, UtteranceQueue &queue);
   bool hangover_is_over() const;
-  void begin_piece();
-  void end_piece(bool is_null);
-  int64_t joined_end(int64_t piece_end) const;
+  void begin_segment();
+  void end_segment(bool is_null);
+  int64_t joined_end(int64_t segment_end) const;
   bool is_long_enough(int64_t end) const;
   bool open_is_certain() const;
   int64_t next_start() const;
   void settle_refusal();
   void close_open(UtteranceQueue &queue);
-  void hand_out_decided(UtteranceQueue &queue);
+  void hand_out_complete(UtteranceQueue &queue);
   void hand_out(int64_t room_after, UtteranceQueue &queue);
 
   FinderSettings settings_;
   int64_t processed_ = 0;
   bool running_ = false;         // the last decision was for speech
-  bool is_interrupted_ = false;  // null audio ended the last piece, nothing was judged since
-  bool is_undecided_ = false;    // the detector may still take its utterance back
+  bool is_interrupted_ = false;  // null audio ended the last segment and has not ended itself
+  bool is_undecided_ = false;    // the detector may still refuse its utterance
   int32_t run_ = 0;              // decisions for speech of the detector's utterance
-  int64_t piece_start_ = 0;
-  int64_t last_piece_end_ = 0;     // also of a piece that held nothing but the closing pause
-  std::optional<Utterance> open_;  // may be joined by further pieces
-  std::optional<Utterance> before_piece_;  // open_ as it was before the detector's utterance
-  std::optional<Utterance> closed_;        // complete, but its neighbour may limit its padding
+  int64_t segment_start_ = 0;
+  int64_t last_segment_end_ = 0;             // also of one that held nothing but the closing pause
+  std::optional<Utterance> open_;            // further segments may join it
+  std::optional<Utterance> before_segment_;  // open_ as it was before the detector's utterance
+  std::optional<Utterance> closed_;          // complete, but its neighbour may limit its padding
   int32_t handed_out_ = 0;
   int64_t handed_out_end_ = 0;  // end of the last one handed out, before padding
 };

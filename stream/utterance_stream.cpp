@@ -28,17 +28,17 @@ struct UtteranceStream {
   void (*on_frame)(const UtteranceFrame *frame, void *user);
   void *user;
 
-  bool leads_in;  // and has not yet
+  bool leads_in;  // the lead-in is still to come
   bool flushed = false;
   bool finished = false;
   int64_t pushed = 0;
-  int64_t judged = 0;
+  int64_t processed = 0;
 
-  // Audio waits here until there is a frame of it, or at first what the lead-in is made of.
+  // Audio waits here until it is a frame, or at first as much as the lead-in searches.
   int16_t *held;
   int32_t held_room;
   int32_t held_samples = 0;
-  int32_t held_judged = 0;
+  int32_t held_processed = 0;
 };
 
 namespace {
@@ -58,7 +58,7 @@ bool is_valid(const UtteranceSettings &settings) {
          settings.lead_in <= 1;
 }
 
-/// Most samples that a stream holds before it judges them.
+/// Maximum number of samples that a stream holds before it processes them.
 int32_t room_for_held(const UtteranceSettings &settings) {
   const int32_t frame_samples = orvalis::decision_timing(settings).frame_samples;
   return settings.lead_in == 1 ? orvalis::kLeadInSearch * frame_samples : frame_samples;
@@ -70,10 +70,10 @@ void lead_in(UtteranceStream &stream) {
   if (window != nullptr) stream.detector.lead_in(window);
 }
 
-void judge_frame(UtteranceStream &stream, const int16_t *pcm) {
+void process_frame(UtteranceStream &stream, const int16_t *pcm) {
   const auto [speech, is_null] = stream.detector.process(pcm);
   if (stream.on_frame != nullptr) {
-    const UtteranceFrame frame = {.start = stream.judged,
+    const UtteranceFrame frame = {.start = stream.processed,
                                   .pcm = pcm,
                                   .samples = stream.frame_samples,
                                   .speech = speech,
@@ -81,24 +81,24 @@ void judge_frame(UtteranceStream &stream, const int16_t *pcm) {
                                   .mcra = stream.detector.mcra_reasons()};
     stream.on_frame(&frame, stream.user);
   }
-  stream.judged += stream.frame_samples;
+  stream.processed += stream.frame_samples;
   stream.finder.process(speech, is_null, stream.queue);
 }
 
-/// Judges the held audio if it is due: when it fills its room, or when no more will come. Stops at
-/// a full queue, to go on when called again.
-void judge_held(UtteranceStream &stream) {
+/// Processes the held audio once it fills its room or no more will come. Stops at a full queue; the
+/// next call goes on.
+void process_held(UtteranceStream &stream) {
   if (stream.held_samples < stream.held_room && !stream.flushed) return;
   if (stream.leads_in) lead_in(stream);
   stream.leads_in = false;
-  while (stream.held_judged + stream.frame_samples <= stream.held_samples) {
+  while (stream.held_processed + stream.frame_samples <= stream.held_samples) {
     if (stream.queue.is_full()) return;
-    judge_frame(stream, stream.held + stream.held_judged);
-    stream.held_judged += stream.frame_samples;
+    process_frame(stream, stream.held + stream.held_processed);
+    stream.held_processed += stream.frame_samples;
   }
   if (!stream.flushed) {
     stream.held_room = stream.frame_samples;
-    stream.held_samples = stream.held_judged = 0;
+    stream.held_samples = stream.held_processed = 0;
   } else if (!stream.finished) {
     stream.finder.finish(stream.pushed, stream.queue);
     stream.finished = true;
@@ -129,22 +129,22 @@ ORVALIS_EXPORT int32_t PushUtteranceAudio(UtteranceStream *stream, const int16_t
   if (stream == nullptr || stream->flushed || numSample < 0 || (pcm == nullptr && numSample > 0)) {
     return -1;
   }
-  judge_held(*stream);
+  process_held(*stream);
   int32_t taken = 0;
   while (taken < numSample && !stream->queue.is_full()) {
-    const int32_t piece = std::min(numSample - taken, stream->held_room - stream->held_samples);
-    std::copy_n(pcm + taken, piece, stream->held + stream->held_samples);
-    stream->held_samples += piece;
-    stream->pushed += piece;
-    taken += piece;
-    judge_held(*stream);
+    const int32_t chunk = std::min(numSample - taken, stream->held_room - stream->held_samples);
+    std::copy_n(pcm + taken, chunk, stream->held + stream->held_samples);
+    stream->held_samples += chunk;
+    stream->pushed += chunk;
+    taken += chunk;
+    process_held(*stream);
   }
   return taken;
 }
 
 ORVALIS_EXPORT int32_t NextUtterance(UtteranceStream *stream, Utterance *utterance) {
   if (stream == nullptr || utterance == nullptr) return -1;
-  judge_held(*stream);
+  process_held(*stream);
   return stream->queue.pop(*utterance) ? 1 : 0;
 }
 
@@ -157,7 +157,7 @@ ORVALIS_EXPORT int64_t EarliestUtteranceStart(const UtteranceStream *stream) {
 ORVALIS_EXPORT int32_t FlushUtteranceStream(UtteranceStream *stream) {
   if (stream == nullptr) return -1;
   stream->flushed = true;
-  judge_held(*stream);
+  process_held(*stream);
   return static_cast<int32_t>(stream->pushed % stream->frame_samples);
 }
 

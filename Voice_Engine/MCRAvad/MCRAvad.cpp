@@ -19,7 +19,7 @@ void initialise_mcra(VADINFO &vad) {
   std::memset(&vad, 0, offsetof(VADINFO, historyUpdate));
   vad.frameIndex = -1;
   vad.energyThreshold = -1;
-  // Far above any power, so that slots without a spectrum are no minimum.
+  // Far above any power: slots that hold no spectrum yet are never the minimum.
   std::memset(vad.minPower, 1, sizeof vad.minPower);
   std::memset(vad.minHistory, 1, sizeof vad.minHistory);
   vad.energyMargin = 2;
@@ -32,12 +32,12 @@ void initialise_mcra(VADINFO &vad) {
 
 void analyse_mcra_frame(VADINFO &vad, Word16 *frame, Word32 length) {
   count_up(vad.frameIndex);
-  take_periodogram(vad, frame, length);
+  compute_periodogram(vad, frame, length);
   update_noise(vad);
   update_presence(vad);
 }
 
-bool judge_mcra_frame(VADINFO &vad, Word16 *frame, Word32 length, float exponent) {
+bool process_mcra_frame(VADINFO &vad, Word16 *frame, Word32 length, float exponent) {
   analyse_mcra_frame(vad, frame, length);
   return decide_frame(vad, exponent);
 }
@@ -63,7 +63,7 @@ ORVALIS_EXPORT void reset_MCRA_params(VADINFO **info) {
   vad.calibrationOlderSum = 0;
   vad.calibrationNewerSum = 0;
   vad.calibrationPeak = 0;
-  vad.energyThreshold = 0;  // the calibrated threshold of silence
+  vad.energyThreshold = 0;  // what calibration finds for silence
 }
 
 ORVALIS_EXPORT void ApplyVAD(VADINFO **info, int16_t *frame, int32_t length) {
@@ -71,7 +71,7 @@ ORVALIS_EXPORT void ApplyVAD(VADINFO **info, int16_t *frame, int32_t length) {
 }
 
 ORVALIS_EXPORT int32_t processVAD(VADINFO **info, int16_t *frame, int32_t length, float exponent) {
-  return orvalis::judge_mcra_frame(**info, frame, length, exponent) ? 1 : 0;
+  return orvalis::process_mcra_frame(**info, frame, length, exponent) ? 1 : 0;
 }
 
 ORVALIS_EXPORT int32_t explainVAD(VADINFO **info, McraReasons *reasons) {

@@ -2,15 +2,14 @@
  * Math_baseop.h - the extended fixed-point mathematics of libOrvalis.so
  *
  * Elementary functions, 64-bit helpers and windows in fixed point. Qn means n bits behind the
- * binary point: 1.0 in Q26 is 2^26. Errors are the largest against the exact result, and tests
- * hold them.
+ * binary point: 1.0 in Q26 is 2^26. Maximum errors are against the exact result, and tested.
  *
- *   function            argument        result   largest error
+ *   function            argument        result   maximum error
  *   ZOLT_L_log          Q16 (unsigned)  Q26      0.00047
  *   ZOLT_S_log          Q16 (unsigned)  Q11      0.00094
- *   ZOLT_L_exp          Q26             Q32      0.00017 of the value and 1 unit, always too small
- *   ZOLT_L_pow2_plus    any Q           any Q    0.00017 of the value, and the rounding
- *   ZOLT_L_pow          Q15, Q31        Q15      0.00065 of the value and 1 unit
+ *   ZOLT_L_exp          Q26             Q32      0.00017 relative and 1 unit, always too small
+ *   ZOLT_L_pow2_plus    any Q           any Q    0.00017 relative, and the rounding
+ *   ZOLT_L_pow          Q15, Q31        Q15      0.00065 relative and 1 unit
  *   ZOLT_expintFix      Q12             Q32      0.0013
  *   ZOLT_L_sin, _cos    Q22             Q31      0.0040
  *   ZOLT_L_atan         Q11             Q22      0.00175
@@ -42,25 +41,25 @@ int16_t ZOLT_S_log(uint32_t x);
 
 /* e^x in Q32 of x in Q26: 0 for x <= -21, 0x4E9B87F67BB3F559 (e^21) for x >= 21. */
 int64_t ZOLT_L_exp(int32_t x);
-/* Its halves, for x >= 0 and for x < 0. Each is right over the whole range. */
+/* Its halves, for x >= 0 and for x < 0; each is valid for any x. */
 int64_t L_exp_plus(int32_t x);
 int64_t L_exp_mius(int32_t x);
 
-/* 2^(x / 2^q) in Qout_q, rounded half up, at most INT32_MAX. Any q and out_q will do. Mode 0
- * takes one table entry (0.55 % error at most), any other mode the product of two. Ends the process
- * unless 0 <= x / 2^q < 32768. */
+/* 2^(x / 2^q) in Qout_q, rounded half up, at most INT32_MAX, for any q and out_q. Mode 0 uses one
+ * table entry (maximum error 0.55 %), any other mode the product of two. Ends the process unless
+ * 0 <= x / 2^q < 32768. */
 int32_t ZOLT_L_pow2_plus(int32_t x, int16_t q, int16_t out_q, uint16_t mode);
 
-/* x^y in Q15 of x > 0 in Q15 and y in Q31. x counts as 32768 - 2^-16 from there on. A negative x
- * has no power; its doubled bits are read as an unsigned Q16 value. */
+/* x^y in Q15 of x > 0 in Q15 and y in Q31. Larger x count as 32768 - 2^-16. A negative x has no
+ * power; its doubled bits are read as an unsigned Q16 value. */
 int32_t ZOLT_L_pow(int32_t x, int32_t y);
 
-/* Factors of f, f^2 ... f^5 in Q15 that ZOLT_L_log sums up to ln(1 + f). */
+/* Factors of f, f^2 ... f^5 in Q15, which add up to ln(1 + f) in ZOLT_L_log. */
 extern const int16_t ZOLT_ln_coeffs[5];
 /* 2^(i / 128) in Q30, and 2^((i - 1) / 8192) in Q30 with 1.0 at entry 0. */
 extern const uint32_t ZOLT_LPow2PlusFr1[128];
 extern const uint32_t ZOLT_LPow2PlusFr2[64];
-/* The same under second names. */
+/* The same tables under other names. */
 extern const uint32_t LPow2PlusFr1[128];
 extern const uint32_t LPow2PlusFr2[64];
 /* e^(2^(k - 15)) and e^(-2^(k - 15)) in Q18. No function reads them. */
@@ -80,9 +79,9 @@ int64_t ZOLT_POLYVALFix(const int64_t *coefficients, int32_t x, int32_t n);
 
 /* a / b in Q10, truncated toward zero. Ends the process if b is 0. */
 int64_t ZOLT_L64_div(int64_t a, int64_t b);
-/* a * b in Q32, within |a| + |b| + 1 units as numbers in Q32, mostly too small: bit 0 of neither
- * counts. Saturates, but where the upper halves alone leave the range and both factors are negative
- * the result falls short of it. */
+/* a * b in Q32. Bit 0 of either factor is ignored, so the result is mostly too small, by up to
+ * |a| + |b| + 1 units with a and b as numbers in Q32. Saturates; but if both factors are negative
+ * and the upper halves alone exceed the range, the result falls short of the maximum. */
 int64_t ZOLT_L64_mult(int64_t a, int64_t b);
 /* a * b / 2^32, rounded down. */
 int64_t ZOLT_LL_mult_64a32(int64_t a, int32_t b);
@@ -100,12 +99,12 @@ int32_t ZOLT_get_gcd(int32_t a, int32_t b);
 /* Sine and cosine in Q31 of any angle in Q22 radians, by table without interpolation. */
 int32_t ZOLT_L_sin(int32_t angle);
 int32_t ZOLT_L_cos(int32_t angle);
-/* Angle in Q22 radians of a tangent in Q11: the last tenth of a degree that is not above it. */
+/* Angle in Q22 radians of a tangent in Q11, rounded down to a tenth of a degree. */
 int32_t ZOLT_L_atan(int32_t tangent);
 /* Angle of the point (x, y) in Q22 radians, -pi to pi; 0 for (0, 0). */
 int32_t ZOLT_L_atan2(int32_t y, int32_t x);
 
-/* Tangent of every tenth of a degree in Q11, the last that of 89.9999 degrees. */
+/* Tangents of 0, 0.1, 0.2 ... degrees in Q11; the last is that of 89.9999 degrees. */
 extern const int32_t ZOLT_atanList[901];
 /* sin(i / 256) in Q31. */
 extern const int32_t ZOLT_sinList[403];

@@ -17,7 +17,7 @@ using orvalis::constexpr_math::sin_of_turn;
 using TangentTable = std::array<Word32, 901>;
 using SineTable = std::array<Word32, 403>;
 
-/// tan(i / 10 degrees) in Q11; in place of the infinite one that of 89.9999 degrees.
+/// tan(i / 10 degrees) in Q11; for 90 degrees that of 89.9999.
 constexpr TangentTable make_tangents() {
   TangentTable table{};
   for (std::size_t i = 0; i + 1 < table.size(); ++i) {
@@ -59,7 +59,7 @@ constexpr Word32 kHalfPi = 6588395;
 }  // namespace
 
 Word32 sin_q31(Word32 angle) {
-  constexpr Word32 kFold = 6588394;
+  constexpr Word32 kFold = kHalfPi - 1;  // pi/2 itself folds too, onto the same entry
   constexpr Word32 kLastEntry = 402;
   Word32 reduced = angle % kTwoPi;
   if (reduced > kPi) {
@@ -75,7 +75,7 @@ Word32 sin_q31(Word32 angle) {
 }
 
 Word32 cos_q31(Word32 angle) {
-  // A quarter turn forward or three back are the same sine; one of them cannot overflow.
+  // A quarter turn forward is three quarters back; one of the two cannot overflow.
   constexpr Word32 kThreeQuarters = 19765195;
   return sin_q31(angle > kHalfPi ? angle - kThreeQuarters : angle + kHalfPi);
 }
@@ -95,7 +95,7 @@ Word32 atan2_q22(Word32 y, Word32 x) {
   const Word64 width = L64_abs(x);
   const Word64 shorter = std::min(height, width);
   const Word64 longer = std::max(height, width);
-  // The tangent of the steeper angle: from 1 upward Q11 tells every entry of the table apart.
+  // The tangent of the steeper angle: from 1 upward no two entries of the table are equal.
   const Word32 steep =
       shorter == 0 ? kHalfPi : atan_q22(saturated_word32((longer << 11) / shorter));
   Word32 angle = height > width ? steep : kHalfPi - steep;

@@ -1,7 +1,8 @@
 // E1(x) is the integral of e^-t / t from x to infinity.
 //
 // Near 0 by its series, further out by its continued fraction, each until a step changes less than
-// 0.001. A polynomial tells which: its root, 3.016, is where both take about the same work.
+// 0.001. The sign of a polynomial with the root 3.016 selects one: there both take about the same
+// work.
 // Formulas: Abramowitz and Stegun, Handbook of Mathematical Functions, 5.1.11 and 5.1.22.
 #include "Voice_Engine/MCRAvad/exponential_integral.h"
 
@@ -42,7 +43,7 @@ struct Convergents {
   Word64 numerator = kOne;
   Word64 denominator;
 
-  /// Takes the next convergent, numerator / denominator, in.
+  /// Moves on to the next convergent, numerator / denominator.
   void advance(Word64 next_numerator, Word64 next_denominator) {
     const Word64 divisor = next_denominator >> 12;  // at least 2^20: denominators are above 1
     previous_numerator = L64_quotient<20>(numerator, divisor);

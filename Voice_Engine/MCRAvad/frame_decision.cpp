@@ -22,15 +22,15 @@ struct Measures {
   Word64 speech_bins = 0;
 };
 
-/// What the measures of two frames have to exceed.
+/// What the measures of two frames must exceed.
 struct Thresholds {
   float energy;
   float smoothed_energy;
   Word64 speech_bins;
 };
 
-/// Sum of powers in Q31. A product with a power of two is exact, so it makes no difference whether
-/// the processor fuses it with the sum.
+/// Sum of powers in Q31. Products with a power of two are exact, so fused multiply-adds give the
+/// same bits.
 float energy_of(const Word64 *powers) {
   float sum = 0;
   for (int k = 0; k < kMcraBins; ++k) sum += static_cast<float>(powers[k]) * 0x1p-31F;
@@ -43,7 +43,7 @@ Word64 speech_bins_of(const Word32 *probabilities_q31) {
   return sum >> 31;
 }
 
-/// The measures of the record's frame; the first frame of all counts as 0.
+/// The measures of the frame in the record; all 0 in the very first one.
 Measures measure(const VADINFO &vad) {
   if (vad.frameIndex < 1) return {};
   return {energy_of(vad.periodogram), std::fabs(energy_of(vad.smoothedPeriodogram)),
@@ -55,13 +55,14 @@ Measures operator+(const Measures &a, const Measures &b) {
           a.minimum_energy + b.minimum_energy, a.speech_bins + b.speech_bins};
 }
 
-/// Learns how loud the start is; gives the smoothed energy to carry on. Frames that are too loud
-/// for a background count as their predecessor.
-float learn_startup(VADINFO &vad, float two_frames, float smoothed_energy) {
-  constexpr float kLoudest = 30;
+/// Adds up the energies of the first frames. Returns the smoothed energy to keep for the next
+/// frame: in place of one that is too loud for background, that of the previous frame.
+float track_startup(VADINFO &vad, float two_frames, float smoothed_energy) {
+  constexpr float kMaxBackground = 30;
   if (vad.frameIndex < 1 || vad.frameIndex > kLastStartupFrame) return smoothed_energy;
   if (vad.frameIndex <= kLastSummedFrame) vad.startupFrameEnergy += two_frames;
-  const float carried = smoothed_energy <= kLoudest ? smoothed_energy : vad.prevSmoothedEnergy;
+  const float carried =
+      smoothed_energy <= kMaxBackground ? smoothed_energy : vad.prevSmoothedEnergy;
   vad.startupSmoothedEnergy += carried;
   return carried;
 }
@@ -71,7 +72,7 @@ float startup_scale(float startup_energy) {
   return startup_energy <= 20 ? 1 : startup_energy / 20;
 }
 
-/// What the margin of the smoothed energy is counted in.
+/// The unit of energyMargin.
 float energy_scale(const VADINFO &vad, float minimum_energy) {
   if (vad.frameIndex < kFirstSettledFrame) return 1;
   if (vad.calibrationEnable == 0) return startup_scale(vad.startupSmoothedEnergy);
@@ -84,7 +85,7 @@ Thresholds thresholds_of(const VADINFO &vad, const Measures &two_frames) {
   const float floor = vad.lowThresholdSelect == 1 ? 0.097F : 0.1F;
   const float margin =
       static_cast<float>(vad.energyMargin) * energy_scale(vad, two_frames.minimum_energy);
-  return {// A threshold that is not a number counts as none.
+  return {// The floor also where the threshold is not a number.
           .energy = vad.energyThreshold > floor ? vad.energyThreshold : floor,
           .smoothed_energy = margin < kMinSmoothedEnergy ? kMinSmoothedEnergy : margin,
           .speech_bins = kSpeechBins};
@@ -103,7 +104,7 @@ bool decide_frame(VADINFO &vad, float exponent) {
   const Measures previous = {vad.prevFrameEnergy, vad.prevSmoothedEnergy, vad.prevMinEnergy,
                              vad.prevSpeechBins};
   const Measures two_frames = frame + previous;
-  const float carried = learn_startup(vad, two_frames.energy, frame.smoothed_energy);
+  const float carried = track_startup(vad, two_frames.energy, frame.smoothed_energy);
   const bool calibrates = vad.frameIndex >= kFirstSettledFrame && vad.calibrationEnable != 0 &&
                           vad.calibrationMode == 1;
   if (calibrates) calibrate_threshold(vad, frame.energy, exponent);

@@ -12,7 +12,7 @@ void initialise_mcra(VADINFO &vad);
 /// As ApplyVAD: windows `frame` in place.
 void analyse_mcra_frame(VADINFO &vad, Word16 *frame, Word32 length);
 
-/// As processVAD: whether the frame, windowed in place, is speech.
-bool judge_mcra_frame(VADINFO &vad, Word16 *frame, Word32 length, float exponent);
+/// As processVAD: windows the frame in place; true for speech.
+bool process_mcra_frame(VADINFO &vad, Word16 *frame, Word32 length, float exponent);
 
 }  // namespace orvalis

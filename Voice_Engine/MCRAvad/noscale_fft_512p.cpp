@@ -1,4 +1,4 @@
-// The exported unscaled transforms: what callers may get wrong is judged here.
+// The exported unscaled transforms, which check their arguments.
 #include "Voice_Engine/MCRAvad/noscale_fft_512p.h"
 
 #include <cstdio>

@@ -2,15 +2,15 @@
  * noscale_fft_512p.h - the exported unscaled 64-bit transforms of libOrvalis.so
  *
  * Complex radix-2 FFTs of 512 and 256 points, decimation in time, in place on separate real and
- * imaginary parts. Nothing is scaled between the stages: 16-bit samples enter as x * 2^32, which
- * leaves the growth of 512 points within 64 bits and their full precision in the result.
+ * imaginary parts. Nothing is scaled between the stages: 16-bit samples enter as x * 2^32, so that
+ * 512 points cannot outgrow 64 bits and the result keeps its full precision.
  *
  * Forward is X(k) = sum of x(n) * e^(-2 pi i k n / N); inverse is the conjugate sum divided by N,
  * rounded half up. Sums beyond 64 bits wrap; 32-bit parts below 2^22 (512 points) or 2^23 (256)
- * cannot reach that. Arithmetic is exact to a unit of 2^-32, but the factors of the tables only to
- * 5e-7. So a bin of a frame, rounded, is within 0.5 + 5.5e-7 * (sum of |x|) of the discrete Fourier
- * transform: within 1.1 for peaks at -24 dB of full scale, within 2 for loud noise, within 10 for a
- * square wave at full scale.
+ * cannot reach that. The arithmetic is exact to 2^-32, the twiddle factors only to 5e-7. So a
+ * rounded bin of a frame is within 0.5 + 5.5e-7 * (sum of |x|) of the discrete Fourier transform:
+ * within 1.1 for peaks at -24 dB of full scale, within 2 for loud noise, within 10 for a square
+ * wave at full scale.
  *
  * n: its sign chooses the direction, negative for inverse; its magnitude should be the number of
  * points and is not used.

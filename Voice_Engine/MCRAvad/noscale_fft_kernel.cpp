@@ -19,7 +19,7 @@ using SineTable = std::array<Word32, kPoints>;
 template <std::size_t kPoints>
 using ReversalTable = std::array<Word16, kPoints>;
 
-/// To Q31 by way of six decimals and single precision: results are bit-exact to that.
+/// To Q31 by way of six decimals and single precision, as bit-exact results need it.
 constexpr Word32 sine_entry(double sine) {
   const double millionths = sine * 1e6;
   const auto rounded = static_cast<Word32>(millionths < 0 ? millionths - 0.5 : millionths + 0.5);

@@ -1,6 +1,6 @@
-// A root of x = mantissa * 2^-shift, with the mantissa in 1/2..1: a polynomial gives the root of
-// the mantissa, a table that of the shift's remainder by 3, and what is left of the shift is whole.
-// The polynomials interpolate at Chebyshev's nodes, where the largest error is nearly least.
+// Roots of x = mantissa * 2^-shift, with the mantissa in 1/2..1: a polynomial gives the root of the
+// mantissa, a table that of shift % 3, and shift / 3 is a shift of the result. The polynomials
+// interpolate at the Chebyshev nodes, which makes the maximum error nearly minimal.
 #include "Voice_Engine/MCRAvad/roots.h"
 
 #include <array>
@@ -61,7 +61,7 @@ using Series8 = Series<8>;
 using Series14 = Series<14>;
 using Remainders = std::array<Word32, 2>;
 
-/// What a shift by 1 and by 2 contributes to the root.
+/// The factors by which shifts of 1 and of 2 change the root.
 constexpr Remainders make_remainders(int thirds) {
   return {rounded_q31(power_of_thirds(0.5, thirds)), rounded_q31(power_of_thirds(0.25, thirds))};
 }
@@ -97,10 +97,9 @@ Word64 root_of_mantissa(const Series<kTerms> &series, Word64 mantissa) {
   return sum;
 }
 
-/// root * (what a shift by `remainder` contributes) * 2^-whole, rounded half up.
-Word32 shifted_root(Word64 root, const Remainders &contributions, int remainder, int whole) {
-  const Word64 factor =
-      remainder == 0 ? kOneQ31 : contributions[static_cast<std::size_t>(remainder) - 1];
+/// root * (factor of a shift by `remainder`) * 2^-whole, rounded half up.
+Word32 shifted_root(Word64 root, const Remainders &factors, int remainder, int whole) {
+  const Word64 factor = remainder == 0 ? kOneQ31 : factors[static_cast<std::size_t>(remainder) - 1];
   return saturated_word32((root * factor + ((kOneQ31 / 2) << whole)) >> (31 + whole));
 }
 
@@ -126,7 +125,7 @@ Word32 cube_root_q31(Word32 x) {
 
 Word32 root15_q31(Word32 x) {
   return odd(x, [](Word32 mantissa, Word32 shift) {
-    // A shift by 3 contributes 2^-2.
+    // A shift by 3 is the factor 2^-2.
     return shifted_root(root_of_mantissa(orvalis_ZOLT_root15_fraction, mantissa),
                         orvalis_ZOLT_root15_coeffs, shift % 3, shift / 3 * 2);
   });

@@ -1,4 +1,4 @@
-// Rounded products, shifts and halves of the MCRA detector, none of which leaves its type.
+// Rounded products, shifts and halves of the MCRA detector. None overflows.
 #pragma once
 
 #include "Voice_Engine/MCRAvad/wide_arithmetic.h"

@@ -1,4 +1,7 @@
-// How likely speech is in every bin, from its SNR and that of its surroundings.
+// The probability of speech in every bin, from its SNR and that of its surroundings.
+//
+// Symbols of the papers: gamma a posteriori SNR, xi a priori SNR, v = gamma xi / (1 + xi), G gain,
+// zeta average of xi over time, q prior probability of speech absence, p probability of speech.
 //
 // Source: I. Cohen and B. Berdugo, "Speech enhancement for non-stationary noise environments",
 // Signal Processing, 2001; Y. Ephraim and D. Malah, "Speech enhancement using a minimum mean-square
@@ -10,7 +13,7 @@
 
 namespace orvalis {
 
-/// SNRs, gains and probabilities of a frame whose noise is known.
+/// gamma, xi, G, zeta and p of a frame whose noise is known.
 void update_presence(VADINFO &vad);
 
 }  // namespace orvalis

@@ -34,9 +34,9 @@ void close_window(VADINFO &vad, bool is_first, float exponent) {
   vad.energyThreshold = threshold_of(vad.calibrationBest, power_of(exponent));
 }
 
-/// Frames of a window belong to its older or its newer half; all windows but the first have taken
-/// the older half over from their predecessor.
-void take_frame(VADINFO &vad, Word32 base, float frame_energy) {
+/// Adds a frame to the older or the newer half of its window. All windows but the first have their
+/// older half from the previous window.
+void add_frame(VADINFO &vad, Word32 base, float frame_energy) {
   const Word32 position = vad.calibrationIndex - base;
   if (vad.calibrationPhase == 0 && position <= kHalfWindow) {
     vad.calibrationOlderSum += frame_energy;
@@ -50,10 +50,10 @@ void advance_window(VADINFO &vad, float frame_energy, float exponent) {
   if (phase < 0 || phase > kLastPhase) return;
   const Word32 base = kWindowStep * phase;
   const Word32 end = base + kWindowFrames;
-  // The last window only waits for its end, which no other window reaches: the threshold rests.
+  // The seventh window counts no frame and so never reaches its end: the threshold stays.
   if (phase < kLastPhase && vad.calibrationIndex >= base && vad.calibrationIndex <= end) {
     ++vad.calibrationIndex;
-    take_frame(vad, base, frame_energy);
+    add_frame(vad, base, frame_energy);
   }
   if (vad.calibrationIndex != end) return;
   ++vad.calibrationPhase;
@@ -63,12 +63,12 @@ void advance_window(VADINFO &vad, float frame_energy, float exponent) {
 }  // namespace
 
 void calibrate_threshold(VADINFO &vad, float frame_energy, float exponent) {
-  constexpr float kLargestExponent = 0.84F;
+  constexpr float kMaxExponent = 0.84F;
   count_up(vad.calibrationCount);
   advance_window(vad, frame_energy, exponent);
   if (vad.calibrationCount == kFramesToFinalThreshold)
     vad.energyThreshold =
-        threshold_of(vad.calibrationBest, power_of(std::min(kLargestExponent, exponent)));
+        threshold_of(vad.calibrationBest, power_of(std::min(kMaxExponent, exponent)));
   if (vad.calibrationCount == kFramesToEnd) vad.calibrationDone = 1;
 }
 

@@ -1,5 +1,5 @@
-// The detector's windows. They are listed because no formula gives every unit of them: each is near
-// 0.5 - 0.5 * cos(2 pi n / period), the first within 1 unit of Q15, the last within 1506 of Q31.
+// The detector's Hann windows, 0.5 - 0.5 * cos(2 pi n / period). They are listed because no formula
+// gives every bit: the first is within 1 unit of Q15 of this one, the last within 1506 of Q31.
 #include "Voice_Engine/MCRAvad/windows.h"
 
 // Period 159.5: a frame in time.

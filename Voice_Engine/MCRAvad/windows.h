@@ -1,4 +1,4 @@
-// Windows: the multiplication of a row of values by a row of weights, and the detector's tables.
+// Windows: values times weights, and the detector's tables of weights.
 #pragma once
 
 #include <array>

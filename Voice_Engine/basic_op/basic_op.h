@@ -18,10 +18,10 @@
  * saturate. Shift counts may have any size; a negative count shifts the other way.
  *
  * Flags: 16-bit add, sub, mult, mult_r and sature set the overflow flag to 0 or 1; shifts and
- * 32-bit operators only ever raise it; the carry operators write both. The flags are process-wide
- * words that every engine call on every thread may change; the library never branches on them
- * except in the carry operators and L_sat. Frame calls and transforms leave in them what their
- * operators, run one after another, would leave.
+ * 32-bit operators only ever set it to 1; the carry operators write both. The flags are
+ * process-wide words that every engine call on every thread may change; nothing in the library
+ * branches on them but the carry operators and L_sat. Frame calls and transforms leave in them what
+ * their operators would leave if run one after another.
  *
  * Every function may be called from any thread. Pointers must be valid; nothing is checked.
  */
@@ -100,7 +100,7 @@ int16_t ns_mac_r(int32_t sum, int16_t a, int16_t b);
 int16_t msu_r(int32_t sum, int16_t a, int16_t b); /* L_msu, rounded */
 int16_t ns_msu_r(int32_t sum, int16_t a, int16_t b);
 
-/* ---- Arithmetic with carry: results wrap, L_sat mends them ---------------------------------- */
+/* ---- Arithmetic with carry: results wrap, L_sat saturates ---------------------------------- */
 
 int32_t L_add_c(int32_t a, int32_t b); /* a + b + Carry */
 int32_t L_ns_add_c(int32_t a, int32_t b);
@@ -110,7 +110,7 @@ int32_t L_macNs(int32_t sum, int16_t a, int16_t b); /* L_add_c(sum, L_mult(a, b)
 int32_t ns_L_macNs(int32_t sum, int16_t a, int16_t b);
 int32_t L_msuNs(int32_t sum, int16_t a, int16_t b); /* L_sub_c(sum, L_mult(a, b)) */
 int32_t ns_L_msuNs(int32_t sum, int16_t a, int16_t b);
-int32_t L_sat(int32_t x); /* x; after an overflow the end of the range, clearing both flags */
+int32_t L_sat(int32_t x); /* x; after an overflow the max or min, clearing both flags */
 int32_t ns_L_sat(int32_t x);
 
 /* ---- 32-bit shifts -------------------------------------------------------------------------- */
@@ -179,9 +179,9 @@ int32_t fnLog2(int32_t x); /* log2(x / 2^31) in Q26; INT32_MAX for 0 */
 int32_t ns_fnLog2(int32_t x);
 int32_t fnLog10(int32_t x); /* log10(x / 2^31) in Q26; INT32_MAX for 0 */
 int32_t ns_fnLog10(int32_t x);
-int32_t fnExp2(int32_t x); /* 2^x in Q31 for x <= 0 in Q26 */
+int32_t fnExp2(int32_t x); /* 2^x in Q31 for x < 0 in Q26; one half for 0 */
 int32_t ns_fnExp2(int32_t x);
-int32_t fnExp10(int32_t x); /* 10^x in Q31 for x <= 0 in Q26 */
+int32_t fnExp10(int32_t x); /* 10^x in Q31 for x < 0 in Q26; one half for 0 */
 int32_t ns_fnExp10(int32_t x);
 int16_t sqroot(int32_t x); /* Q15 root of a normalised Q31 value (0.5 <= x < 1) */
 int16_t ns_sqroot(int32_t x);

@@ -1,5 +1,5 @@
 // Elementary functions for tables that are made at compile time. Accurate to about 1e-16 (exp_of
-// and exp2_of relative to their value), so that no rounding of a table is in doubt.
+// and exp2_of relative), so that the rounding of no table entry is in doubt.
 #pragma once
 
 #include <array>
@@ -52,7 +52,7 @@ constexpr DoubleDouble two_sum(double a, double b) {
 }
 
 constexpr DoubleDouble two_product(double a, double b) {
-  constexpr double kSplitter = 134217729;  // 2^27 + 1 cuts a double into halves
+  constexpr double kSplitter = 134217729;  // 2^27 + 1 splits a double into halves
   const double a_hi = kSplitter * a - (kSplitter * a - a);
   const double b_hi = kSplitter * b - (kSplitter * b - b);
   const double a_lo = a - a_hi;

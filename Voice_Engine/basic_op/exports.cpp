@@ -133,7 +133,7 @@ REPORTING(ZoltCopy, Word16, ZOLT_short_sat, sature,    (Word32 x), x)
 REPORTING(ZoltCopy, Word16, ZOLT_div_s,     div_s,     (Word16 a, Word16 b), a, b)
 // clang-format on
 
-// The operators that the inline ones express with a pair, or with no name at all.
+// Operators whose inline form returns a struct, or is none.
 EXPORTED void Log2(Word32 x, Word16 *exponent, Word16 *fraction) {
   PublishedFlags<PlainCopy> flags;
   const orvalis::Log2Result result = orvalis::Log2(*flags, x);

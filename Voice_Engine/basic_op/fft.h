@@ -1,4 +1,4 @@
-// What the three transforms have in common: their direction and their bit-reversed order.
+// What the three transforms share: direction and bit-reversed order.
 #pragma once
 
 #include <cstddef>

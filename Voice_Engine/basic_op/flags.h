@@ -1,8 +1,8 @@
 // Overflow and carry flags of the three operator copies.
 //
-// Each copy has one process-wide pair, which hosts may read by name. The engine itself works on a
-// pair in a local variable, so that the compiler can keep it in registers or drop it where the
-// next operator overwrites it, and publishes that pair once when an exported call returns.
+// Each copy has one process-wide pair, which hosts may read by name. The engine works on a local
+// pair, which the compiler can keep in registers or drop where the next operator overwrites it, and
+// publishes it once, when an exported call returns.
 #pragma once
 
 #include <type_traits>
@@ -20,15 +20,15 @@ ORVALIS_EXPORT extern orvalis::Word16 Overflow_ZOLT, Carry_ZOLT;
 
 namespace orvalis {
 
-/// The flags of one call of the plain or the ns_ copy, which differ in where they are published
-/// only. `overflow` and `carry` hold 0 or 1, or what a host stored before.
+/// The flags of one call of the plain or the ns_ copy, which differ only in where they are
+/// published. `overflow` and `carry` hold 0 or 1, or what a host stored before.
 struct Flags {
   Word32 overflow = 0;
   Word32 carry = 0;
 };
 
-/// Flags of the ZOLT_ copy: extended mathematics. A type of its own, so that no code over Flags
-/// passes by its deviations, which stand in zolt_operators.h as overloads.
+/// Flags of the ZOLT_ copy: extended mathematics. A type of its own, so that no code on Flags
+/// bypasses its deviations, which are overloads in zolt_operators.h.
 struct ZoltFlags {
   Word32 overflow = 0;
   Word32 carry = 0;
@@ -57,9 +57,9 @@ struct ZoltCopy {
   static auto &carry() { return ::Carry_ZOLT; }
 };
 
-/// The flags of one exported call: read when it begins, published when it returns, so that a value
-/// that no operator overwrites stays. Relaxed atomics keep concurrent instances free of data races
-/// on objects whose layout has to stay a plain integer.
+/// The flags of one exported call: read when it begins, so that a value that no operator overwrites
+/// stays, and published when it returns. Relaxed atomics keep concurrent instances free of data
+/// races on objects that have to stay plain integers.
 template <class Copy>
 class PublishedFlags {
 public:

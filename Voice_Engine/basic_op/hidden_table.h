@@ -1,7 +1,7 @@
 // Tables that are exported under short, common names.
 //
-// A host may define the same name, so the library never reads its own exported name: it reads a
-// hidden one, and the exported name is an alias of the same memory.
+// A host may define the same name, so the library reads a hidden name, of which the exported one is
+// an alias.
 #pragma once
 
 #include "Voice_Engine/platform/export.h"
@@ -10,6 +10,6 @@
 #define ORVALIS_HIDDEN_TABLE(type, name) \
   extern "C" __attribute__((visibility("hidden"))) const type orvalis_##name
 
-/// Exports a hidden table as `name`; stands in the file that defines it.
+/// Exports a hidden table as `name`, in the file that defines it.
 #define ORVALIS_EXPORT_TABLE(type, name) \
   extern "C" ORVALIS_EXPORT __attribute__((alias("orvalis_" #name))) const type name

@@ -38,6 +38,8 @@ inline Word32 fnLog2(Flags &flags, Word32 x) {
   const Word16 shift = norm_l(x);
   const Word16 mantissa = extract_h(L_shl(flags, x, shift));
   const Word16 exponent = negate(add(flags, shift, 1));
+  // -0.3372 m^2 + 0.9982 m - 0.6626 fits log2(m) / 4 over 1/2..1. The error of the logarithm is
+  // -0.0065..0.0088, of a level in dB -0.020..0.028. Adding 1 makes the fraction of the result.
   Word32 polynomial = L_mult(flags, mult_r(flags, mantissa, mantissa), -11050);
   polynomial = L_mac(flags, polynomial, mantissa, 32709);
   polynomial = L_add(flags, polynomial, L_deposit_h(-21712)) >> 3;
@@ -50,27 +52,28 @@ inline Word32 fnLog10(Flags &flags, Word32 x) {
   return x == 0 ? MAX_32 : L_mpy_ls(flags, fnLog2(flags, x), kLog10Of2);
 }
 
-/// 2^x in Q31 for x <= 0 in Q26; larger arguments have no defined result.
+/// 2^x in Q31 for x < 0 in Q26. For 0 it is one half; larger arguments have no defined result.
 inline Word32 fnExp2(Flags &flags, Word32 x) {
   const Word32 split = L_mult(flags, extract_h(x), 32);
   const Word16 exponent = sub(flags, -1, extract_h(split));
   const Word32 fraction = L_add(flags, split & 0xFFFF, L_deposit_h(-1)) >> 1;
   const Word16 f = extract_l(fraction);
+  // 0.1714 f^2 + 0.6675 f + 0.9980 fits 2^f over -1..0. The relative error is -0.27..0.37 %.
   Word32 polynomial = L_mult(flags, mult_r(flags, f, f), 5615);
   polynomial = L_mac(flags, polynomial, f, 21871);
   polynomial = L_add(flags, polynomial, L_deposit_h(32701));
   return exponent < 1 ? polynomial : L_shr(flags, polynomial, exponent);
 }
 
-/// 10^x in Q31 for x <= 0 in Q26; larger arguments have no defined result.
+/// 10^x in Q31 for x < 0 in Q26. For 0 it is one half; larger arguments have no defined result.
 inline Word32 fnExp10(Flags &flags, Word32 x) {
   constexpr Word16 kLog2Of10 = 27213;  // Q13
   return fnExp2(flags, L_shl(flags, L_mpy_ls(flags, x, kLog2Of10), 2));
 }
 
-/// sqrt(x) in Q15 for a normalised x in Q31 (0.5 <= x < 1): the Taylor series of sqrt(1 + 2h) to
-/// the fifth order with h = (x - 1) / 2,
-/// 1 + h - h^2/2 + h^3/2 - 5 h^4/8 + 7 h^5/8. Every power is rounded before the next.
+/// sqrt(x) in Q15 for a normalised x in Q31 (0.5 <= x < 1), by the Taylor series of sqrt(1 + 2h)
+/// with h = (x - 1) / 2: 1 + h - h^2/2 + h^3/2 - 5 h^4/8 + 7 h^5/8. Every power is rounded before
+/// the next. The error is below 0.0006.
 inline Word16 sqroot(Flags &flags, Word32 x) {
   const Word32 half = L_sub(flags, L_shr(flags, x, 1), 0x40000000);
   const Word16 h = extract_h(half);

@@ -3,7 +3,7 @@
 // Source: ITU-T G.191 Software Tool Library, basic operators, in their ITU-T G.729 form, and the
 // fixed-point helpers of TIA IS-127 (EVRC).
 //
-// An operator takes the flags that it reports to first; one without that parameter touches none.
+// An operator that reports takes its flags as the first argument; one without touches no flag.
 // Operators are templates over Flags and ZoltFlags; what is built on them takes Flags. Word16
 // values are Q15 and Word32 values Q31 where they are fractions. Shift counts may have any size and
 // give the mathematical result; a negative count shifts the other way.
@@ -30,7 +30,7 @@ constexpr Word16 abs_s(Word16 x) { return x < 0 ? negate(x) : x; }
 constexpr Word32 L_negate(Word32 x) { return x == MIN_32 ? MAX_32 : -x; }
 constexpr Word32 L_abs(Word32 x) { return x < 0 ? L_negate(x) : x; }
 
-// --- 16-bit arithmetic: the overflow flag is written either way ----------------------------------
+// --- 16-bit arithmetic: the overflow flag is set to 0 or 1 ---------------------------------------
 
 /// Saturates to 16 bits; the overflow flag becomes 1 if the value did not fit, else 0.
 template <class FlagSet>
@@ -63,7 +63,7 @@ inline Word16 mult_r(FlagSet &flags, Word16 a, Word16 b) {
   return sature(flags, (a * b + 0x4000) >> 15);
 }
 
-// --- 16-bit shifts: the overflow flag is only ever raised ----------------------------------------
+// --- 16-bit shifts: the overflow flag is only ever set ----------------------------------------
 
 /// x >> n for n >= 0; sign bits fill in.
 constexpr Word16 shift_right(Word16 x, Word32 n) {
@@ -106,7 +106,7 @@ inline Word16 shift_r(FlagSet &flags, Word16 x, Word32 n) {
   return add(flags, shift_right(x, -n), static_cast<Word16>(shift_right(x, -n - 1) & 1));
 }
 
-// --- 32-bit arithmetic: the overflow flag is only ever raised ------------------------------------
+// --- 32-bit arithmetic: the overflow flag is only ever set ------------------------------------
 
 template <class FlagSet>
 inline Word32 L_add(FlagSet &flags, Word32 a, Word32 b) {
@@ -159,7 +159,8 @@ inline Word16 msu_r(FlagSet &flags, Word32 sum, Word16 a, Word16 b) {
   return round_BOP(flags, L_msu(flags, sum, a, b));
 }
 
-// --- Arithmetic with carry: the result wraps, the flags tell -------------------------------------
+// --- Arithmetic with carry: the result wraps, the flags report it
+// ----------------------------------
 
 /// a + b + Carry modulo 2^32. Carry out is that of the unsigned sum.
 template <class FlagSet>
@@ -207,7 +208,7 @@ inline Word32 L_msuNs(FlagSet &flags, Word32 sum, Word16 a, Word16 b) {
   return L_sub_c(flags, sum, L_mult(flags, a, b));
 }
 
-/// After carry arithmetic: x, or if it overflowed the end of the range, clearing both flags.
+/// After carry arithmetic: x, or after an overflow the max or min, clearing both flags.
 template <class FlagSet>
 inline Word32 L_sat(FlagSet &flags, Word32 x) {
   if (flags.overflow == 0) return x;
@@ -268,7 +269,7 @@ constexpr Word16 norm_l(Word32 x) {
 }
 
 /// a / b in Q15, truncated, for 0 < a <= b; 0 for any other operands.
-/// A division that runs leaves the overflow flag 0, as its fifteen steps end in an `add`.
+/// For a < b the overflow flag becomes 0, as the fifteen steps of the division end in an `add`.
 template <class FlagSet>
 inline Word16 div_s(FlagSet &flags, Word16 a, Word16 b) {
   if (a <= 0 || a > b) return 0;

@@ -1,5 +1,5 @@
-// How the ZOLT_ copy departs from the standard operators: every deviation stands here, as an
-// overload for its flag set that takes the place of the template.
+// How the ZOLT_ copy departs from the standard operators: every deviation is here, as an overload
+// for ZoltFlags that replaces the template.
 //
 //  - its 16-bit arithmetic, its product and its rounding saturate silently; only L_sub, the carry
 //    operators, L_sat and sature report;

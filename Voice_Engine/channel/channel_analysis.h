@@ -1,12 +1,13 @@
-// What the voice detector and the single-channel suppressor have in common: a frame of
-// pre-emphasised samples, the energy of its frequency channels against a tracked noise energy, and
-// the decision whether the noise may be learnt from it.
+// What the voice detector and the single-channel suppressor share: they pre-emphasise and transform
+// a frame, compare the energy of its frequency channels with the noise estimate, and decide whether
+// to update that estimate from the frame.
 //
-// Source: TIA IS-127 (EVRC), noise suppression. Both widen it in their own way: what differs is
-// data in ChannelPlan, what is shared stands here once.
+// Source: TIA IS-127 (EVRC), noise suppression: channel energy and SNR estimator, voice metric,
+// spectral deviation estimator, noise update decision. Detector and suppressor extend it in
+// different ways; the differences are data in ChannelPlan.
 //
-// Energies are in units that do not depend on the block shift of a frame. Levels in dB are Q5,
-// relative to an energy of 256.
+// Energies do not depend on the block shift of a frame: 256 is a bin of power 1. Levels are in dB
+// relative to that, Q5.
 #pragma once
 
 #include "Voice_Engine/basic_op/flags.h"
@@ -14,10 +15,10 @@
 
 namespace orvalis {
 
-inline constexpr int kMostChannels = 21;
-inline constexpr int kMostFrameSamples = 160;
-inline constexpr int kMostOverlap = 48;
-inline constexpr int kMostTransformSize = 256;
+inline constexpr int kMaxChannels = 21;
+inline constexpr int kMaxFrameSamples = 160;
+inline constexpr int kMaxOverlap = 48;
+inline constexpr int kMaxTransformSize = 256;
 
 /// First and last bin of a channel, both included.
 struct ChannelBins {
@@ -35,20 +36,20 @@ struct ChannelScale {
 struct ChannelPlan {
   int channels;
   int frame_samples;
-  int overlap;  ///< samples of the previous frame that open the next one
+  int overlap;  ///< samples of the previous frame in front of this one
   const ChannelBins *bins;
   const ChannelScale *scales;
   const Word16 *window_edge;  ///< rising edge in Q15, `overlap` values
   Word32 window_flat_q15;     ///< between the edges; 32768 is 1
   const TransformPlan *transform;
   Word32 energy_floor;
-  int seeding_frames;      ///< first frames in which the noise follows the signal
-  bool scale_then_smooth;  ///< undo the block shift before, not after, the product with 0.55
-  Word16 loud_level_q5;    ///< level around which long-term smoothing slows down
-  Word16 metric_noise;     ///< voice metric up to which a frame is noise
-  Word32 energy_silent;    ///< total energy up to which nothing is learnt
-  Word16 deviation_voice;  ///< spectral deviation from which a frame is voice
-  bool remember_reset;     ///< hysteresis compares with the count after its reset
+  int initial_noise_frames;    ///< frames at the start whose energies become the noise
+  bool scale_then_smooth;      ///< undo the block shift before, not after, the product with 0.55
+  Word16 alpha_high_level_q5;  ///< E_H: level from which the long-term alpha is at its maximum
+  Word16 metric_noise;         ///< voice metric up to which a frame is noise
+  Word32 energy_silent;        ///< total energy up to which no forced update is counted
+  Word16 deviation_voice;      ///< spectral deviation from which a frame is voice
+  bool remember_reset;         ///< hysteresis compares with update_cnt after its reset, not before
 };
 
 /// The part of a user's state record that the analysis works on.
@@ -66,7 +67,7 @@ struct ChannelState {
   bool first_frame;
 };
 
-/// The analysed part of a state record whose other fields have the names of the channel analysis.
+/// The channel state inside a record whose fields have these names.
 template <class Record>
 inline ChannelState channels_of(Record &record, Word16 *overlap, Word32 frame_cnt) {
   return {.energy = record.ch_enrg,
@@ -84,19 +85,19 @@ inline ChannelState channels_of(Record &record, Word16 *overlap, Word32 frame_cn
 
 /// What one frame's analysis found.
 struct ChannelFindings {
-  Word16 shift;               ///< left shift that normalised the frame
-  Word16 snr[kMostChannels];  ///< channel SNR in steps of 3/8 dB, from 0
+  Word16 shift;              ///< left shift that normalised the frame
+  Word16 snr[kMaxChannels];  ///< channel SNR in steps of 3/8 dB, from 0
   Word16 voice_metric;
-  Word16 deviation_q5;
+  Word16 deviation_q5;  ///< long-term spectral deviation, the sum over all channels
   Word32 total_energy;
   Word64 unclamped_energy;  ///< sum of the channel energies before their floor
-  bool is_noise;            ///< the noise may be learnt from this frame
+  bool is_noise;            ///< IS-127's update_flag: the frame updates the noise
 };
 
 // --- Levels --------------------------------------------------------------------------------------
 
-/// 10 log10 as IS-127 has it, 10.03 in Q10: turns a log10 in Q26 into dB in Q21, and its high half
-/// into Q5.
+/// The 10 of 10 log10 in Q10, as IS-127 has it: 10.03, which is 0.3 % more than 10. Turns a log10
+/// in Q26 into dB in Q21, whose high half is Q5.
 inline constexpr Word16 kDecibels = 10270;
 
 /// log10(energy / 256) in Q26.
@@ -109,24 +110,25 @@ Word32 sum_energies(Flags &flags, const Word32 *energy, int channels);
 
 // --- The analysis --------------------------------------------------------------------------------
 
-/// In the first frames the noise is whatever there is, but not less than 4096.
-void seed_noise(const ChannelPlan &plan, ChannelState &state);
+/// In the first frames the noise is the channel energy, but at least 4096.
+void initialise_noise(const ChannelPlan &plan, ChannelState &state);
 
-/// Share of the past in the long-term levels, Q15: 0.5 for loud frames, 0.99 for quiet ones.
-Word16 long_term_share(Flags &flags, const ChannelPlan &plan, Word32 total);
+/// Alpha of the long-term levels, the weight of the past: 0.99 for loud frames, 0.5 for those that
+/// are 20 dB quieter.
+Word16 long_term_alpha_q15(Flags &flags, const ChannelPlan &plan, Word32 total);
 
-/// Whether the noise may be learnt from a frame, with the counters that force it when the spectrum
-/// stays the same for 50 frames, and the hysteresis that forgets a broken count.
+/// The noise update decision. A spectrum that stays the same for 50 frames forces an update; the
+/// hysteresis resets that count after 7 frames in which it stood still.
 bool decide_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state,
                   const ChannelFindings &found);
 
-/// Analyses a frame of plan.frame_samples: normalises it, puts the previous frame's overlap before
-/// it, pre-emphasises, windows and transforms it to a `spectrum` of plan.transform->size values.
+/// Normalises a frame of plan.frame_samples, puts the previous frame's overlap in front of it,
+/// pre-emphasises, windows and transforms it to a `spectrum` of plan.transform->size values.
 /// Updates energies, long-term levels and counters and, in the first frames, the noise.
 ChannelFindings analyse_frame(Flags &flags, const ChannelPlan &plan, ChannelState &state,
                               const Word16 *frame, Word16 *spectrum);
 
-/// Learns the noise from a frame: 0.9 of the past and 0.1 of the present.
+/// Updates the noise: 0.9 of the past and 0.1 of this frame.
 void track_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state);
 
 }  // namespace orvalis

@@ -52,8 +52,8 @@ constexpr std::array<Word16, kLength> make_window_edge(double full_scale) {
   return edge;
 }
 
-// Only the wide-band detector's edge is made from 32768. Between its edges a detector's window is
-// 32767, not 1, which takes one unit off samples beyond half scale.
+// Only the wide-band detector's edge has a full scale of 32768. Between the edges the detector's
+// windows are 32767, not 1, which lowers samples beyond half scale by one unit.
 constexpr auto window_vad_WB = make_window_edge<48>(32768);
 constexpr auto window_vad_NB = make_window_edge<24>(32767);
 constexpr auto window = make_window_edge<48>(32767);
@@ -70,9 +70,9 @@ constinit const ChannelPlan kWideBandDetection = {
     .window_flat_q15 = 32767,
     .transform = &kWideTransform,
     .energy_floor = 12,
-    .seeding_frames = 10,
+    .initial_noise_frames = 10,
     .scale_then_smooth = false,
-    .loud_level_q5 = 1638,
+    .alpha_high_level_q5 = 1638,  // 51.2 dB
     .metric_noise = 68,
     .energy_silent = 252,
     .deviation_voice = 2000,
@@ -89,9 +89,9 @@ constinit const ChannelPlan kNarrowBandDetection = {
     .window_flat_q15 = 32767,
     .transform = &kNarrowTransform,
     .energy_floor = 16,
-    .seeding_frames = 10,
+    .initial_noise_frames = 10,
     .scale_then_smooth = false,
-    .loud_level_q5 = 1600,
+    .alpha_high_level_q5 = 1600,  // 50 dB
     .metric_noise = 45,
     .energy_silent = 256,
     .deviation_voice = 896,
@@ -108,9 +108,9 @@ constinit const ChannelPlan kSuppression = {
     .window_flat_q15 = 32768,
     .transform = &kSuppressionTransform,
     .energy_floor = 16,
-    .seeding_frames = 4,
+    .initial_noise_frames = 4,
     .scale_then_smooth = true,
-    .loud_level_q5 = 1920,
+    .alpha_high_level_q5 = 1920,  // 60 dB
     .metric_noise = 42,
     .energy_silent = 320,
     .deviation_voice = 896,

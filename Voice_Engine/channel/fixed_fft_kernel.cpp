@@ -43,7 +43,7 @@ inline Word32 butterfly(Word16 *upper, Word16 *lower, Word16 c, Word16 s) {
   return last_sum;
 }
 
-/// The complex transform. Returns the last sum, unsaturated: all that the flag will tell of it.
+/// The complex transform. Returns the last sum, unsaturated: the only one that the flag will show.
 template <Direction kDirection>
 Word32 complex_stages(Word16 *x, const TransformPlan &plan) {
   bit_reverse(x, plan.size);
@@ -77,7 +77,8 @@ inline void split_pair(Flags &flags, Word16 *low, Word16 *high, const Word16 *lo
   const Word16 odd_re = kForward ? odd_sum : negate(odd_sum);
   const Word16 odd_im = kForward ? odd_difference : negate(odd_difference);
 
-  // The odd part, turned by +-k / N of a circle: `across` terms change sign with the direction.
+  // The odd part, rotated by +-k / N of a turn. The sign of the second product follows the
+  // direction.
   const auto turned = [&](Word16 along, Word16 across, const Word16 *twiddle, bool plus) {
     const Word32 first = L_mult(flags, along, twiddle[0]);
     const Word32 second = L_mult(flags, across, twiddle[1]);
@@ -88,7 +89,7 @@ inline void split_pair(Flags &flags, Word16 *low, Word16 *high, const Word16 *lo
   low[0] = rounded_half(flags, re, turned(odd_re, odd_im, low_twiddle, false));
   low[1] = rounded_half(flags, im, turned(odd_im, odd_re, low_twiddle, true));
   high[0] = rounded_half(flags, re, turned(odd_re, odd_im, high_twiddle, true));
-  // Not `turned` negated in both directions: the forward sum saturates after the change of sign.
+  // `turned` negated would not do: the forward sum saturates after the change of sign.
   const Word32 along = L_mult(flags, odd_im, high_twiddle[0]);
   const Word32 across = L_mult(flags, odd_re, high_twiddle[1]);
   const Word32 mirrored =

@@ -25,7 +25,7 @@ constexpr Table<kSize> make_twiddles(ToWord to_word) {
   return table;
 }
 
-// The two families are bit-exact to tables that were made in different ways.
+// Detector and suppressor round their tables differently, and every bit counts.
 constexpr auto kRounded = [](double x) { return rounded_word16(32768 * x); };
 constexpr auto kTruncated = [](double x) { return static_cast<Word16>(32767 * x); };
 

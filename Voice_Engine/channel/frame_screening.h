@@ -1,5 +1,5 @@
-// Screening that both frame drivers do before they work on a frame: null audio is left out, and the
-// suppressor waits until the level of the input has settled.
+// What both frame drivers check before they process a frame: null audio is skipped, and suppression
+// waits until the level of the input has settled.
 #pragma once
 
 #include "Voice_Engine/basic_op/word.h"
@@ -10,11 +10,11 @@ namespace orvalis {
 /// Whether a frame holds more than 60 zeros in a row. Non-zero samples of magnitude up to 4 are
 /// added to `small_samples`; the scan ends with the 61st zero.
 inline bool is_null_frame(const Word16 *frame, int samples, Word32 &small_samples) {
-  constexpr int kMostZeros = 60;
+  constexpr int kMaxZeros = 60;
   int zeros = 0;
   for (int i = 0; i < samples; ++i) {
     if (frame[i] == 0) {
-      if (++zeros > kMostZeros) return true;
+      if (++zeros > kMaxZeros) return true;
     } else {
       zeros = 0;
       if (frame[i] >= -4 && frame[i] <= 4) count_up(small_samples);
@@ -23,13 +23,13 @@ inline bool is_null_frame(const Word16 *frame, int samples, Word32 &small_sample
   return false;
 }
 
-/// Texts with which a driver logs that it holds suppression back.
+/// What a driver logs while suppression waits.
 struct SettlingTexts {
   const char *abnormal;
   const char *waiting;
 };
 
-/// Value of the settling counter from which on audio counts as settled for good.
+/// Value of the settling counter from which audio counts as settled for good.
 inline constexpr Word16 kSettled = 3;
 
 /// Samples after which audio counts as settled whatever it holds.

@@ -14,10 +14,10 @@ namespace {
 
 constexpr Word32 kRate = 16000;
 constexpr Word16 kLoudMagnitude = 8192;  // a quarter of full scale
-constexpr Word32 kMostLoudSamples = 100;
+constexpr Word32 kMaxLoudSamples = 100;
 
-/// Q11, by the peak in 63rds of full scale: 2048 (63 / i)^(2/3), which compresses 3:1, but +12 dB
-/// at most.
+/// Gains in Q11 by the peak in 63rds of full scale: 2048 (63 / i)^(2/3), which compresses 3:1, up
+/// to +12 dB.
 constexpr Word16 kGainCurve[64] = {
     8153, 8153, 8153, 8153, 8153, 8153, 8153, 8153, 8106, 7494, 6986, 6556, 6186, 5865, 5582, 5331,
     5107, 4904, 4721, 4554, 4401, 4260, 4130, 4009, 3897, 3793, 3695, 3603, 3517, 3435, 3358, 3286,
@@ -65,8 +65,8 @@ DrcInstance *initRecDynamicsControlParameter(Word32 samplingRate, Word16 frameLe
   drc->samplingRate = samplingRate;
   drc->frameLength = frameLength;
   drc->outputScale = outputScale;
-  drc->riseCoefficient = 164;
-  drc->fallCoefficient = 10;
+  drc->riseCoefficient = 164;  // 0.005: a time constant of 12.5 ms
+  drc->fallCoefficient = 10;   // 0.0003: 0.2 s
   drc->gainCurve = kGainCurve;
   return drc;
 }
@@ -104,9 +104,9 @@ Word32 EnvBasedDynamicsControl(Flags &flags, DrcInstance *drc, Word16 *frame) {
   close_dump(before);
   write_dump(after, frame, drc->frameLength);
   close_dump(after);
-  // The newest frame stands in the ring and counts once more.
+  // The newest frame is in the ring and counts once more.
   const Word32 recent = std::accumulate(std::begin(drc->loudRing), std::end(drc->loudRing), loud);
-  return recent > kMostLoudSamples ? 1 : 0;
+  return recent > kMaxLoudSamples ? 1 : 0;
 }
 
 Word16 DetectPeakVal(const Word16 *samples, Word16 count, Word16 *loud) {

@@ -7,7 +7,7 @@
 
 #include "Voice_Engine/basic_op/flags.h"
 
-/// Everything that one dynamics control knows. All zero but for what creation sets.
+/// The state of one dynamics control. All zero but for what creation sets.
 struct DrcInstance {
   orvalis::Word32 firstCallLogged;   ///< 0 until the first frame has logged its line
   orvalis::Word32 pcmDumpEnabled;    ///< dump files are written only when this is 1

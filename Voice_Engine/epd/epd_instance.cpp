@@ -14,7 +14,7 @@ namespace {
 
 constexpr char kInputSuffix[] = "_inputEPD.pcm";
 constexpr char kResultSuffix[] = "_resultEPD.pcm";
-constexpr Word32 kMostSmallSamples = 120;  // from here on audio counts as abnormal, at either rate
+constexpr Word32 kAbnormalSmallSamples = 120;  // from here audio counts as abnormal, at either rate
 constexpr SettlingTexts kSettlingTexts = {
     .abnormal = "TQE: Check Abnormal Audio ... dont do NS ... in EPD_Proc_Frame",
     .waiting =
@@ -48,9 +48,9 @@ void apply_input_gain(Word32 gain_mode, Word16 *frame, Word32 length) {
   }
 }
 
-/// Counts the frames since the last speech and logs the hangover, which is the caller's to keep.
-void note_hangover(EpdInstance &epd, Word32 answer) {
-  if (answer == kSpeech) {
+/// Counts the frames since the last speech and logs the hangover, which is up to the caller.
+void note_hangover(EpdInstance &epd, Word32 decision) {
+  if (decision == kSpeech) {
     epd.HANGframe = -1;
     return;
   }
@@ -69,28 +69,20 @@ void note_hangover(EpdInstance &epd, Word32 answer) {
   }
 }
 
-/// Judges one scaled frame and returns KEPD's answer. The decision hears the suppressed frame, the
-/// noise floor and the dump the unsuppressed one.
-Word32 answer_frame(EpdInstance *epd, Word16 *frame, bool suppresses, Word32 contentType,
-                    Flags &flags, Flags &ns_flags, EpdReasons &reasons) {
-  const Word32 length = frame_length(*epd);
-  Word16 unsuppressed[kMostFrameSamples];
-  std::copy_n(frame, length, unsuppressed);
-  if (suppresses) s1chns_C(ns_flags, &epd->suppressor, frame, frame);
-  if (dumps(*epd)) write_dump(epd->inputDumpFile, unsuppressed, length);
-
-  const Word32 answer =
-      KEPDfunc(flags, &epd, frame, static_cast<std::uint32_t>(contentType), reasons);
-  KEPDfunc_NoiseEstimation(&epd, unsuppressed, answer);
+/// What follows from the decision on a frame. Noise floor and dump take the frame as it was before
+/// suppression.
+void follow_decision(EpdInstance *epd, const Word16 *unsuppressed, Word32 decision,
+                     EpdReasons &reasons) {
+  KEPDfunc_NoiseEstimation(&epd, unsuppressed, decision);
   reasons.judged += 1;
   reasons.noiseFloor = epd->noise_floor.noise_energy;
-  note_hangover(*epd, answer);
-  if (dumps(*epd)) {
-    Word16 result[kMostFrameSamples];
-    std::fill_n(result, length, static_cast<Word16>(1000 * answer));
-    write_dump(epd->resultDumpFile, result, length);
-  }
-  return answer;
+  note_hangover(*epd, decision);
+  if (!dumps(*epd)) return;
+  const Word32 length = frame_length(*epd);
+  Word16 result[kMaxFrameSamples];
+  std::fill_n(result, length, static_cast<Word16>(1000 * decision));
+  write_dump(epd->inputDumpFile, unsuppressed, length);
+  write_dump(epd->resultDumpFile, result, length);
 }
 
 }  // namespace
@@ -134,21 +126,24 @@ Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Wor
   Word32 small_samples = 0;  // adds up over the frames of a call
   Word32 result = 0;
   for (Word32 rest = numSample; rest > 0; rest -= length, pcm += length) {
-    if (rest < length) return 0;  // whole frames only: this call is not counted
+    if (rest < length) return 0;  // a partial frame: the call's samples are not counted
     count_up(running, length);
     if (is_null_frame(pcm, length, small_samples)) {
       log_line(kLogDebug, kLogTag, "TQE: Null Check fail ... dont do EPD!");
       continue;
     }
-    Word16 frame[kMostFrameSamples];
-    std::copy_n(pcm, length, frame);
-    apply_input_gain(epd->inputGainMode, frame, length);
+    Word16 unsuppressed[kMaxFrameSamples];
+    std::copy_n(pcm, length, unsuppressed);
+    apply_input_gain(epd->inputGainMode, unsuppressed, length);
     const bool settled = audio_settled(abnormal_check_count, running, length,
-                                       small_samples < kMostSmallSamples, kSettlingTexts);
-    const bool suppresses = settled && epd->rateMode == 0;
-    const Word32 answer =
-        answer_frame(epd, frame, suppresses, contentType, *flags, *ns_flags, reasons);
-    if (answer != kNoSpeech) result = 1;
+                                       small_samples < kAbnormalSmallSamples, kSettlingTexts);
+    Word16 frame[kMaxFrameSamples];
+    std::copy_n(unsuppressed, length, frame);
+    if (settled && epd->rateMode == 0) s1chns_C(*ns_flags, &epd->suppressor, frame, frame);
+    const Word32 decision =
+        KEPDfunc(*flags, &epd, frame, static_cast<std::uint32_t>(contentType), reasons);
+    follow_decision(epd, unsuppressed, decision, reasons);
+    if (decision != kNoSpeech) result = 1;
   }
   epd->processedSamples = running;
   epd->abnormalCheckCount = abnormal_check_count;

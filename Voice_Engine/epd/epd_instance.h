@@ -1,5 +1,5 @@
-// The EPD instance: one record for each detector, and the driver that takes a caller's buffer
-// through screening, gain, suppression and decision, frame by frame.
+// The EPD instance: the record of one detector, and the driver that screens, scales and suppresses
+// a caller's buffer and decides on it, frame by frame.
 #pragma once
 
 #include <cstdio>
@@ -8,22 +8,22 @@
 #include "Voice_Engine/epd/velmora_vad.h"
 #include "Voice_Engine/ns/s1chns.h"
 
-/// Everything that one end-point detector knows. All zero but for what creation sets.
+/// The state of one end-point detector. All zero but for what creation sets.
 struct EpdInstance {
   orvalis::Word32 pcmDumpEnabled;      ///< dump files are written only when this is 1
   orvalis::Word32 epdMode;             ///< sub-mode, 0..3
   orvalis::Word32 rateMode;            ///< 0 is 16 kHz, any other 8 kHz
-  std::FILE *inputDumpFile;            ///< what was judged, or null
-  std::FILE *resultDumpFile;           ///< the answers, or null
+  std::FILE *inputDumpFile;            ///< frames before suppression, or null
+  std::FILE *resultDumpFile;           ///< the decisions, or null
   orvalis::Word32 hangLogEnabled;      ///< 0 between setLogging and the next reset
-  orvalis::Word32 inputGainMode;       ///< 1 divides by 4, 2 multiplies by 4, others leave
+  orvalis::Word32 inputGainMode;       ///< 1 divides by 4, 2 multiplies by 4
   orvalis::Word32 processedSamples;    ///< since creation, null frames included; saturates
   orvalis::Word16 abnormalCheckCount;  ///< settling counter, 0..3
   orvalis::Word32 HANGframe;           ///< frames since the last speech; -1 in speech
   orvalis::KepdState kepd;
   orvalis::NoiseFloorState noise_floor;
   orvalis::S1chnsState suppressor;
-  orvalis::S1chnsState secondary_suppressor;  ///< prepared by mode 4, run by nothing
+  orvalis::S1chnsState secondary_suppressor;  ///< prepared by mode 4, not used
   orvalis::VelmoraVadState vad;
 };
 
@@ -32,13 +32,13 @@ namespace orvalis {
 /// Creates an instance; null if memory runs out. Modes: see orvalis.h.
 EpdInstance *EPD_Create(Word32 mode, Word32 pcmDumpEnabled);
 
-/// Judges a buffer of whole frames: 1 if one was answered with speech or end of speech, else 0;
-/// 0 without storing the count if the buffer ends in a partial frame; -1 for a null instance.
-/// `reasons` are set to those of the last frame that was judged.
+/// Decides on a buffer of whole frames: 1 if the decision on one was speech or end of speech, else
+/// 0; 0 without counting the samples if the buffer ends in a partial frame; -1 for a null instance.
+/// `reasons` are those of the last frame that was no null audio.
 Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Word32 contentType,
                       EpdReasons &reasons);
 
-/// Forgets the open utterance and turns hangover lines on. Returns 0, or -1 for a null instance.
+/// Drops the open utterance and turns hangover lines on. Returns 0, or -1 for a null instance.
 Word32 reset_ALL_EPDparams(EpdInstance *epd);
 
 /// Turns hangover lines off until the next reset. Returns 0. The instance must not be null.

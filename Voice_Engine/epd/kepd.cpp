@@ -8,8 +8,8 @@
 namespace orvalis {
 namespace {
 
-constexpr Word32 kDeafFrames = 39;  // the first frames never count as voice
-constexpr Word32 kVoicedToForgetPause = 4;
+constexpr Word32 kInitialNoiseFrames = 39;  // which never count as voice
+constexpr Word32 kVoicedToClearPause = 4;
 constexpr Word32 kTrackedFrames = 45;  // frames of the noise history and of the speech mean
 constexpr float kGateScore = 0.84F;
 
@@ -22,7 +22,7 @@ void close_utterance(KepdState &kepd) {
   kepd.speech_frames = 0;
 }
 
-/// Moves onset, voiced run and pause by one frame's voice decision.
+/// Updates onset, voiced run and pause.
 void count_frame(KepdState &kepd, bool voiced, Word32 onset) {
   if (voiced) {
     count_up(kepd.onset_cnt);
@@ -37,13 +37,13 @@ void count_frame(KepdState &kepd, bool voiced, Word32 onset) {
   if (kepd.in_speech != 1 || !voiced) {
     kepd.voiced_run = 0;
     if (kepd.in_speech == 1) count_up(kepd.pause_cnt);
-  } else if (++kepd.voiced_run == kVoicedToForgetPause) {
+  } else if (++kepd.voiced_run == kVoicedToClearPause) {
     kepd.voiced_run = 0;
     kepd.pause_cnt = 0;
   }
 }
 
-/// The answer of one frame whose voice decision has been counted.
+/// The decision on a frame that has been counted.
 Word32 conclude(KepdState &kepd, const KepdTiming &timing) {
   if (kepd.pause_cnt >= timing.pause_limit) {
     if (kepd.speech_frames <= kShortUtterance) {
@@ -60,8 +60,8 @@ Word32 conclude(KepdState &kepd, const KepdTiming &timing) {
   return kEndOfSpeech;
 }
 
-/// Appends a frame's energy to the history and renews the noise floor. The old floor is part of
-/// the new mean.
+/// Appends a frame's energy to the history and updates the noise floor, whose previous value is
+/// part of the new mean.
 void track_noise_floor(NoiseFloorState &floor, float energy) {
   count_up(floor.noise_frames);
   float *const end = floor.energy_hist + kTrackedFrames;
@@ -76,13 +76,13 @@ void track_noise_floor(NoiseFloorState &floor, float energy) {
   floor.noise_energy = sum / static_cast<float>(std::min(floor.noise_frames, kTrackedFrames));
 }
 
-/// Adds a frame's energy to the speech mean, which the last one completes.
+/// Adds a frame's energy to the speech mean; the 45th frame completes it.
 void track_speech(NoiseFloorState &floor, float energy) {
   floor.speech_frames_ne += 1;
   floor.speech_energy += energy;
   if (floor.speech_frames_ne != kTrackedFrames) return;
   floor.speech_energy /= static_cast<float>(kTrackedFrames);
-  // Infinite or not a number over digital silence. Kept for whoever looks at the record.
+  // Infinite or not a number over digital silence. Only readers of the record use it.
   floor.speech_noise_ratio = floor.speech_energy / floor.noise_energy;
 }
 
@@ -114,7 +114,7 @@ Word32 decide(KepdState &kepd, bool voiced, std::uint32_t content_type, bool nar
               EpdReasons &reasons) {
   const KepdTiming timing = timing_of(content_type, narrow_band);
   count_up(kepd.frame_cnt);
-  reasons.voice = voiced && kepd.frame_cnt > kDeafFrames;
+  reasons.voice = voiced && kepd.frame_cnt > kInitialNoiseFrames;
   count_frame(kepd, reasons.voice != 0, timing.onset);
   reasons.onset = kepd.onset_cnt;
   reasons.onsetFrames = timing.onset;
@@ -134,12 +134,12 @@ Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::ui
   if (epd.noise_floor.speech_frames_ne == kTrackedFrames) {
     epd.noise_floor.speech_frames_ne += 1;
     epd.kepd.EnergyTHscore = kGateScore;
-    log_line(kLogInfo, kLogTag, "TQE: EnergyTHscore: %f", 0.84);
+    log_line(kLogInfo, kLogTag, "TQE: EnergyTHscore: %f", double{kGateScore});
   }
   return decide(epd.kepd, voice == 1, type, epd.rateMode != 0, reasons);
 }
 
-Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 /*answer*/) {
+Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 /*decision*/) {
   EpdInstance &epd = **handle;
   NoiseFloorState &floor = epd.noise_floor;
   if (floor.speech_frames_ne >= kTrackedFrames) return 0;

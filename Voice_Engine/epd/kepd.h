@@ -1,5 +1,5 @@
-// End-point decision (KEPD) and noise-floor tracking: from voice decisions per frame to the answers
-// no speech, speech, end of speech.
+// End-point decision (KEPD) and noise-floor tracking: from voice or no voice in each frame to no
+// speech, speech or end of speech.
 #pragma once
 
 #include <cstdint>
@@ -11,21 +11,21 @@ struct EpdInstance;
 
 namespace orvalis {
 
-/// Answers of KEPDfunc.
+/// Decisions of KEPDfunc.
 inline constexpr Word32 kNoSpeech = 0;
 inline constexpr Word32 kSpeech = 1;
 inline constexpr Word32 kEndOfSpeech = 2;
 
-/// Frames up to which an utterance is refused.
+/// Utterances of up to so many frames are refused as too short.
 inline constexpr Word32 kShortUtterance = 19;
 
 /// When an utterance begins and ends, in frames of 10 ms.
 struct KepdTiming {
   Word32 onset;        ///< voiced frames in a row that open it
   Word32 pause_limit;  ///< pause frames that close it
-  Word32 end_delay;    ///< frames that closing takes; the last is answered with end of speech
+  Word32 end_delay;    ///< frames that closing takes; the last one is end of speech
 
-  /// By how many frames the first and the last answer of speech come late.
+  /// By how many frames the first and the last decision for speech are late.
   constexpr Word32 start_lag() const { return onset - 1; }
   constexpr Word32 end_lag() const { return pause_limit + end_delay - 1; }
 };
@@ -49,7 +49,7 @@ struct KepdState {
   float EnergyTHscore;   ///< exponent of the detector's energy gate
 };
 
-/// Noise-floor tracking state, part of the EPD instance. Energies are mean squares over 100.
+/// Noise-floor tracking state, part of the EPD instance. Energies are mean squares / 100.
 struct NoiseFloorState {
   Word32 noise_frames;       ///< non-speech frames
   Word32 speech_frames_ne;   ///< speech frames, stops at 45; 46 once KEPD has seen that
@@ -66,26 +66,25 @@ Word32 InitKEPD(EpdInstance **handle);
 /// Clears the noise-floor state. Returns 0.
 Word32 InitNoiseEstimation(EpdInstance **handle);
 
-/// The answer of one frame from its voice decision, which does not count in the first 39 frames.
+/// The decision on a frame with or without voice; the first 39 frames never count as voice.
 /// `reasons` takes the decision and the counts that led to it.
 Word32 decide(KepdState &kepd, bool voiced, std::uint32_t content_type, bool narrow_band,
               EpdReasons &reasons);
 
-/// Detects the voice in one frame of the instance's length, and decides. Returns -1 for a null
-/// record.
+/// Detects voice in one frame and decides. Returns -1 for a null record.
 Word32 KEPDfunc(Flags &flags, EpdInstance **handle, const Word16 *frame, std::uint32_t type,
                 EpdReasons &reasons);
 
-/// Tracks the noise floor with the unsuppressed frame. The answer is not used. Returns 0.
-Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 answer);
+/// Tracks the noise floor with the unsuppressed frame. `decision` is not used. Returns 0.
+Word32 KEPDfunc_NoiseEstimation(EpdInstance **handle, const Word16 *frame, Word32 decision);
 
-/// Forgets the open utterance. Returns 0.
+/// Drops the open utterance. Returns 0.
 Word32 KEPDfunc_Reset(EpdInstance **handle);
 
-/// Holds nothing; returns 0.
+/// Releases nothing. Returns 0.
 Word32 CloseKEPD(EpdInstance **handle);
 
-/// Mean square over 100, of 320 (mode 2), 160 (mode 0) or 80 samples.
+/// Mean square / 100 of 320 (mode 2), 160 (mode 0) or 80 samples.
 float getAbsoluteEnergy(const Word16 *x, Word32 rateMode);
 
 }  // namespace orvalis

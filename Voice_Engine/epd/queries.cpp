@@ -7,6 +7,7 @@
 #include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 namespace orvalis {
+
 Word32 block_energy_db(const Word16 *x, Word32 n) {
   if (n < 1) return 0;
   Word32 sum = 0;
@@ -15,7 +16,7 @@ Word32 block_energy_db(const Word16 *x, Word32 n) {
     sum = wrapping_add(sum, x[i]);
     squares += static_cast<float>(x[i] * x[i]);
   }
-  // At most 2^30 whatever n: no addition rounds past the largest square.
+  // At most 2^30 for any n: rounding never carries the mean beyond the maximum square.
   const auto mean_square = static_cast<Word32>(squares / static_cast<float>(n));
   const auto mean = static_cast<std::uint32_t>(sum / n);
   const Word32 variance = wrapping_sub(mean_square, static_cast<Word32>(mean * mean));

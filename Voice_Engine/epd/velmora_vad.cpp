@@ -8,25 +8,25 @@
 namespace orvalis {
 namespace {
 
-constexpr Word32 kLeastVoiceEnergy = 300000;
+constexpr Word32 kMinVoiceEnergy = 300000;
 constexpr Word32 kFramesPerBlock = 25;
-constexpr Word32 kMostBlocks = 6;
+constexpr Word32 kMaxBlocks = 6;
 
 const ChannelPlan &plan_of(Word32 band) {
   return band == 0 ? kWideBandDetection : kNarrowBandDetection;
 }
 
-/// `level` raised to `score`. A level of 0 under a score of 0 has no power; its threshold is 0.
+/// `level` raised to `score`; 0 if both are 0, where the logarithm leaves no number.
 Word64 gate_threshold(Word64 level, float score) {
   const double logarithm = std::log10(static_cast<double>(level));
   const double threshold = std::pow(10.0, logarithm * static_cast<double>(score));
   return std::isnan(threshold) ? 0 : static_cast<Word64>(threshold);
 }
 
-/// Adds a voice frame to the gate's blocks; each complete block after the first moves its
+/// Adds a voice frame to the gate's current block; each complete block after the first moves the
 /// threshold.
 void learn_speech_level(VelmoraVadState &vad, float score) {
-  if (vad.blk_count >= kMostBlocks) return;
+  if (vad.blk_count >= kMaxBlocks) return;
   vad.blk_frames += 1;
   vad.blk_acc += vad.tot_enrg;
   if (vad.blk_frames != kFramesPerBlock) return;
@@ -64,15 +64,15 @@ Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Wo
   if (vad.vad_frame_cnt != MAX_16) vad.vad_frame_cnt += 1;
 
   ChannelState channels = channels_of(vad, vad.overlap, vad.vad_frame_cnt);
-  Word16 spectrum[kMostTransformSize];
+  Word16 spectrum[kMaxTransformSize];
   const ChannelFindings found = analyse_frame(flags, plan, channels, frame, spectrum);
   vad.tot_enrg = found.unclamped_energy;
-  if (vad.vad_frame_cnt <= plan.seeding_frames) {
+  if (vad.vad_frame_cnt <= plan.initial_noise_frames) {
     std::copy_n(vad.ch_enrg, plan.channels, vad.ch_enrg_init);
   }
   if (found.is_noise) track_noise(flags, plan, channels);
   vad.first_frame = 0;
-  vad.vad_flag = !found.is_noise && found.total_energy >= kLeastVoiceEnergy;
+  vad.vad_flag = !found.is_noise && found.total_energy >= kMinVoiceEnergy;
 
   reasons.noise = found.is_noise;
   reasons.voiceMetric = found.voice_metric;
@@ -80,7 +80,7 @@ Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Wo
   reasons.spectralDeviation = found.deviation_q5;
   reasons.spectralDeviationThreshold = plan.deviation_voice;
   reasons.channelEnergy = found.total_energy;
-  reasons.minChannelEnergy = kLeastVoiceEnergy;
+  reasons.minChannelEnergy = kMinVoiceEnergy;
   reasons.energy = vad.tot_enrg;
   reasons.energyGate = vad.energy_th;
   return vad.vad_flag;

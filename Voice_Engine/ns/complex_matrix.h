@@ -1,8 +1,8 @@
 // Algebra of 2x2 complex matrices in single precision, one frequency bin at a time.
 //
-// No routine conjugates: a Hermitian product takes an operand that its caller has conjugated.
-// Complex products are formed with a fused multiply-add each part; several products of one element
-// are formed so and then added. Nothing guards against a singular matrix.
+// No product conjugates: for a Hermitian one the caller conjugates an operand. Each part of a
+// complex product takes one fused multiply-add; sums of products are then added without. Nothing
+// guards against a singular matrix.
 #pragma once
 
 #include "Voice_Engine/ns/float_fft_kernel.h"
@@ -77,8 +77,8 @@ ORVALIS_KERNEL Matrix inv_matrix(const Matrix &a) {
 
 /// Coefficients of the parametric multichannel Wiener filter from m = Phi_vv^-1 Phi_yy:
 /// (m - I) conj(d) / (|d|^2 + 1) with d = beta + tr(m) - 2. The first column is the filter that
-/// estimates the speech at the first microphone. beta trades distortion for suppression. The 1
-/// beside |d|^2 bounds the coefficients where d is small.
+/// estimates the speech at the first microphone. beta trades distortion for suppression. The added
+/// 1 bounds the coefficients where d is small.
 /// Source: M. Souden, J. Benesty, S. Affes, "On optimal frequency-domain multichannel linear
 /// filtering for noise reduction", 2010.
 ORVALIS_KERNEL Matrix compute_PMWF_coeff(const Matrix &m, float beta) {
@@ -95,8 +95,7 @@ ORVALIS_KERNEL Matrix compute_PMWF_coeff(const Matrix &m, float beta) {
           coefficient(m.m22 - one)};
 }
 
-/// A matrix for each bin, in split form: four real parts a bin, row by row, and four imaginary
-/// ones.
+/// A matrix for each bin, its four elements row by row, real and imaginary parts apart.
 struct Matrices {
   float re[4 * kTransformBins];
   float im[4 * kTransformBins];

@@ -61,8 +61,8 @@ ORVALIS_KERNEL void complex_transform(Spectrum &data, Direction direction) {
   }
 }
 
-/// Half of sum + twiddle * difference, where z and mirror are bins k and 256 - k: what turns a
-/// transform of sample pairs into one of samples, and back.
+/// (z + mirror* + twiddle (z - mirror*)) / 2 of bins k and 256 - k: turns a transform of sample
+/// pairs into one of samples, and back.
 ORVALIS_KERNEL Complex<float> split(Complex<double> z, Complex<double> mirror,
                                     Complex<double> twiddle) {
   const auto turned = wide_product({z.re - mirror.re, z.im + mirror.im}, twiddle);
@@ -78,7 +78,7 @@ ORVALIS_KERNEL void real_transform(Spectrum &data, Direction direction) {
     const unsigned mirrored = kTransformBins - k;
     const auto z = widened(data[k]);
     const auto mirror = widened(data[mirrored]);
-    // Forward the odd samples' half turns by -i W, back by its conjugate.
+    // The odd samples' part is rotated by -i W forward, by its conjugate back.
     const auto quarter_turned = [forward](Complex<double> w) -> Complex<double> {
       return forward ? Complex<double>{w.im, -w.re} : Complex<double>{w.im, w.re};
     };

@@ -12,7 +12,7 @@ namespace {
 
 constexpr char kInputSuffix[] = "_beforeNS.pcm";
 constexpr char kResultSuffix[] = "_afterNS.pcm";
-constexpr Word32 kRefused = 0;  // a frame length that is none
+constexpr Word32 kUnsupported = 0;  // a frame length: one microphone at 8 kHz
 constexpr SettlingTexts kSettlingTexts = {
     .abnormal = "TQE: Check Abnormal Audio ... dont do NS ... in DoNS_Proc_Frame",
     .waiting =
@@ -28,7 +28,7 @@ Word32 frame_length(const NsInstance &ns) {
     case 0:
       return 160;
     case 1:
-      return kRefused;
+      return kUnsupported;
     case 2:
       return 320;
     default:
@@ -93,7 +93,7 @@ Word32 DO_NS_Proc_Frame(NsInstance *ns, S2chnsState &pair, Word16 *in, Word32 nu
                         Word32 numOut) {
   if (ns == nullptr || numIn != numOut) return -1;
   const Word32 length = frame_length(*ns);
-  if (length == kRefused) return -1;
+  if (length == kUnsupported) return -1;
   if (numIn % length != 0) {
     log_line(kLogError, kLogTag, "TQE: Check pcm buffer size : numInSample = %d, PCM_LEN = %d",
              numIn, length);
@@ -103,7 +103,7 @@ Word32 DO_NS_Proc_Frame(NsInstance *ns, S2chnsState &pair, Word16 *in, Word32 nu
   const DumpFilesPresent dump_files(dumps(*ns), ns, kInputSuffix, kResultSuffix);
   PublishedFlags<NsCopy> flags;
 
-  const Word32 most_small_samples = 3 * length / 4;
+  const Word32 abnormal_small_samples = 3 * length / 4;
   Word32 small_samples = 0;  // adds up over the frames of a call
   for (Word32 rest = numIn; rest > 0; rest -= length, in += length, out += length) {
     if (dumps(*ns)) write_dump(ns->inputDumpFile, in, length);
@@ -112,7 +112,7 @@ Word32 DO_NS_Proc_Frame(NsInstance *ns, S2chnsState &pair, Word16 *in, Word32 nu
       log_line(kLogDebug, kLogTag, "TQE: Audio Null Check fail ... dont do NS !");
       continue;
     }
-    const bool is_normal = small_samples < most_small_samples;
+    const bool is_normal = small_samples < abnormal_small_samples;
     if (!audio_settled(ns->abnormalCheckCount, ns->processedSamples, length, is_normal,
                        kSettlingTexts))
       continue;

@@ -12,41 +12,45 @@ namespace {
 constexpr int kFrame = 160;
 constexpr int kSynthesisOverlap = 96;
 constexpr int kBins = 128;
-// Room for a spectrum whose parts add up; impulses may still saturate in the inverse transform.
+// The inverse transform adds up without scaling; impulses may saturate even so.
 constexpr Word16 kSynthesisHeadroom = 4;
 constexpr Word16 kDeEmphasis = 26214;  // 0.8 in Q15
 
-/// Lowers the SNR indices of frames that hold little speech, so that single channels do not ring.
-void calm_channels(Word16 *snr, Word16 voice_metric) {
-  constexpr Word16 kSpeechLike = 12;
-  constexpr Word16 kKept = 13;
-  constexpr Word16 kLeastMetric = 56;
-  const auto speech_like = std::count_if(snr, snr + kSuppressionChannels,
-                                         [](Word16 index) { return index >= kSpeechLike; });
-  if (speech_like >= 5) return;
+/// IS-127's SNR modification: lowers the SNR indices of a frame in which few channels hold speech,
+/// so that single channels do not sound as musical noise.
+void modify_snr(Word16 *snr, Word16 voice_metric) {
+  constexpr Word16 kIndexThreshold = 12;
+  constexpr int kIndexCountThreshold = 5;
+  constexpr Word16 kMetricThreshold = 56;
+  constexpr Word16 kSetbackThreshold = 13;
+  const auto index_count = std::count_if(snr, snr + kSuppressionChannels,
+                                         [](Word16 index) { return index >= kIndexThreshold; });
+  if (index_count >= kIndexCountThreshold) return;
   for (int i = 0; i < kSuppressionChannels; ++i) {
-    if (voice_metric < kLeastMetric || snr[i] < kKept) snr[i] = 1;
+    if (voice_metric < kMetricThreshold || snr[i] < kSetbackThreshold) snr[i] = 1;
   }
 }
 
-/// Gain of a channel in Q15 from its SNR index and the overall gain in dB, Q21.
+/// Gain of a channel in Q15: the overall gain in dB, Q21, and 0.454 dB for each step of the SNR
+/// index above 6, at most 0 dB.
 Word16 channel_gain(Flags &flags, Word16 snr, Word32 base_q21, Word16 slope_q15) {
-  constexpr Word16 kLeastSnr = 6;
-  constexpr Word16 kGainPerStep = 14879;  // 0.454 dB, in Q21 after L_mult and L_shl
-  const Word16 steps = sub(flags, std::max(snr, kLeastSnr), kLeastSnr);
+  constexpr Word16 kMinSnr = 6;
+  constexpr Word16 kGainPerStep = 14879;  // 0.454 in Q15: L_mult and L_shl by 5 make it Q21
+  const Word16 steps = sub(flags, std::max(snr, kMinSnr), kMinSnr);
   const Word32 rise = L_shl(flags, L_mult(flags, steps, kGainPerStep), 5);
   const Word32 gain_q21 = std::min(L_add(flags, rise, base_q21), Word32{0});
   Word32 exponent_q26 = L_shl(flags, L_mpy_ls(flags, gain_q21, slope_q15), 5);
-  if (exponent_q26 == 0) exponent_q26 = -1;  // fnExp10 is at its best below 0
+  if (exponent_q26 == 0) exponent_q26 = -1;  // fnExp10(0) is one half
   return extract_h(fnExp10(flags, exponent_q26));
 }
 
-/// Sets the gains of all bins.
-void set_gains(Flags &flags, S1chnsState &ns, ChannelFindings &found) {
+/// The gains of all bins. The overall gain is the reciprocal of the noise, but not below the
+/// floor.
+void compute_gains(Flags &flags, S1chnsState &ns, ChannelFindings &found) {
   const Word32 noise = sum_energies(flags, ns.ch_noise, kSuppressionChannels);
   const Word32 noise_level = L_negate(log10_energy(flags, noise));
   const Word32 base_q21 = std::max(L_mpy_ls(flags, noise_level, kDecibels), ns.min_gain_q21);
-  calm_channels(found.snr, found.voice_metric);
+  modify_snr(found.snr, found.voice_metric);
   for (int i = 0; i < kSuppressionChannels; ++i) {
     const Word16 gain = channel_gain(flags, found.snr[i], base_q21, ns.gain_slope_q15);
     const ChannelBins bins = kSuppression.bins[i];
@@ -54,12 +58,11 @@ void set_gains(Flags &flags, S1chnsState &ns, ChannelFindings &found) {
   }
 }
 
-/// Brings a spectrum that is scaled by 2^shift back to samples.
+/// Transforms a spectrum back to samples and undoes its block shift.
 void synthesise(Flags &flags, Word16 *buffer, Word16 shift) {
-  const Word16 spectrum_shift =
-      block_norm_AL(flags, buffer, kMostTransformSize, kSynthesisHeadroom);
+  const Word16 spectrum_shift = block_norm_AL(flags, buffer, kMaxTransformSize, kSynthesisHeadroom);
   real_fft(flags, buffer, Direction::kInverse, *kSuppression.transform);
-  block_denorm_AL(flags, buffer, kMostTransformSize, add(flags, shift, spectrum_shift));
+  block_denorm_AL(flags, buffer, kMaxTransformSize, add(flags, shift, spectrum_shift));
 }
 
 void overlap_add(Flags &flags, Word16 *buffer, Word16 *tail) {
@@ -108,9 +111,9 @@ void s1chns_C(Flags &flags, S1chnsState *state, Word16 *in, Word16 *out) {
   if (ns.frame_cnt != MAX_16) ns.frame_cnt += 1;
 
   ChannelState channels = channels_of(ns, ns.analysis_overlap, ns.frame_cnt);
-  Word16 buffer[kMostTransformSize];
+  Word16 buffer[kMaxTransformSize];
   ChannelFindings found = analyse_frame(flags, plan, channels, in, buffer);
-  set_gains(flags, ns, found);
+  compute_gains(flags, ns, found);
   if (found.is_noise) track_noise(flags, plan, channels);
 
   for (int k = 0; k < kBins; ++k) {

@@ -15,7 +15,7 @@ inline constexpr int kSuppressionChannels = 20;
 struct S1chnsState {
   Word32 frame_cnt;                              ///< frames processed, stops at 32767
   Word16 first_frame;                            ///< 1 until the first frame is done
-  Word16 gain_slope_q15;                         ///< 1/20: dB of gain to log10 of amplitude
+  Word16 gain_slope_q15;                         ///< 1/20: from dB to log10 of the amplitude
   Word16 init_mode;                              ///< argument of S1CHNSInit
   Word16 pre_emp_mem;                            ///< last normalised input sample
   Word16 de_emp_mem;                             ///< last output sample
@@ -26,7 +26,7 @@ struct S1chnsState {
   Word32 min_gain_q21;                           ///< gain floor in dB
   Word16 synthesis_overlap[96];                  ///< tail of the previous inverse transform
   Word16 bin_gain_q15[128];                      ///< gain of each bin; the top two stay 0
-  Word16 analysis_overlap[kMostOverlap];         ///< last pre-emphasised samples
+  Word16 analysis_overlap[kMaxOverlap];          ///< last pre-emphasised samples
   Word32 ch_enrg[kSuppressionChannels];          ///< smoothed channel energies
   Word32 ch_noise[kSuppressionChannels];         ///< channel noise energies
   Word16 prev_shift;                             ///< block shift of the previous frame

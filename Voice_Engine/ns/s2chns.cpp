@@ -10,21 +10,27 @@
 namespace orvalis {
 namespace {
 
-constexpr double cov_smoothing = 0.61;
-constexpr float pmwf_beta = 3.0;
+// The time constant of a smoothing factor alpha is -10 ms / ln(alpha).
+constexpr double cov_smoothing = 0.61;  // alpha of Phi_yy: 20 ms
+constexpr double kAlphaV = 0.92;        // alpha of Phi_vv where p is 0: 120 ms
+constexpr double kAlphaP = 0.6;         // alpha of p: 20 ms
+
+constexpr float pmwf_beta = 3.0;      // of the filter: trades distortion for suppression
+constexpr float output_gain = 0.2F;   // the filter lowers a bin by 14 dB at most
+constexpr int kReach = 15;            // bins to either side in the local average
+constexpr int kMinMagnitudes = 1600;  // a mean magnitude of 10 in channel 0
+constexpr Word32 kBadLength = -100;
+
+// Thresholds of the decisions whose product is q. From snr_low_threshold on, gamma or its mean
+// rules noise alone out (of Gaussian noise with a known covariance, 3.4 % of the bins reach it).
+// Below, snr_high_threshold is the trace of Phi_vv^-1 Phi_yy from which on a bin holds speech for
+// sure.
 constexpr double snr_low_threshold = 5.2;
 constexpr double snr_high_threshold = 23.1;
-constexpr float output_gain = 0.2F;
-
-constexpr int kLeastMagnitudes = 1600;  // a mean magnitude of 10 in channel 0
-constexpr int kReach = 15;              // bins to either side in the local average
-constexpr double kLeastNoiseMemory = 0.92;
-constexpr double kAbsenceMemory = 0.6;
-constexpr Word32 kBadLength = -100;
 
 /// Square-root Hann window. Its index lags by one, so that the first two entries are the same.
 constexpr std::array<float, kWindow> make_sqrt_hann_window() {
-  constexpr double kPi = 3.1415926535;
+  constexpr double kPi = 3.1415926535;  // ten digits on purpose: results are bit-exact to them
   std::array<float, kWindow> window{};
   for (int k = 0; k < kWindow; ++k) {
     const double sine = constexpr_math::sin_of((k - 0.5) * kPi / kWindow);
@@ -35,15 +41,14 @@ constexpr std::array<float, kWindow> make_sqrt_hann_window() {
 
 constexpr auto sqrt_hann_window = make_sqrt_hann_window();
 
-/// keep * old + (1 - keep) * now.
-ORVALIS_KERNEL float smoothed(double keep, float old, float now) {
-  return static_cast<float>(keep * old + (1.0 - keep) * now);
+ORVALIS_KERNEL float smoothed(double alpha, float past, float present) {
+  return static_cast<float>(alpha * past + (1.0 - alpha) * present);
 }
 
-ORVALIS_KERNEL void smooth(Matrices &covariance, int bin, double keep, const Matrices &now) {
+ORVALIS_KERNEL void smooth(Matrices &covariance, int bin, double alpha, const Matrices &present) {
   for (int i = 4 * bin; i < 4 * bin + 4; ++i) {
-    covariance.re[i] = smoothed(keep, covariance.re[i], now.re[i]);
-    covariance.im[i] = smoothed(keep, covariance.im[i], now.im[i]);
+    covariance.re[i] = smoothed(alpha, covariance.re[i], present.re[i]);
+    covariance.im[i] = smoothed(alpha, covariance.im[i], present.im[i]);
   }
 }
 
@@ -55,14 +60,14 @@ struct Spectra {
   ORVALIS_KERNEL Pair Y(int bin) const { return {first[bin], second[bin]}; }
 };
 
-/// What tells speech from noise in the bins of a frame.
-struct Ratios {
-  float gamma[kTransformBins];  ///< a posteriori ratio
-  float r[kTransformBins];      ///< trace of Phi_vv^-1 Phi_yy; r - 2 is the a priori ratio
-  float beta[kTransformBins];   ///< power of the speech behind the noise's inverse
+/// The statistics of each bin on which the probability of speech depends.
+struct Statistics {
+  float gamma[kTransformBins];  ///< a posteriori SNR: Y^H Phi_vv^-1 Y
+  float trace[kTransformBins];  ///< of Phi_vv^-1 Phi_yy: 2 above the a priori SNR xi
+  float beta[kTransformBins];   ///< Y^H Phi_vv^-1 Phi_xx Phi_vv^-1 Y
 };
 
-/// The spectrum of a channel's previous and new frame under the window; the new frame becomes the
+/// The spectrum of a channel's previous and new frame under the window. Keeps the new frame as the
 /// previous one.
 ORVALIS_KERNEL Spectrum analyse(float *frame_history, const float *frame) {
   float analysis_frame[kTransformSamples];
@@ -96,7 +101,7 @@ ORVALIS_KERNEL void synthesise(Spectrum &spectrum, float *overlap_tail, Word16 *
   buffercopy(synthesis_buffer + kHop, overlap_tail, kHop);
 }
 
-/// The phase of y with another magnitude.
+/// A bin with the phase of y and the given magnitude.
 ORVALIS_KERNEL Bin with_magnitude(Bin y, float magnitude) {
   const Complex<double> wide = widened(y);
   const double own = std::sqrt(wide.re * wide.re + wide.im * wide.im);
@@ -104,7 +109,7 @@ ORVALIS_KERNEL Bin with_magnitude(Bin y, float magnitude) {
   return rounded({magnitude * wide.re / own, magnitude * wide.im / own});
 }
 
-/// The first frames take all audio as noise, and put out the first channel, lowered.
+/// An initial frame: it counts as noise, and the output is the first channel at 0.2 of its level.
 ORVALIS_KERNEL Spectrum warm_up(S2chnsState &state, const Spectra &frame) {
   if (state.frame_count == 0) state.Phi_yy = state.Phi_vv = frame.YY;
   bufferreset(state.spp_smoothed, kTransformBins);
@@ -127,8 +132,9 @@ ORVALIS_KERNEL float quadratic_form(const Pair &Y, const Matrix &a) {
   return mul_1by2_2by1_matrix(mul_1by2_2by2_matrix(conj(Y), a), Y).re;
 }
 
-/// The ratios for the noise covariance as it stands.
-ORVALIS_KERNEL void form_ratios(const S2chnsState &state, const Spectra &frame, Ratios &ratios) {
+/// The statistics for the noise covariance as it stands.
+ORVALIS_KERNEL void compute_statistics(const S2chnsState &state, const Spectra &frame,
+                                       Statistics &statistics) {
   for (int k = 0; k < kTransformBins; ++k) {
     const Pair Y = frame.Y(k);
     const Matrix Phi_yy = state.Phi_yy.load(k);
@@ -137,22 +143,22 @@ ORVALIS_KERNEL void form_ratios(const S2chnsState &state, const Spectra &frame, 
     const Matrix Phi_vv_inv = inv_matrix(Phi_vv);
     const Matrix M = mul_2by2_matrix(Phi_vv_inv, Phi_yy);
     const Matrix N = mul_2by2_matrix(mul_2by2_matrix(Phi_vv_inv, Phi_xx), Phi_vv_inv);
-    ratios.gamma[k] = quadratic_form(Y, Phi_vv_inv);
-    ratios.r[k] = M.m11.re + M.m22.re;
-    ratios.beta[k] = quadratic_form(Y, N);
+    statistics.gamma[k] = quadratic_form(Y, Phi_vv_inv);
+    statistics.trace[k] = M.m11.re + M.m22.re;
+    statistics.beta[k] = quadratic_form(Y, N);
   }
 }
 
-/// How much a bin by itself looks like noise: 1 is noise alone.
-ORVALIS_KERNEL float local_soft_decision(float r, float gamma) {
-  constexpr double kNoSpeech = 2.0;  // the trace of the identity
+/// From 1 where a bin by itself looks like noise alone to 0 where it does not.
+ORVALIS_KERNEL float local_soft_decision(float trace, float gamma) {
+  constexpr double kNoSpeech = 2.0;  // the trace of the identity: xi is 0
   if (!(gamma < snr_low_threshold)) return 0;
-  if (r < kNoSpeech) return 1;
-  if (!(r < snr_high_threshold)) return 0;  // not-a-numbers too
-  return static_cast<float>((snr_high_threshold - r) / (snr_high_threshold - kNoSpeech));
+  if (trace < kNoSpeech) return 1;
+  if (!(trace < snr_high_threshold)) return 0;  // not-a-numbers too
+  return static_cast<float>((snr_high_threshold - trace) / (snr_high_threshold - kNoSpeech));
 }
 
-/// 1 if the neighbourhood of a bin looks like noise. Bins beyond the last one count as 0.
+/// 1 if the neighbourhood of a bin looks like noise. Bins above the last one count as 0.
 ORVALIS_KERNEL float local_averaged_decision(const float *gamma, int bin) {
   const int first = std::max(0, bin - kReach);
   const int beyond = bin + kReach + 1;
@@ -165,12 +171,12 @@ ORVALIS_KERNEL float local_averaged_decision(const float *gamma, int bin) {
 ORVALIS_KERNEL float global_decision(const float *gamma) {
   float sum = 0;
   for (int k = 0; k < kTransformBins; ++k) sum += gamma[k];
-  return sum * 0.00390625F < snr_low_threshold ? 1.0F : 0.0F;
+  return sum * (1.0F / kTransformBins) < snr_low_threshold ? 1.0F : 0.0F;
 }
 
-/// Probability of speech in a bin whose prior probability of noise alone is q.
-ORVALIS_KERNEL float presence_probability(float q, float r, float beta) {
-  const double xi = r - 2.0F;
+/// p = 1 / (1 + q / (1 - q) (1 + xi) e^(-beta / (1 + xi)))
+ORVALIS_KERNEL float presence_probability(float q, float trace, float beta) {
+  const double xi = trace - 2.0F;
   if (1.0 + xi == 0) return 1;
   const float e = SAFE_EXP(static_cast<float>(-beta / (1.0 + xi)));
   const auto odds = static_cast<float>(q / (1.0 - q) * (1.0 + xi) * e);
@@ -178,40 +184,41 @@ ORVALIS_KERNEL float presence_probability(float q, float r, float beta) {
   return std::isnan(p) ? 0 : SAFE_SAP(p);
 }
 
-ORVALIS_KERNEL void find_presence(const Ratios &ratios, float *p) {
-  constexpr float kLeastPrior = 0.01F;
-  constexpr float kMostPrior = 0.99F;
-  const float global = global_decision(ratios.gamma);
+ORVALIS_KERNEL void compute_presence(const Statistics &statistics, float *p) {
+  constexpr float kMinPrior = 0.01F;
+  constexpr float kMaxPrior = 0.99F;
+  const auto &[gamma, trace, beta] = statistics;
+  const float global = global_decision(gamma);
   for (int k = 0; k < kTransformBins; ++k) {
-    const float q = global * local_soft_decision(ratios.r[k], ratios.gamma[k]) *
-                    local_averaged_decision(ratios.gamma, k);
-    p[k] =
-        presence_probability(std::clamp(q, kLeastPrior, kMostPrior), ratios.r[k], ratios.beta[k]);
+    const float q =
+        global * local_soft_decision(trace[k], gamma[k]) * local_averaged_decision(gamma, k);
+    p[k] = presence_probability(std::clamp(q, kMinPrior, kMaxPrior), trace[k], beta[k]);
   }
 }
 
-/// The less speech a bin holds, the faster its noise is learnt.
+/// Smooths Phi_vv by alpha_v + (1 - alpha_v) p: the likelier speech, the slower.
 ORVALIS_KERNEL void update_noise(S2chnsState &state, const Spectra &frame) {
   for (int k = 0; k < kTransformBins; ++k) {
-    const double keep = kLeastNoiseMemory + (1.0 - kLeastNoiseMemory) * state.spp_smoothed[k];
-    smooth(state.Phi_vv, k, keep, frame.YY);
+    const double alpha = kAlphaV + (1.0 - kAlphaV) * state.spp_smoothed[k];
+    smooth(state.Phi_vv, k, alpha, frame.YY);
   }
 }
 
-/// Estimates presence and noise twice: smoothed over time, then with the noise just learnt.
+/// Estimates p and Phi_vv twice: first with p smoothed over time, then anew with the Phi_vv that
+/// this gave.
 ORVALIS_KERNEL void track(S2chnsState &state, const Spectra &frame) {
   for (int k = 0; k < kTransformBins; ++k) smooth(state.Phi_yy, k, cov_smoothing, frame.YY);
 
-  Ratios ratios;
+  Statistics statistics;
   float p[kTransformBins];
-  form_ratios(state, frame, ratios);
-  find_presence(ratios, p);
+  compute_statistics(state, frame, statistics);
+  compute_presence(statistics, p);
   for (int k = 0; k < kTransformBins; ++k)
-    state.spp_smoothed[k] = smoothed(kAbsenceMemory, state.spp_prev[k], p[k]);
+    state.spp_smoothed[k] = smoothed(kAlphaP, state.spp_prev[k], p[k]);
   update_noise(state, frame);
 
-  form_ratios(state, frame, ratios);
-  find_presence(ratios, state.spp_smoothed);
+  compute_statistics(state, frame, statistics);
+  compute_presence(statistics, state.spp_smoothed);
   buffercopy(state.spp_smoothed, state.spp_prev, kTransformBins);
   update_noise(state, frame);
 }
@@ -224,10 +231,10 @@ ORVALIS_KERNEL Spectrum filter(const S2chnsState &state, const Spectra &frame) {
     const Matrix M = mul_2by2_matrix(inv_matrix(state.Phi_vv.load(k)), state.Phi_yy.load(k));
     const Matrix W = compute_PMWF_coeff(M, pmwf_beta);
     const Bin Z = conj(W.m11) * Y.first + conj(W.m21) * Y.second;
-    const float most = std::sqrt(power(Y.first));
+    const float max = std::sqrt(power(Y.first));
     const float filtered = std::sqrt(power(Z));
-    const float magnitude = filtered <= most ? filtered : most;  // not-a-numbers too
-    output[k] = with_magnitude(Y.first, std::max(magnitude, output_gain * most));
+    const float magnitude = filtered <= max ? filtered : max;  // not-a-numbers too
+    output[k] = with_magnitude(Y.first, std::max(magnitude, output_gain * max));
   }
   return output;
 }
@@ -240,7 +247,7 @@ ORVALIS_KERNEL void process_frame(S2chnsState &state, const Word16 *in, Word16 *
     frame[1][i] = in[2 * i + 1];
     magnitudes += std::abs(in[2 * i]);
   }
-  if (magnitudes < kLeastMagnitudes) return;
+  if (magnitudes < kMinMagnitudes) return;
 
   Spectra spectra;
   spectra.first = analyse(state.frame_history[0], frame[0]);

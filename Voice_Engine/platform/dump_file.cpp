@@ -6,10 +6,10 @@ namespace orvalis {
 namespace {
 
 constexpr std::size_t kPathSize = 256;
-constexpr std::size_t kLongestHandle = 20;
-constexpr std::size_t kLongestSuffix = sizeof "_resultEPD.pcm" - 1;
+constexpr std::size_t kMaxHandleLength = 20;
+constexpr std::size_t kMaxSuffixLength = sizeof "_resultEPD.pcm" - 1;
 constexpr std::size_t kRootSize =
-    kPathSize - (sizeof kDumpFolder - 1) - kLongestHandle - kLongestSuffix;
+    kPathSize - (sizeof kDumpFolder - 1) - kMaxHandleLength - kMaxSuffixLength;
 
 constinit char root[kRootSize] = "";
 

@@ -12,22 +12,22 @@ inline constexpr char kDumpFolder[] = "/sdcard/VRpreprocess/";
 /// Folder of dynamics control's dump files.
 inline constexpr char kDrcDumpFolder[] = "/sdcard/";
 
-/// Puts a directory in front of dump paths; null or "" restores none. False, changing nothing, if
-/// a path might then not fit its buffer.
+/// Puts a directory in front of dump paths; null or "" removes it. False, with nothing changed, if
+/// a path might not fit its buffer.
 bool set_dump_root(const char *directory);
 
 /// Opens "<root><folder><handle in decimal><suffix>" for appending; null if that fails.
 std::FILE *open_dump(const char *folder, const void *handle, const char *suffix);
 
-/// Appends samples; does nothing without a file. A full disk loses samples silently: dumps are a
-/// diagnostic and must never disturb the audio path.
+/// Appends samples; does nothing without a file. A full disk loses samples silently: a diagnostic
+/// must never disturb the audio path.
 void write_dump(std::FILE *file, const std::int16_t *samples, int count);
 
 /// Closes a file if there is one.
 void close_dump(std::FILE *file);
 
-/// Opens both dump files of a frame driver for the time of one call, so that they exist after it.
-/// Nothing is written through these handles.
+/// Opens both dump files of a frame driver during a call, so that they exist after it. Nothing is
+/// written through these handles.
 class DumpFilesPresent {
 public:
   DumpFilesPresent(bool wanted, const void *handle, const char *input_suffix,

@@ -1,4 +1,4 @@
-// Marks what callers outside the library may see; the linker's export list has the last word.
+// Marks what is visible outside the library, if the linker's export list holds it too.
 #pragma once
 
 #define ORVALIS_EXPORT __attribute__((visibility("default")))

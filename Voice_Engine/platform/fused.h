@@ -1,16 +1,16 @@
 // Fused multiply-adds at full speed where the processor has them, and with the same bits where the
-// C library has to form them.
+// C library has to emulate them.
 //
-// A kernel is written once, as functions marked ORVALIS_KERNEL, and stands in two bodies: a
-// portable one and, on x86-64, one that the compiler may fill with FMA instructions. Who calls it
-// asks has_fma() once. Other processors either always have fused multiply-adds or never do.
+// A kernel is written once, as functions marked ORVALIS_KERNEL, and compiled into two bodies: a
+// portable one and, on x86-64, one with FMA instructions. Callers choose by has_fma(). Other
+// processors either always have fused multiply-adds or never do.
 #pragma once
 
-/// Of a kernel: becomes part of either body.
+/// A function of a kernel, compiled into either body.
 #define ORVALIS_KERNEL [[gnu::always_inline]] inline
 
 #if defined(__x86_64__)
-/// Of the body for processors with fused multiply-adds.
+/// The body for processors with fused multiply-adds.
 #define ORVALIS_WITH_FMA [[gnu::target("fma")]]
 #else
 #define ORVALIS_WITH_FMA

@@ -16,7 +16,7 @@ void write_to_standard_error(int priority, const char *tag, const char *text, vo
   std::fprintf(stderr, "%c/%s: %s\n", letter, tag, text);
 }
 
-// Atomic one by one, so that a host whose sinks need no user may change them at any time.
+// Two separate atomics: a host whose sinks ignore `user` may change them at any time.
 constinit std::atomic<LogSink> current_sink = write_to_standard_error;
 constinit std::atomic<void *> current_user = nullptr;
 

@@ -12,10 +12,10 @@ inline constexpr int kLogError = 6;
 
 using LogSink = void (*)(int priority, const char *tag, const char *text, void *user);
 
-/// Directs log lines; null restores standard error. Not to be changed while instances run.
+/// Sets where log lines go; null restores standard error. Not to be changed while instances run.
 void set_log_sink(LogSink sink, void *user);
 
-/// Writes one line. Texts longer than 255 bytes are cut.
+/// Writes one line. Texts are truncated to 255 bytes.
 __attribute__((format(printf, 3, 4))) void log_line(int priority, const char *tag,
                                                     const char *format, ...);
 

@@ -66,12 +66,12 @@ TEST(McraRecordings, WordsAreCoveredAndPausesAreNot) {
     recordings.push_back(speech_16k(std::string("cards/") + name + ".wav"));
   struct Condition {
     double below_db;
-    double least_words[2];  // in percent, by historyUpdate
+    double min_words[2];  // in percent, by historyUpdate
   };
   const Condition kConditions[] = {{60, {99, 75}}, {20, {98, 60}}, {10, {80, 33}}, {5, {52, 15}}};
   constexpr std::size_t kMargin = 24000;
   std::printf("noise           words  pauses    the same with history\n");
-  for (const auto &[below_db, least_words] : kConditions) {
+  for (const auto &[below_db, min_words] : kConditions) {
     for (const auto colour : {NoiseColour::kWhite, NoiseColour::kPink}) {
       Rates rates[2];
       for (const Pcm &speech : recordings) {
@@ -83,7 +83,7 @@ TEST(McraRecordings, WordsAreCoveredAndPausesAreNot) {
       for (const int history : {0, 1}) {
         std::printf("   %5.1f %% %5.2f %%", rates[history].words.percent(),
                     rates[history].pauses.percent());
-        EXPECT_GT(rates[history].words.percent(), least_words[history]) << below_db;
+        EXPECT_GT(rates[history].words.percent(), min_words[history]) << below_db;
         EXPECT_GT(rates[history].pauses.frames, 2000);
         EXPECT_LT(rates[history].pauses.percent(), 0.1) << below_db;
       }

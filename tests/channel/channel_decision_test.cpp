@@ -17,7 +17,7 @@ struct Limits {
   Word32 silent;     ///< undecided up to here
   Word16 deviation;  ///< voice from here on
   int seeding;
-  Word16 loud_level_q5;
+  Word16 alpha_high_level_q5;
   bool remembers_reset;
   int bins_checksum;  ///< sum of (1-based channel) * (first bin + 1000 * last bin)
   int scale_checksum;
@@ -34,8 +34,8 @@ constexpr Limits kLimits[] = {
 
 /// A made state.
 struct Channels {
-  Word32 energy[kMostChannels] = {}, noise[kMostChannels] = {};
-  Word16 long_term_q5[kMostChannels] = {};
+  Word32 energy[kMaxChannels] = {}, noise[kMaxChannels] = {};
+  Word16 long_term_q5[kMaxChannels] = {};
   Word16 update_cnt = 30, hyster_cnt = 0, last_update_cnt = 30, unused = 0;
   Word32 frame_cnt = 1000;
 
@@ -126,7 +126,7 @@ TEST_P(ChannelDecision, NoiseIsSeededInTheFirstFrames) {
     channels.energy[0] = 4095;
     channels.energy[last] = 4097;
     ChannelState state = channels.view();
-    seed_noise(*GetParam().plan, state);
+    initialise_noise(*GetParam().plan, state);
     EXPECT_EQ(channels.noise[0], past ? 0 : 4096);
     EXPECT_EQ(channels.noise[last], past ? 0 : 4097);
   }
@@ -137,11 +137,11 @@ TEST_P(ChannelDecision, ShareOfThePastFollowsItsCurve) {
   std::set<int> seen;
   for (double total = 300; total < MAX_32; total *= 1.002) {
     const auto energy = static_cast<Word32>(total);
-    const int below = GetParam().loud_level_q5 - level_q5(flags, energy);
+    const int below = GetParam().alpha_high_level_q5 - level_q5(flags, energy);
     const int step = std::clamp(32 * below, -32768, 32767);
     const int share_q10 = 1023 - static_cast<int>(std::floor(803.0 * step / 32768));
     const int expected = share_q10 >= 1024 ? 32440 : share_q10 > 510 ? 32 * share_q10 : 16383;
-    ASSERT_EQ(long_term_share(flags, *GetParam().plan, energy), expected) << share_q10;
+    ASSERT_EQ(long_term_alpha_q15(flags, *GetParam().plan, energy), expected) << share_q10;
     seen.insert(share_q10);
   }
   for (int edge : {510, 511, 1023, 1024}) EXPECT_TRUE(seen.contains(edge)) << edge;

@@ -40,7 +40,7 @@ int snr_index(double energy, double noise) {
 
 /// Share of the past in the long-term levels.
 double share_of_past(const ModelPlan &plan, double total) {
-  const double below_q10 = 32 * (plan.loud_level_q5 - model_level_q5(total));
+  const double below_q10 = 32 * (plan.alpha_high_level_q5 - model_level_q5(total));
   const double share_q10 = 1023 - 803.0 / 32768 * clip16(below_q10);
   if (share_q10 >= 1024) return 0.99;
   return share_q10 <= 510 ? 0.5 : share_q10 / 1024;
@@ -177,7 +177,7 @@ std::vector<double> model_inverse(int size, const std::vector<std::complex<doubl
 }
 
 double model_energies(const ModelPlan &plan, ModelState &state, const std::vector<double> &power) {
-  const auto full_scale = [](double x) { return std::min(x, kLargestWord32); };
+  const auto full_scale = [](double x) { return std::min(x, kMaxWord32); };
   double total = 0;
   for (std::size_t i = 0; i < plan.channels(); ++i) {
     double &energy = state.energy[i];
@@ -208,10 +208,11 @@ double model_level_q5(double energy) { return 32 * kDecibels * std::log10(energy
 ModelFindings model_findings(const ModelPlan &plan, ModelState &state) {
   ModelFindings found;
   found.total =
-      std::min(std::accumulate(state.energy.begin(), state.energy.end(), 0.0), kLargestWord32);
+      std::min(std::accumulate(state.energy.begin(), state.energy.end(), 0.0), kMaxWord32);
   const double share = share_of_past(plan, found.total);
   for (std::size_t i = 0; i < plan.channels(); ++i) {
-    if (state.frame_cnt <= plan.seeding_frames) state.noise[i] = std::max(state.energy[i], 4096.0);
+    if (state.frame_cnt <= plan.initial_noise_frames)
+      state.noise[i] = std::max(state.energy[i], 4096.0);
     found.snr.push_back(snr_index(state.energy[i], state.noise[i]));
     found.metric += model_metric(found.snr[i]);
     const double level = model_level_q5(state.energy[i]);
@@ -225,8 +226,8 @@ ModelFindings model_findings(const ModelPlan &plan, ModelState &state) {
 }
 
 bool model_decision(const ModelPlan &plan, ModelState &state, const ModelFindings &found) {
-  constexpr int kMostCount = 32767;
-  const auto count = [=](int &counter) { counter = std::min(counter + 1, kMostCount); };
+  constexpr int kMaxCount = 32767;
+  const auto count = [=](int &counter) { counter = std::min(counter + 1, kMaxCount); };
   bool is_noise = false;
   if (found.metric <= plan.metric_noise) {
     is_noise = true;

@@ -11,7 +11,7 @@
 
 namespace orvalis::test {
 
-inline constexpr double kLargestWord32 = 2147483647.0;
+inline constexpr double kMaxWord32 = 2147483647.0;
 
 /// Sizes, channels and thresholds of one user of the analysis.
 struct ModelPlan {
@@ -20,9 +20,9 @@ struct ModelPlan {
   int overlap;
   int size;  ///< samples of the transform
   double energy_floor;
-  int seeding_frames;
+  int initial_noise_frames;
   bool saturate_then_share;  ///< full scale limits the frame's energy before its share is taken
-  double loud_level_q5;
+  double alpha_high_level_q5;
   int metric_noise;        ///< noise up to this voice metric
   double silent_energy;    ///< undecided up to this total energy
   double deviation_voice;  ///< voice from this deviation on

@@ -34,7 +34,7 @@ template <class State>
 struct Subject {
   const ChannelPlan &plan;
   const ModelPlan &model;
-  Word16 (State::*overlap)[kMostOverlap];
+  Word16 (State::*overlap)[kMaxOverlap];
   Word32 State::*frame_cnt;
   int frames = 0, crowded = 0;  ///< frames held, and those without headroom
   int snr_differs = 0;          ///< SNR indices off by one
@@ -59,7 +59,7 @@ struct Subject {
   /// What the engine's analysis finds in a frame. `s` becomes the state before the noise update.
   ChannelFindings findings(State &s, const Word16 *frame) const {
     Flags flags;
-    Word16 spectrum[kMostTransformSize];
+    Word16 spectrum[kMaxTransformSize];
     ChannelState channels = channels_of(s, s.*overlap, s.*frame_cnt);
     return analyse_frame(flags, plan, channels, frame, spectrum);
   }

@@ -114,7 +114,7 @@ TEST(S1chns, FollowsTheModelFrameByFrame) {
     Bounds bounds;
     auto engine = subject();
     int clear = 0;
-    double least_gain = 1;
+    double min_gain = 1;
     for (std::size_t at = 0; at + kFrame <= audio.size(); at += kFrame) {
       const S1chnsState before = suppressor.state;
       const std::vector<Word16> output = suppressor.frame(&audio[at]);
@@ -124,7 +124,7 @@ TEST(S1chns, FollowsTheModelFrameByFrame) {
       const auto gains = model_gains(
           step.found, std::accumulate(step.noise.begin(), step.noise.end(), 0.0), floor_db);
       for (std::size_t i = 0; i < gains.size(); ++i) {
-        least_gain = std::min(least_gain, gains[i]);
+        min_gain = std::min(min_gain, gains[i]);
         for (int k = kSuppressorModel.bins[i][0]; k <= kSuppressorModel.bins[i][1]; ++k)
           bounds.hold("gain", after.bin_gain_q15[k] / 32768.0 - gains[i], gains[i] / 200);
       }
@@ -142,7 +142,7 @@ TEST(S1chns, FollowsTheModelFrameByFrame) {
     }
     EXPECT_GT(clear, engine.frames * 3 / 4);
     engine.expect_rare_exceptions();
-    EXPECT_NEAR(20 * std::log10(least_gain), floor_db, 0.01) << "the floor is never reached";
+    EXPECT_NEAR(20 * std::log10(min_gain), floor_db, 0.01) << "the floor is never reached";
   }
 }
 

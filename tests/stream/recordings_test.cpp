@@ -262,7 +262,7 @@ TEST(Recordings, WordsAreKept) {
     const char *name;
     Background kind;
     double below_db;
-    double least_kept[5];  // in percent, of each way below
+    double min_kept[5];  // in percent, of each way below
   } kMixes[] = {{"clean", Background::kWhite, 60, {88, 96, 99, 96, 99}},
                 {"white 20 dB", Background::kWhite, 20, {88, 96, 98, 95, 98}},
                 {"white 10 dB", Background::kWhite, 10, {85, 95, 97, 90, 97}},
@@ -284,7 +284,7 @@ TEST(Recordings, WordsAreKept) {
   std::printf(
       "               channel energy               MCRA              beyond the words [ms]\n"
       "background       bare  padded  and lead-in    bare  padded     channel energy   MCRA\n");
-  for (const auto &[name, kind, below_db, least_kept] : kMixes) {
+  for (const auto &[name, kind, below_db, min_kept] : kMixes) {
     Coverage found[5];
     for (std::size_t r = 0; r < recordings.size(); ++r) {
       const Pcm &speech = recordings[r];
@@ -299,7 +299,7 @@ TEST(Recordings, WordsAreKept) {
     std::printf("%-13s  %5.1f   %5.1f        %5.1f   %5.1f   %5.1f     %14.0f  %5.0f\n", name,
                 found[0].percent(), found[1].percent(), found[2].percent(), found[3].percent(),
                 found[4].percent(), found[2].beyond_ms(), found[4].beyond_ms());
-    for (int way = 0; way < 5; ++way) EXPECT_GT(found[way].percent(), least_kept[way]) << name;
+    for (int way = 0; way < 5; ++way) EXPECT_GT(found[way].percent(), min_kept[way]) << name;
     EXPECT_GT(found[2].percent(), found[1].percent()) << name;
     EXPECT_TRUE(kind == Background::kBabble || found[2].beyond_ms() < 250) << name;
   }

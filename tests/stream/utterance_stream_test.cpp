@@ -265,7 +265,7 @@ TEST(UtteranceStream, HandsADetectorsDecisionsToTheFinder) {
   const struct {
     int32_t rate_hz, detector, lead_in;
     const Pcm &pcm;
-    std::size_t least_found;
+    std::size_t min_found;
   } kCases[] = {{16000, UTTERANCE_CHANNEL_ENERGY, 0, command, 1},
                 {8000, UTTERANCE_CHANNEL_ENERGY, 0, narrow, 5},
                 {16000, UTTERANCE_CHANNEL_ENERGY, 1, command, 1},
@@ -275,19 +275,19 @@ TEST(UtteranceStream, HandsADetectorsDecisionsToTheFinder) {
                 {16000, UTTERANCE_CHANNEL_ENERGY, 1, bursts_alone, 100},
                 {16000, UTTERANCE_MCRA, 0, command, 1},
                 {8000, UTTERANCE_MCRA, 0, narrow, 5}};
-  for (const auto &[rate_hz, detector, lead_in, pcm, least_found] : kCases) {
+  for (const auto &[rate_hz, detector, lead_in, pcm, min_found] : kCases) {
     UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
     settings.rate_hz = rate_hz;
     settings.detector = detector;
     settings.lead_in = lead_in;
-    settings.hangover_ms = least_found < 100 ? 200 : 0;
-    settings.min_speech_ms = least_found < 100 ? 700 : 0;
+    settings.hangover_ms = min_found < 100 ? 200 : 0;
+    settings.min_speech_ms = min_found < 100 ? 700 : 0;
     const Frames alone = judged_alone(settings, pcm);
     Frames frames;
     frames.observe(settings);
     const auto found = utterances_of(settings, pcm, [] { return 1000U; });
     EXPECT_EQ(found, utterances_of(settings, pcm, alone.speech));
-    EXPECT_GE(found.size(), least_found);
+    EXPECT_GE(found.size(), min_found);
     EXPECT_EQ(frames.speech, alone.speech);
     EXPECT_EQ(frames.reasons, alone.reasons);
     EXPECT_EQ(frames.pcm, Pcm(pcm.begin(), pcm.begin() + std::ssize(frames.pcm)));
