@@ -52,7 +52,7 @@ Speech narrow_speech() {
   return speech;
 }
 
-// Each subject has start(), which makes it as new, and hear() for a frame.
+// Each subject has start(), which makes it as new, and process() for a frame.
 
 class Detection {
 public:
@@ -67,7 +67,7 @@ public:
     FreeMemoryEPD(epd_);
     epd_ = InitializeEPD(mode_, 0);
   }
-  void hear(const Word16 *frame, int samples) {
+  void process(const Word16 *frame, int samples) {
     benchmark::DoNotOptimize(ProcessEPDFrame(epd_, frame, samples));
   }
 
@@ -84,7 +84,7 @@ public:
     state_ = {};
     S1CHNSInit(&state_, 2);
   }
-  void hear(const Word16 *frame, int samples) {
+  void process(const Word16 *frame, int samples) {
     Flags flags;
     std::copy_n(frame, samples, buffer_);
     s1chns_C(flags, &state_, buffer_, buffer_);
@@ -107,7 +107,7 @@ public:
     VelmoraVadState *state = &state_;
     VelmoraVADInit(&state, band_);
   }
-  void hear(const Word16 *frame, int /*samples*/) {
+  void process(const Word16 *frame, int /*samples*/) {
     Flags flags;
     VelmoraVadState *state = &state_;
     EpdReasons reasons;
@@ -128,7 +128,7 @@ public:
     *record = {};
     initialVADINFO(&record);
   }
-  void hear(const Word16 *frame, int samples) {
+  void process(const Word16 *frame, int samples) {
     VADINFO *record = record_.get();
     std::copy_n(frame, samples, buffer_);
     benchmark::DoNotOptimize(processVAD(&record, buffer_, samples, 0.84F));
@@ -139,13 +139,13 @@ private:
   Word16 buffer_[MCRA_FRAME_SAMPLES] = {};
 };
 
-/// Two microphones: the second hears the speech three samples later, and noise of its own.
+/// Two microphones: the second receives the speech three samples later, and noise of its own.
 class TwoMicrophones {
 public:
   static constexpr std::size_t kBytes = sizeof(S2chnsState);
 
   void start() { S2CHNSInit(*state_); }
-  void hear(const Word16 *frame, int samples) {
+  void process(const Word16 *frame, int samples) {
     for (int i = 0; i < samples; ++i) {
       pairs_[2 * i] = frame[i];
       pairs_[2 * i + 1] = static_cast<Word16>(frame[std::max(0, i - 3)] / 2 + (i * 7919 % 41 - 20));
@@ -164,7 +164,7 @@ public:
   static constexpr std::size_t kBytes = sizeof(DrcInstance);
 
   void start() { drc_.reset(create_drc(16000, 0), freeMemory_DRC); }
-  void hear(const Word16 *frame, int samples) {
+  void process(const Word16 *frame, int samples) {
     std::copy_n(frame, samples, buffer_);
     benchmark::DoNotOptimize(process_drc(drc_.get(), buffer_, samples));
   }
@@ -183,7 +183,7 @@ public:
   explicit Transformation(Transform transform) : transform_(transform) {}
 
   void start() {}
-  void hear(const Word16 *frame, int samples) {
+  void process(const Word16 *frame, int samples) {
     std::fill(std::copy_n(frame, samples, buffer_), std::end(buffer_), Sample{0});
     transform_(buffer_);
     benchmark::DoNotOptimize(buffer_);
@@ -213,8 +213,7 @@ auto spectrum_by(FrameSpectrum frame_spectrum) {
   };
 }
 
-/// The slowest frame by the median of several passes: what the audio costs, without the moments at
-/// which the machine turned to something else.
+/// The slowest frame by the median of several passes, which leaves interruptions out.
 template <class Subject>
 double worst_frame_ns(Subject &subject, const Speech &speech) {
   using Clock = std::chrono::steady_clock;
@@ -224,7 +223,7 @@ double worst_frame_ns(Subject &subject, const Speech &speech) {
     subject.start();
     for (std::size_t i = 0; i < speech.frames(); ++i) {
       const Clock::time_point before = Clock::now();
-      subject.hear(speech.frame(i), speech.frame_samples);
+      subject.process(speech.frame(i), speech.frame_samples);
       times[i][pass] = Clock::now() - before;
     }
   }
@@ -247,7 +246,7 @@ void measure(const char *name, const Speech &speech, Subject subject) {
                                  for (auto _ : state) {
                                    subject.start();
                                    for (std::size_t i = 0; i < speech.frames(); ++i)
-                                     subject.hear(speech.frame(i), speech.frame_samples);
+                                     subject.process(speech.frame(i), speech.frame_samples);
                                  }
                                })
       ->Repetitions(9)

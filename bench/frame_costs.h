@@ -1,4 +1,4 @@
-// What a frame of 10 ms costs, in the whole detector and in each of its parts.
+// What a frame of 10 ms costs in each service and in its parts.
 #pragma once
 
 namespace orvalis::bench {

@@ -1,5 +1,5 @@
-// What detection and suppression make of noise and speech, on mixtures whose parts are known: how
-// much noise is left and what that costs the speech, and how soon noise that rises is learnt.
+// Quality of detection and suppression on mixtures whose parts are known: how much noise is left,
+// what that costs the speech, and how soon rising noise is learnt.
 #include <algorithm>
 #include <cmath>
 #include <cstdint>
@@ -31,7 +31,7 @@ constexpr Suppressor kSuppressors[] = {{ORVALIS_NS_13DB, 1, ORVALIS_NS_DELAY_1MI
                                        {ORVALIS_NS_18DB, 1, ORVALIS_NS_DELAY_1MIC},
                                        {ORVALIS_NS_13DB, 2, ORVALIS_NS_DELAY_2MIC}};
 
-/// The first microphone without its noise, no later than it. The second is not always listened to.
+/// The first microphone without its noise, the delay made up for. The second is not always used.
 Pcm suppressed(const Suppressor &suppressor, const Pcm &first, const Pcm &second) {
   const auto &[mode, microphones, delay] = suppressor;
   const auto count = static_cast<std::int32_t>(kFrame * microphones);
@@ -71,8 +71,8 @@ double dbfs(double power) { return db(power / (kFullScale * kFullScale)); }
 const std::pair<const char *, NoiseColour> kColours[] = {{"white", NoiseColour::kWhite},
                                                          {"pink", NoiseColour::kPink}};
 
-/// Five sentences, each after four seconds of the noise below it alone. What is no speech is noise,
-/// or error where it lies beside the speech; a recording's own noise counts as its speech.
+/// Five sentences, each after four seconds of noise alone. What is no speech is noise, or error
+/// where it lies beside the speech; a recording's own noise counts as its speech.
 void print_noise_and_error() {
   std::printf(
       "one microphone   noise in the pause [dBFS]   error beside the speech [dBFS]\n"
@@ -113,8 +113,8 @@ Pcm rising(NoiseColour colour, unsigned seed, std::size_t samples, double from_d
   return pcm;
 }
 
-/// Seconds from the rise until half a second lets through less than 2 dB more of the noise than the
-/// end; negative if the end lets through more than before the rise.
+/// Seconds from the rise until half a second passes less than 2 dB more of the noise than the end;
+/// negative if the end passes more than before the rise.
 double learning_time(const Suppressor &suppressor, const Pcm &first, const Pcm &second) {
   const Pcm output = suppressed(suppressor, first, second), silence(first.size());
   const auto change = [&](std::size_t begin, std::size_t end) {

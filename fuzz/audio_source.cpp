@@ -52,15 +52,15 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
     const auto settings = settings_of(bytes[0]);
     orvalis::cli::AudioSource source(file.path(), settings);
     require(source.rate_hz() == 8000 || source.rate_hz() == 16000, "audio comes at 8 or 16 kHz");
-    std::size_t heard = 0;
-    while (heard < kMaxSamples) {
+    std::size_t read = 0;
+    while (read < kMaxSamples) {
       const auto samples = source.read();
       if (samples.empty()) break;
       require(settings.channels != orvalis::cli::Channels::kPair || samples.size() % 2 == 0,
               "pairs come whole");
-      heard += samples.size();
+      read += samples.size();
     }
-    if (heard < kMaxSamples) source.check_complete();
+    if (read < kMaxSamples) source.check_complete();
   } catch (const orvalis::cli::AudioError &) {
     // The tool tells the user and goes on with the next file; anything else would end it.
   }

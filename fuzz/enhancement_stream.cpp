@@ -1,4 +1,4 @@
-// The enhancement stream: any settings, cuts, rooms and audio.
+// The enhancement stream: any settings, chunk sizes, rooms and audio.
 #include "stream/enhancement_stream.h"
 
 #include <algorithm>
@@ -17,7 +17,7 @@ using Samples = std::vector<std::int16_t>;
 constexpr std::size_t kMaxSamples = 24000;
 constexpr std::int16_t kGuard = 12345;
 
-/// A stream with all that came out of it.
+/// A stream and its output.
 class Enhancer {
 public:
   explicit Enhancer(const EnhancementSettings &settings)
@@ -32,7 +32,7 @@ public:
 
   EnhancementCounts counts() const {
     EnhancementCounts counts;
-    require(GetEnhancementCounts(stream_, &counts) == 0, "counts are told");
+    require(GetEnhancementCounts(stream_, &counts) == 0, "counts are returned");
     return counts;
   }
 
@@ -68,7 +68,7 @@ public:
   }
 
 private:
-  /// False if the room was refused, in which nothing may have been written then.
+  /// False if the room was refused; nothing may have been written to it then.
   template <class Into>
   bool gives(std::int32_t room, Into into) {
     Samples out(static_cast<std::size_t>(room) + 1, kGuard);
@@ -76,7 +76,7 @@ private:
     require(ready >= -1 && ready <= room, "no more comes out than there is room");
     require(
         std::all_of(out.begin() + std::max(ready, 0), out.end(), [](int x) { return x == kGuard; }),
-        "nothing is written beyond what is told");
+        "nothing is written beyond what is returned");
     if (ready < 0) return false;
     output_.insert(output_.end(), out.begin(), out.begin() + ready);
     return true;
@@ -116,21 +116,22 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
     return 0;
   }
 
-  Enhancer cut(settings), whole(settings);
-  Samples heard;
+  Enhancer chunked(settings), whole(settings);
+  Samples pushed;
   const std::uint8_t room_at_end = input.byte();
-  while (!input.is_empty() && heard.size() < kMaxSamples) {
+  while (!input.is_empty() && pushed.size() < kMaxSamples) {
     const std::uint8_t room = input.byte();
     const Samples audio = input.audio();
-    heard.insert(heard.end(), audio.begin(), audio.end());
-    cut.push(audio, room);
+    pushed.insert(pushed.end(), audio.begin(), audio.end());
+    chunked.push(audio, room);
   }
-  cut.flush(room_at_end);
-  whole.push(heard, 0);
+  chunked.flush(room_at_end);
+  whole.push(pushed, 0);
   whole.flush(0);
-  require(cut.output() == whole.output(), "no sample is lost or depends on the cut");
+  require(chunked.output() == whole.output(), "no sample is lost or depends on the chunk size");
   static_assert(std::has_unique_object_representations_v<EnhancementCounts>);
-  const EnhancementCounts counts = cut.counts(), expected = whole.counts();
-  require(std::memcmp(&counts, &expected, sizeof counts) == 0, "no count depends on the cut");
+  const EnhancementCounts counts = chunked.counts(), expected = whole.counts();
+  require(std::memcmp(&counts, &expected, sizeof counts) == 0,
+          "no count depends on the chunk size");
   return 0;
 }

@@ -1,4 +1,4 @@
-// The detector through the flat interface: any mode, content type, cut, reset and audio.
+// The detector through the flat interface: any mode, content type, chunk size, reset and audio.
 #include <algorithm>
 #include <cstring>
 
@@ -30,26 +30,26 @@ std::size_t frame_samples(std::int32_t mode) {
   return rate > 1 || rate == 0 ? 160 : 80;
 }
 
-void judge(EpdInstance *epd, std::vector<std::int16_t> audio, std::size_t frame, Input &input) {
+void process(EpdInstance *epd, std::vector<std::int16_t> audio, std::size_t frame, Input &input) {
   const std::uint8_t how = input.byte();
   if (how & 1) audio.resize(audio.size() / frame * frame);
   const std::vector<std::int16_t> given(audio.begin(), audio.end());  // without spare capacity
   const std::vector<std::int16_t> before = given;
   const auto samples = static_cast<std::int32_t>(given.size());
 
-  std::int32_t answer;
+  std::int32_t result;
   switch (how / 2 % 3) {
     case 0:
-      answer = ProcessEPDFrame(epd, given.data(), samples);
+      result = ProcessEPDFrame(epd, given.data(), samples);
       break;
     case 1:
-      answer = ProcessEPDFrameByCnttype(epd, given.data(), samples, input.number());
+      result = ProcessEPDFrameByCnttype(epd, given.data(), samples, input.number());
       break;
     default:
-      answer = ProcessEPDFrameByMode(epd, given.data(), samples, input.number());
+      result = ProcessEPDFrameByMode(epd, given.data(), samples, input.number());
   }
-  require(answer == 0 || answer == 1, "an answer is 0 or 1");
-  require(answer == 0 || given.size() % frame == 0, "a partial frame is answered with 0");
+  require(result == 0 || result == 1, "a result is 0 or 1");
+  require(result == 0 || given.size() % frame == 0, "a partial frame gives 0");
   require(given == before, "the caller's buffer is not changed");
 }
 
@@ -62,7 +62,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   EpdInstance *epd = InitializeEPD(mode, 0);
   require(epd != nullptr, "a detector is created");
 
-  for (std::size_t heard = 0; !input.is_empty() && heard < kMaxSamples;) {
+  for (std::size_t pushed = 0; !input.is_empty() && pushed < kMaxSamples;) {
     switch (input.byte() % 8) {
       case 0:
         require(ResetEPDparams(epd) == 0, "a reset succeeds");
@@ -78,8 +78,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
       }
       default: {
         std::vector<std::int16_t> audio = input.audio();
-        heard += audio.size();
-        judge(epd, std::move(audio), frame_samples(mode), input);
+        pushed += audio.size();
+        process(epd, std::move(audio), frame_samples(mode), input);
       }
     }
   }

@@ -22,7 +22,7 @@ public:
 
   bool is_empty() const { return at_ == end_; }
 
-  /// The next byte, 0 behind the end.
+  /// The next byte, 0 after the end.
   std::uint8_t byte() { return is_empty() ? 0 : *at_++; }
 
   std::int16_t word() {
@@ -38,8 +38,8 @@ public:
     return static_cast<std::int32_t>(static_cast<std::uint32_t>(word()) << 16 | low);
   }
 
-  /// A piece of audio in a buffer of exactly its size, so that reading beyond it is noticed.
-  /// Speech is long and inputs are short: all but the literal kind grow from a few bytes.
+  /// A chunk of audio in a buffer of exactly its size, so that reading beyond it is noticed.
+  /// Speech is long and inputs are short: all kinds but the literal one grow from a few bytes.
   std::vector<std::int16_t> audio() {
     enum Kind { kLiteral, kConstant, kNoise, kPulses };
     const auto kind = static_cast<Kind>(byte() % 4);

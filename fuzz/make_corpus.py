@@ -5,7 +5,7 @@ import pathlib
 import struct
 
 LITERAL, CONSTANT, NOISE, PULSES = range(4)
-AUDIO = 7  # the byte before a piece of audio; all targets that take audio know it
+AUDIO = 7  # the byte before a chunk of audio; all targets that take audio know it
 
 
 def word(value):
@@ -38,9 +38,9 @@ def voice(samples, level=20000, period=120):
     return grown(PULSES, samples, level, period)
 
 
-def frames(piece, content_type=0):
+def frames(chunk, content_type=0):
     """Whole frames by ProcessEPDFrameByCnttype."""
-    return bytes([AUDIO]) + piece + bytes([3]) + number(content_type)
+    return bytes([AUDIO]) + chunk + bytes([3]) + number(content_type)
 
 
 def epd_frame():
@@ -49,15 +49,15 @@ def epd_frame():
     for name, mode in {"16k": 0, "8k": 1, "quarter_8k": 3, "fourfold": 4, "second": 6}.items():
         yield name, bytes([mode]) + b"".join(map(frames, speech))
     yield "negative_mode", b"\xff" + number(-1234) + b"".join(map(frames, speech))
-    yield "short_timing", bytes([0]) + b"".join(frames(piece, 2) for piece in speech)
-    yield "any_type", bytes([1]) + b"".join(frames(piece, -1 << 31) for piece in speech)
+    yield "short_timing", bytes([0]) + b"".join(frames(chunk, 2) for chunk in speech)
+    yield "any_type", bytes([1]) + b"".join(frames(chunk, -1 << 31) for chunk in speech)
     yield "resets", bytes([0]) + (mute + reset).join(map(frames, speech)) + reset
     yield "full_scale", bytes([4]) + b"".join(
-        frames(piece) for piece in [constant(4000, -32768), voice(8000, 32767), noise(8000, 32767),
+        frames(chunk) for chunk in [constant(4000, -32768), voice(8000, 32767), noise(8000, 32767),
                                     constant(4000, 0), literal(*[32767, -32768] * 80)])
     # Partial frames, no samples, and a null pointer with and without a length.
     yield "odd_sizes", bytes([0]) + b"".join(
-        bytes([AUDIO]) + piece + bytes([0]) for piece in
+        bytes([AUDIO]) + chunk + bytes([0]) for chunk in
         [literal(), literal(1, 2, 3), noise(200), voice(440)]) + b"".join(
         bytes([2]) + number(n) for n in [0, 1, 160, -1, -1 << 31, (1 << 31) - 1])
 
@@ -66,28 +66,28 @@ def mcra_frame():
     def configuration(history=0, mode=0, enable=0, low=0, margin=2):
         return b"".join(map(number, [history, mode, enable, low, margin]))
 
-    def heard(piece, length=160, exponent=84):
-        return bytes([AUDIO]) + number(length) + number(exponent) + piece
+    def pushed(chunk, length=160, exponent=84):
+        return bytes([AUDIO]) + number(length) + number(exponent) + chunk
 
     reset, again, configure, only_analysed = (bytes([op]) for op in range(4))
     speech = [noise(8000), voice(8000), noise(6400), voice(6400, period=80), noise(9600)]
     for name, fields in {"all_time": (), "history": (1,), "low": (1, 0, 0, 1, 1),
                          "any_fields": (-1, 1 << 30, -1 << 31, 7, -5)}.items():
-        yield name, configuration(*fields) + b"".join(map(heard, speech))
+        yield name, configuration(*fields) + b"".join(map(pushed, speech))
     for name, exponent in {"calibrated": 84, "steep": 200, "flat": 0, "negative": -1082130432,
                            "not_a_number": 2143289344, "infinite": 2139095040}.items():
         yield name, configuration(1, 1, 1) + b"".join(
-            heard(piece, exponent=exponent) for piece in (noise(9600, 60), *speech) * 2)
+            pushed(chunk, exponent=exponent) for chunk in (noise(9600, 60), *speech) * 2)
     yield "lengths", configuration() + b"".join(
-        heard(noise(1600), length) for length in (0, 1, 100, 161, -1, (1 << 31) - 1)) + (
-            heard(constant(1600, -32768), 0))
+        pushed(noise(1600), length) for length in (0, 1, 100, 161, -1, (1 << 31) - 1)) + (
+            pushed(constant(1600, -32768), 0))
     yield "full_scale", configuration() + b"".join(
-        heard(piece) for piece in [constant(4000, 0), constant(4000, -32768), voice(8000, 32767),
+        pushed(chunk) for chunk in [constant(4000, 0), constant(4000, -32768), voice(8000, 32767),
                                    noise(8000, 32767), constant(4000, 0),
                                    literal(*[32767, -32768] * 80), constant(1600, 1)])
     yield "resets", configuration(0, 1, 1) + b"".join(
-        heard(piece) + reset + configure + configuration(1, 1, 1) for piece in speech) + again + (
-            heard(voice(3200)) + only_analysed + noise(160) + number(160) + heard(voice(3200)))
+        pushed(chunk) + reset + configure + configuration(1, 1, 1) for chunk in speech) + again + (
+            pushed(voice(3200)) + only_analysed + noise(160) + number(160) + pushed(voice(3200)))
 
 
 def ns_frame():
@@ -98,7 +98,7 @@ def ns_frame():
     for name, head in {"one_mic": start(0, 1), "strong": start(1, 1), "narrow": start(2, 1),
                        "long_frames": start(3, 1), "short_frames": start(5, 1),
                        "two_mics": start(0, 2), "two_mics_narrow": start(2, 2)}.items():
-        yield name, head + b"".join(whole + piece for piece in speech)
+        yield name, head + b"".join(whole + chunk for chunk in speech)
         yield name + "_odd", head + any_cut + any_cut.join(
             [literal(1, 2, 3), noise(440), voice(4040), literal()])
     yield "no_mics", bytes([200]) + number(0) + bytes([0]) + number(-7) + bytes([0]) + rate_16k + (
@@ -127,8 +127,8 @@ def script(text=""):
 
 def utterance_stream():
     take = bytes([0])
-    piece = lambda audio: bytes([AUDIO]) + audio
-    speech = b"".join(map(piece, [noise(5000), voice(5000), noise(4000), voice(5000, period=80),
+    chunk = lambda audio: bytes([AUDIO]) + audio
+    speech = b"".join(map(chunk, [noise(5000), voice(5000), noise(4000), voice(5000, period=80),
                                   noise(4000), literal(1, 2, 3)]))
     for rate in (0, 1):
         for content_type in (0, 2):
@@ -137,18 +137,18 @@ def utterance_stream():
         yield f"mcra_{rate}", settings(rate, 0, 0, 4, 8, 12, 1, 10) + script() + speech
     # Null audio ends an utterance at once: the shortest that there are.
     bursts = "50o " + "1s 1n " * 50
-    many = piece(noise(4000)) + (piece(voice(400)) + piece(constant(80, 0))) * 40
+    many = chunk(noise(4000)) + (chunk(voice(400)) + chunk(constant(80, 0))) * 40
     widest = (1 << 31) - 1
     for name, chosen in {"full_queue": (1,), "full_queue_padded": (1, 0, 0, 0, 1, 2),
                          "widest": (1, 1, -1, widest, widest, widest)}.items():
         yield name, settings(*chosen) + script(bursts) + many + take * 3
     # The first 10 s are 80000 samples.
     for name, audio in {"lead_in": speech * 5, "lead_in_flushed": speech, "lead_in_full": many * 8,
-                        "lead_in_short": piece(noise(760)),
-                        "lead_in_of_null": piece(constant(8000, 0)) * 11 + many}.items():
+                        "lead_in_short": chunk(noise(760)),
+                        "lead_in_of_null": chunk(constant(8000, 0)) * 11 + many}.items():
         yield name, settings(1, hangover=9, lead_in=1) + script() + audio + take * 9 + speech
-    yield "late_takes", settings(1) + script(bursts) + piece(noise(4000)) + (
-        (piece(voice(400)) + piece(constant(160, 0))) * 9 + take * 5) * 4
+    yield "late_takes", settings(1) + script(bursts) + chunk(noise(4000)) + (
+        (chunk(voice(400)) + chunk(constant(160, 0))) * 9 + take * 5) * 4
     yield "open_end", settings(1, 2, 0, 4, 9, 9) + script("50o 40s 3n 30s") + speech[:13]
     for name, chosen, text in [
             ("refused", (0, 0, 2, 4, 9, 9), "50o 19s 60o 20s 60o 10s 2n 9s 60o 10s 2n 20s 60o"),

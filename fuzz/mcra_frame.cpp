@@ -29,9 +29,9 @@ float read_exponent(Input &input) {
                                      : std::bit_cast<float>(number);
 }
 
-void require_invariants(const VADINFO &vad, std::int32_t answer) {
-  require(answer == 0 || answer == 1, "an answer is 0 or 1");
-  require(answer == 0 || vad.frameIndex > 0, "the first frame is not speech");
+void require_invariants(const VADINFO &vad, std::int32_t decision) {
+  require(decision == 0 || decision == 1, "a decision is 0 or 1");
+  require(decision == 0 || vad.frameIndex > 0, "the first frame is not speech");
   require(vad.frameSnr >= 0, "the frame's SNR is not negative");
   require(vad.calibrationPhase >= 0 && vad.calibrationPhase <= 6, "the last phase is 6");
   require(vad.calibrationIndex <= 215, "the calibration ends at 215");
@@ -43,13 +43,14 @@ void require_invariants(const VADINFO &vad, std::int32_t answer) {
     require(vad.noiseSmoothing[k] >= 2145336163, "noise keeps 0.999");
     require(vad.prioriSnr[k] >= 1, "an a priori SNR is never 0");
     require(vad.gain[k] >= 0 && vad.gain[k] < 1 << 21, "a gain is bounded");
-    require(vad.speechProb[k] == 0 || vad.speechProb[k] > 109521665, "small probabilities are cut");
+    require(vad.speechProb[k] == 0 || vad.speechProb[k] > 109521665,
+            "negligible probabilities are 0");
   }
   require(std::count(std::begin(vad.reserved), std::end(vad.reserved), 0) == 80, "reserved is 0");
 }
 
-void judge(VADINFO *vad, const std::vector<std::int16_t> &audio, std::int32_t length,
-           float exponent) {
+void process(VADINFO *vad, const std::vector<std::int16_t> &audio, std::int32_t length,
+             float exponent) {
   for (std::size_t at = 0; at + MCRA_FRAME_SAMPLES <= audio.size(); at += MCRA_FRAME_SAMPLES) {
     // Without spare capacity, so that reading or writing beyond it is noticed.
     std::vector<std::int16_t> frame(&audio[at], &audio[at] + MCRA_FRAME_SAMPLES);
@@ -69,7 +70,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   initialVADINFO(&vad);
   configure(*vad, input);
 
-  for (std::size_t heard = 0; !input.is_empty() && heard < kMaxSamples;) {
+  for (std::size_t pushed = 0; !input.is_empty() && pushed < kMaxSamples;) {
     switch (input.byte() % 8) {
       case 0:
         reset_MCRA_params(&vad);
@@ -90,8 +91,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
         const std::int32_t length = input.number();
         const float exponent = read_exponent(input);
         const std::vector<std::int16_t> audio = input.audio();
-        heard += audio.size();
-        judge(vad, audio, length, exponent);
+        pushed += audio.size();
+        process(vad, audio, length, exponent);
       }
     }
   }

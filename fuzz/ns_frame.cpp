@@ -1,5 +1,5 @@
 // Noise suppression and dynamics control through the flat interface: any mode, any number of
-// microphones, any cut and audio.
+// microphones, any chunk size and audio.
 #include <algorithm>
 
 #include "fuzz/input.h"
@@ -12,8 +12,10 @@ using orvalis::fuzz::require;
 using Audio = std::vector<std::int16_t>;
 
 constexpr std::size_t kMaxSamples = 48000;  // a longer input teaches nothing new
-constexpr std::size_t kTail = 320;          // a frame that is worked on whole, and the 160 samples
-constexpr std::int16_t kGuard = 12345;      // that the suppressor takes of it, stay within
+// A last frame that is processed whole, and the 160 samples that the suppressor takes of it, stay
+// within.
+constexpr std::size_t kTail = 320;
+constexpr std::int16_t kGuard = 12345;
 
 struct Suppressor {
   std::int32_t mics;
@@ -40,14 +42,14 @@ struct Suppressor {
     require(ProcessDoNSFrame(ns, audio.data(), count, output.data(), count + 1) == -1,
             "counts that differ are refused");
     const Audio before = audio;
-    const std::int32_t answer = ProcessDoNSFrame(ns, audio.data(), count, output.data(), count);
+    const std::int32_t result = ProcessDoNSFrame(ns, audio.data(), count, output.data(), count);
     if (frame == 0) {
-      require(answer == -1 && audio == before && output == before, "narrow band is refused");
+      require(result == -1 && audio == before && output == before, "narrow band is refused");
       return;
     }
     const std::int32_t frames = (count + frame - 1) / frame;
     processed += frames * frame;
-    require(answer == processed, "the samples of whole frames are counted");
+    require(result == processed, "the samples of whole frames are counted");
     require(mics == 1 || audio == before, "only one microphone overwrites the input");
     require(mics == 1 || mics == 2 || output == before, "nothing else suppresses");
     // The last frame begins within the audio; one microphone takes 160 samples from there.
@@ -61,8 +63,8 @@ void level(std::int64_t drc, std::int32_t rate, Audio audio) {
   const auto count = static_cast<std::int32_t>(audio.size());
   audio.resize(audio.size() + kTail, kGuard);
   const Audio before = audio;
-  const std::int32_t answer = ProcessDRC(drc, audio.data(), count);
-  require(answer == 0 || (answer == 1 && rate == 16000), "loud audio is told at 16 kHz alone");
+  const std::int32_t result = ProcessDRC(drc, audio.data(), count);
+  require(result == 0 || (result == 1 && rate == 16000), "loud audio is reported at 16 kHz only");
   require(rate == 16000 || audio == before, "other rates are left alone");
   const auto whole = (count + 159) / 160 * 160;
   require(std::equal(audio.begin() + whole, audio.end(), before.begin() + whole),
@@ -79,7 +81,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   const std::int64_t drc = InitializeDRC(rate, 0);
   require(drc != -1, "a dynamics control is created");
 
-  for (std::size_t heard = 0; !input.is_empty() && heard < kMaxSamples;) {
+  for (std::size_t pushed = 0; !input.is_empty() && pushed < kMaxSamples;) {
     const std::uint8_t what = input.byte();
     if (what % 16 == 0) {
       const std::int32_t count = input.number();
@@ -92,7 +94,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
       continue;
     }
     Audio audio = input.audio();
-    heard += audio.size();
+    pushed += audio.size();
     if (what % 2 == 0 && suppressor.frame != 0)
       audio.resize(audio.size() / static_cast<std::size_t>(suppressor.frame) *
                    static_cast<std::size_t>(suppressor.frame));

@@ -1,5 +1,5 @@
-// The utterance stream: any settings, cuts and order of calls. The finder within it also by itself,
-// on any decisions, for few bytes make no speech.
+// The utterance stream: any settings, chunk sizes and order of calls. The finder also by itself, on
+// any decisions, as few bytes make no speech.
 #include "stream/utterance_stream.h"
 
 #include <algorithm>
@@ -17,14 +17,14 @@ using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 using Samples = std::vector<std::int16_t>;
 
-constexpr std::size_t kMaxSamples = 96000;  // more than a lead-in is made of at 8 kHz
+constexpr std::size_t kMaxSamples = 96000;  // more than a lead-in searches at 8 kHz
 
-/// The utterances taken so far, each judged as it comes.
+/// The utterances taken so far, each checked as it comes.
 class Findings {
 public:
   const std::vector<Utterance> &all() const { return found_; }
 
-  void tell_earliest(std::int64_t start) {
+  void note_earliest(std::int64_t start) {
     require(start >= earliest_, "the earliest start never goes back");
     earliest_ = start;
   }
@@ -36,8 +36,9 @@ public:
     require(next.start >= earliest_, "no utterance starts before the earliest start");
     require(next.start < next.end, "an utterance holds samples");
     require(next.end <= pushed, "an utterance lies within the audio");
-    require(next.began > 0 && next.began <= next.ended, "answers begin before they end");
-    require(next.ended <= pushed, "answers lie within the audio");
+    require(next.began > 0 && next.began <= next.ended,
+            "decisions for speech begin before they end");
+    require(next.ended <= pushed, "decisions lie within the audio");
     require(next.open == 0 || next.open == 1, "open is 0 or 1");
     require(found_.empty() || found_.back().open == 0, "only the last utterance is open");
     found_.push_back(next);
@@ -54,10 +55,10 @@ public:
   explicit Listener(UtteranceSettings settings)
       : frame_samples_(orvalis::decision_timing(settings).frame_samples) {
     settings.on_frame = [](const UtteranceFrame *frame, void *user) {
-      auto &judged = static_cast<Listener *>(user)->judged_;
-      require(frame->start == judged, "frames follow one another");
+      auto &processed = static_cast<Listener *>(user)->processed_;
+      require(frame->start == processed, "frames follow one another");
       require(frame->speech == 0 || frame->speech == 1, "a decision is 0 or 1");
-      judged += frame->samples;
+      processed += frame->samples;
     };
     settings.user = this;
     stream_ = OpenUtteranceStream(&settings);
@@ -70,10 +71,10 @@ public:
   const std::vector<Utterance> &found() const { return findings_.all(); }
 
   bool take() {
-    findings_.tell_earliest(EarliestUtteranceStart(stream_));
+    findings_.note_earliest(EarliestUtteranceStart(stream_));
     Utterance next;
     const std::int32_t taken = NextUtterance(stream_, &next);
-    require(taken == 0 || taken == 1, "taking answers 0 or 1");
+    require(taken == 0 || taken == 1, "taking returns 0 or 1");
     if (taken == 1) findings_.take(next, pushed_);
     return taken == 1;
   }
@@ -101,18 +102,19 @@ public:
   void flush() {
     for (int i = 0; i < 2; ++i)
       require(FlushUtteranceStream(stream_) == pushed_ % frame_samples_,
-              "a flush answers with the samples behind the last whole frame");
+              "a flush returns the samples after the last whole frame");
     const std::int16_t sample = 1;
     require(PushUtteranceAudio(stream_, &sample, 1) == -1, "no audio is taken after the flush");
     take_all();
-    require(judged_ == pushed_ / frame_samples_ * frame_samples_, "every whole frame is judged");
+    require(processed_ == pushed_ / frame_samples_ * frame_samples_,
+            "every whole frame is processed");
   }
 
 private:
   std::int32_t frame_samples_;
   UtteranceStream *stream_ = nullptr;
   std::int64_t pushed_ = 0;
-  std::int64_t judged_ = 0;
+  std::int64_t processed_ = 0;
   Findings findings_;
 };
 
@@ -125,7 +127,7 @@ void try_finder(const UtteranceSettings &settings, Input &input) {
   Findings findings;
   std::int64_t processed = 0;
   const auto take_all = [&] {
-    findings.tell_earliest(queue.front() ? queue.front()->start : finder.earliest_start());
+    findings.note_earliest(queue.front() ? queue.front()->start : finder.earliest_start());
     for (Utterance next; queue.pop(next);) findings.take(next, processed);
   };
   for (int runs = input.byte(), run = 0; run < runs; ++run) {
@@ -162,8 +164,8 @@ UtteranceSettings read_settings(Input &input) {
   return settings;
 }
 
-bool is_from(std::int32_t value, std::int32_t least, std::int32_t most) {
-  return value >= least && value <= most;
+bool is_from(std::int32_t value, std::int32_t min, std::int32_t max) {
+  return value >= min && value <= max;
 }
 
 bool is_valid(const UtteranceSettings &settings) {
@@ -189,28 +191,28 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   }
   try_finder(settings, input);
 
-  Listener cut(settings);
-  Samples heard;
-  while (!input.is_empty() && heard.size() < kMaxSamples) {
+  Listener chunked(settings);
+  Samples pushed;
+  while (!input.is_empty() && pushed.size() < kMaxSamples) {
     if (input.byte() % 8 == 0) {
-      cut.take();
+      chunked.take();
     } else {
       const Samples audio = input.audio();
-      heard.insert(heard.end(), audio.begin(), audio.end());
-      cut.push(audio);
+      pushed.insert(pushed.end(), audio.begin(), audio.end());
+      chunked.push(audio);
     }
   }
-  cut.flush();
+  chunked.flush();
 
   Listener whole(settings);
-  whole.push(heard);
+  whole.push(pushed);
   whole.flush();
   static_assert(std::has_unique_object_representations_v<Utterance>);
-  require(cut.found().size() == whole.found().size() &&
-              std::equal(cut.found().begin(), cut.found().end(), whole.found().begin(),
+  require(chunked.found().size() == whole.found().size() &&
+              std::equal(chunked.found().begin(), chunked.found().end(), whole.found().begin(),
                          [](const Utterance &a, const Utterance &b) {
                            return std::memcmp(&a, &b, sizeof a) == 0;
                          }),
-          "no utterance is lost or depends on the cut");
+          "no utterance is lost or depends on the chunk size");
   return 0;
 }

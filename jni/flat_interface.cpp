@@ -1,4 +1,4 @@
-// The flat C interface: judges arguments, then forwards. The core behind it trusts them.
+// The flat C interface: checks arguments, then forwards. The core behind it trusts them.
 #include <cstdint>
 
 #include "Voice_Engine/drc/dynamics_control.h"
@@ -13,7 +13,7 @@
 
 namespace {
 
-// What the frame calls of the detector have in common.
+// What the frame calls of the detector share.
 int32_t process_frames(EpdInstance *epd, const int16_t *pcm, int32_t numSample, int32_t contentType,
                        EpdReasons *wanted = nullptr) {
   if (pcm == nullptr && numSample > 0) return -1;
@@ -23,11 +23,11 @@ int32_t process_frames(EpdInstance *epd, const int16_t *pcm, int32_t numSample, 
   return result;
 }
 
-constinit orvalis::S2chnsState process_wide_pair{};  // of all suppressors of two microphones
+constinit orvalis::S2chnsState process_wide_pair{};  // shared by all two-microphone suppressors
 
 constexpr int64_t kNoDrc = -1;
 
-/// Null for what no creation returns as a handle.
+/// Null for a number that is no handle.
 DrcInstance *drc_of(int64_t handle) {
   return handle == kNoDrc ? nullptr
                           : reinterpret_cast<DrcInstance *>(static_cast<intptr_t>(handle));

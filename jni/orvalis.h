@@ -4,7 +4,7 @@
  * Orvalis is the front end that a voice application puts before its recogniser. It decides when
  * somebody speaks (end-point detection, EPD), suppresses the noise around them with one microphone
  * or two (noise suppression, NS), evens out how loud they are (dynamics control, DRC), and measures
- * how loud a block of samples is and what its spectrum looks like (queries).
+ * the energy and the spectrum of a block of samples (queries).
  *
  *
  * Which interface do I want?
@@ -18,7 +18,7 @@
  *   a decision on each frame, confirmed over   InitializeEPD and others    here
  *     several frames, noise suppressed before
  *   what led to it                             ProcessEPDFrameExplained    here, epd_reasons.h
- *   a decision on each frame at once, and      processVAD, explainVAD      MCRAvad.h
+ *   an immediate decision on each frame, and   processVAD, explainVAD      MCRAvad.h
  *     what led to it: the MCRA detector
  *   noise suppression frame by frame           InitializeDoNS and others   here
  *   dynamics control frame by frame            InitializeDRC and others    here
@@ -29,7 +29,7 @@
  *                                              Noscale_FFT                 noscale_fft_512p.h
  *   its elementary functions                   ZOLT_L_log and others       Math_baseop.h
  *
- * Take a stream unless you have a reason not to: it asks nothing of its caller but samples.
+ * Use a stream unless you have a reason not to: it needs nothing but samples.
  *
  *
  * Audio
@@ -48,10 +48,9 @@
  * WARNING: PASS WHOLE FRAMES TO ProcessDoNSFrame AND ProcessDRC. A partial last frame is read and
  * written WHOLE, beyond the given count and so beyond the end of the buffer.
  *
- * WARNING: ONE TWO-MICROPHONE SUPPRESSOR A PROCESS. All instances created with micCount 2 share one
- * state. Creating a second one resets the first, and their calls must not be interleaved or
- * overlap. All other instances are independent of one another, and so are enhancement streams, with
- * two microphones too.
+ * WARNING: A PROCESS HAS ONE TWO-MICROPHONE SUPPRESSOR. All instances created with micCount 2 share
+ * one state. Creating a second one resets the first, and their calls must not be interleaved or
+ * overlap. All other instances are independent of one another, and so are all enhancement streams.
  *
  *
  * A worked example: feed a recording frame by frame, print where the decision changes
@@ -78,8 +77,8 @@
  *
  * (tests/example_epd.c is this example; it is compiled and run as C and as C++.)
  *
- * Decisions come late by design: speech is confirmed by a run of voiced frames, and ended by a
- * pause. The utterance stream dates both back.
+ * Decisions are late by design: a run of voiced frames confirms speech, and a pause ends it. The
+ * utterance stream dates both back.
  *
  *
  * Threads
@@ -112,7 +111,7 @@ const char *GetVersion(void);
 
 /*
  * Changes when a struct or a function of a public header changes incompatibly. A program compares
- * what the library answers with what its own headers say.
+ * what the library returns with what its own headers say.
  */
 #define ORVALIS_ABI_VERSION 1
 int32_t OrvalisAbiVersion(void);
@@ -133,7 +132,7 @@ typedef struct EpdInstance EpdInstance;
 #define ORVALIS_EPD_16K 0
 #define ORVALIS_EPD_8K  1000
 
-/* Frames at the beginning that are never speech: the detector learns the noise from them. */
+/* Initial noise frames: never speech, the detector learns the noise from them. */
 #define ORVALIS_EPD_LEARNING 39
 
 /*
@@ -145,10 +144,10 @@ typedef struct EpdInstance EpdInstance;
  *   gain       0         input as it is
  *              1         input divided by 4 (arithmetic shift)
  *              2         input multiplied by 4; WRAPS AROUND beyond 16 bits
- *              other     as 0
+ *              other     same as 0
  *   rate       0         16 kHz, frames of 160 samples
  *              1         8 kHz, frames of 80 samples
- *              2..9      as 0
+ *              2..9      same as 0
  *   sub-mode   0..3      appears in the log only; others count as 0
  *
  *   0 = 16 kHz   1000 = 8 kHz   10000 = 16 kHz with input / 4   21000 = 8 kHz with input * 4
@@ -156,7 +155,7 @@ typedef struct EpdInstance EpdInstance;
  * The fields of a negative mode are negative or 0; a negative rate field selects 8 kHz.
  *
  * pcmDumpEnabled: 1 appends raw 16-bit PCM to two files named after the handle in decimal,
- * "/sdcard/VRpreprocess/<handle>_inputEPD.pcm" (what was judged, before suppression) and
+ * "/sdcard/VRpreprocess/<handle>_inputEPD.pcm" (the frames before suppression) and
  * "..._resultEPD.pcm" (for every sample 0, 1000 = speech or 2000 = end of speech). A file that
  * cannot be opened is silently not written. Any other value writes none.
  *
@@ -172,9 +171,9 @@ EpdInstance *InitializeEPD(int32_t mode, int32_t pcmDumpEnabled);
  *   0    none was; or numSample < 1; or the buffer ends in a partial frame
  *   -1   epd is NULL, or pcm is NULL though numSample > 0
  *
- * Best pass one frame at a time, as all frames of a call share one return value. If a buffer ends
- * in a partial frame, its whole frames are processed all the same, but the call returns 0 and none
- * of its samples is counted.
+ * Pass one frame at a time if you can, as all frames of a call share one return value. If a buffer
+ * ends in a partial frame, its whole frames are still processed, but the call returns 0 and none of
+ * its samples is counted.
  *
  * A frame with more than 60 zero samples in a row is null audio: it is not processed and counts as
  * no speech. The first ORVALIS_EPD_LEARNING frames that are processed are never speech. At 16 kHz
@@ -182,8 +181,8 @@ EpdInstance *InitializeEPD(int32_t mode, int32_t pcmDumpEnabled);
  * if fewer than 120 of its samples have a magnitude of 1 to 4, else after three such frames in a
  * row, and in any case after 200 ms.
  *
- * Speech is reported from the 6th voiced frame in a row on. It ends when 25 frames of pause have
- * added up; 4 voiced frames in a row set that count back to 0.
+ * Speech is reported from the 6th voiced frame in a row on. It ends after 25 frames of pause; these
+ * add up over several pauses until 4 voiced frames in a row reset the count.
  */
 int32_t ProcessEPDFrame(EpdInstance *epd, const int16_t *pcm, int32_t numSample);
 
@@ -205,21 +204,21 @@ int32_t ProcessEPDFrameByMode(EpdInstance *epd, const int16_t *pcm, int32_t numS
                               int32_t mode);
 
 /*
- * Does what ProcessEPDFrameByCnttype does, and tells why: sets `reasons` to what led to the
- * decision on the last frame of the buffer that was processed (see epd_reasons.h). `reasons` may be
- * NULL. It stays as it is if the call returns -1 because pcm is NULL.
+ * Does what ProcessEPDFrameByCnttype does, and sets `reasons` to what led to the decision on the
+ * last frame that was processed (see epd_reasons.h). `reasons` may be NULL. It is not changed if
+ * the call returns -1 because pcm is NULL.
  */
 int32_t ProcessEPDFrameExplained(EpdInstance *epd, const int16_t *pcm, int32_t numSample,
                                  int32_t contentType, EpdReasons *reasons);
 
 /*
- * Forgets the utterance in progress and turns hangover log lines on again. What the detector has
- * learnt about the noise stays, and so does the count of frames. Returns 0, or -1 if epd is NULL.
+ * Drops the utterance in progress and turns hangover log lines on again. The noise estimate and the
+ * count of frames stay. Returns 0, or -1 if epd is NULL.
  */
 int32_t ResetEPDparams(EpdInstance *epd);
 
 /*
- * Turns the hangover log lines of this detector off until the next reset. `value` is not used.
+ * Turns the detector's hangover log lines off until the next reset. `value` is not used.
  * Returns 0, or -1 if epd is NULL.
  */
 int32_t setLogging(EpdInstance *epd, int32_t value);
@@ -238,7 +237,7 @@ typedef struct NsInstance NsInstance;
 #define ORVALIS_NS_13DB 0
 #define ORVALIS_NS_18DB 2
 
-/* By how many samples of a microphone the output is late. */
+/* Delay of the output in samples a microphone. */
 #define ORVALIS_NS_DELAY_1MIC 48
 #define ORVALIS_NS_DELAY_2MIC 160
 
@@ -249,24 +248,24 @@ typedef struct NsInstance NsInstance;
  *   1          ORVALIS_NS_13DB    160               13 dB         48 samples
  *   1          ORVALIS_NS_18DB    160               18.4 dB       48 samples
  *   2          any                320: 160 pairs    12 to 15 dB   160 pairs
- *   other      any                as for 1          nothing       none
+ *   other      any                same as 1         nothing       none
  *
- * 18.4 dB costs speech quality; 13 dB is the better choice unless pauses have to be very quiet.
+ * 18.4 dB costs speech quality; take 13 dB unless pauses have to be very quiet.
  * `unused` is not used. Returns NULL if memory runs out.
  *
- * WARNING: with one microphone LEAVE THE THOUSANDS OF THE MODE AT 0. They are a rate digit, of
- * which no other value is of use: 1 (8 kHz) makes every frame call return -1, 2 takes frames of 320
- * samples, and 3 to 9 take frames of 80. The suppressor works on 160 samples of each frame all the
- * same: with frames of 80 it READS AND WRITES 80 SAMPLES BEYOND THE END of both buffers.
+ * WARNING: with one microphone LEAVE THE THOUSANDS OF THE MODE AT 0. They are a rate digit, and no
+ * other value is useful: 1 (8 kHz) makes every frame call return -1, 2 takes frames of 320 samples,
+ * 3 to 9 take frames of 80. The suppressor still processes 160 samples of each frame: with frames
+ * of 80 it READS AND WRITES 80 SAMPLES BEYOND THE END of both buffers.
  */
 NsInstance *InitializeDoNS(int32_t mode, int32_t micCount, int32_t unused);
 
 /*
  * Suppresses the noise of numIn samples, whole frames. numOut must be equal to numIn.
  *
- * Fill `out` BEFORE the call, as a rule with the delayed input: a frame that is not suppressed
- * leaves its part of `out` as it is. This call is the hardest of the library; the enhancement
- * stream (enhancement_stream.h) asks for nothing of the kind. By hand:
+ * Fill `out` BEFORE the call, usually with the delayed input: a frame that is not suppressed leaves
+ * its part of `out` as it is. This is the hardest call of the library; the enhancement stream
+ * (enhancement_stream.h) does all of it for you. By hand:
  *
  *     #include <string.h>
  *     #include "orvalis.h"
@@ -315,10 +314,10 @@ int32_t FreeMemoryNS(NsInstance *ns);
 /*
  * Creates a dynamics control, which levels recorded speech: +12 dB for frames that peak below an
  * eighth of full scale (-18 dBFS), 3:1 compression above, 0 dB at full scale. The gain rises with a
- * time constant of 12.5 ms, from silence at the start, and falls with one of 0.2 s. There is no
- * delay. Speech that sets in loudly after a pause may clip until the gain has followed.
+ * time constant of 12.5 ms, starting from silence, and falls with one of 0.2 s. There is no delay.
+ * Speech that sets in loudly after a pause may clip until the gain has followed.
  *
- * samplingRate: 16000; any other is accepted, and its audio left as it is.
+ * samplingRate: 16000; with any other, audio is left as it is.
  * pcmDumpEnabled: 1 appends raw 16-bit PCM to "/sdcard/<handle>_beforeDRC.pcm" and
  * "..._afterDRC.pcm".
  *
@@ -331,8 +330,8 @@ int64_t InitializeDRC(int32_t samplingRate, int32_t pcmDumpEnabled);
  *
  * WARNING: a partial last frame is read and written WHOLE, beyond numSample.
  *
- *   1    the audio was loud after at least one frame of the call: more than 100 input samples of
- *        the last ten frames, the newest one counted twice, were beyond a quarter of full scale
+ *   1    the audio was loud at least once in the call: after a frame, more than 100 input samples
+ *        of the last ten frames, the newest counted twice, were beyond a quarter of full scale
  *   0    it was not; or numSample < 1; or the rate is not 16000
  *   -1   drc is 0 or -1, or pcm is NULL though numSample > 0
  */
@@ -351,7 +350,7 @@ int32_t FreeMemoryDRC(int64_t drc);
 
 /*
  * Energy of a block in whole dB: 10 log10 of the variance of its n samples, truncated. 0 for a
- * constant, 90 for a square wave of full scale; 0 if n < 1 or pcm is NULL.
+ * constant, 90 for a full-scale square wave; 0 if n < 1 or pcm is NULL.
  */
 int32_t computeEnergy(const int16_t *pcm, int32_t n);
 
@@ -395,10 +394,10 @@ void SetLogSink(void (*sink)(int priority, const char *tag, const char *text, vo
 
 /*
  * Puts a directory in front of the dump files' paths: with "/tmp/run" they are written to
- * "/tmp/run/sdcard/VRpreprocess/" and "/tmp/run/sdcard/". The string is copied; NULL or "" puts
- * nothing in front. The library creates no folders. Set it before creating instances.
+ * "/tmp/run/sdcard/VRpreprocess/" and "/tmp/run/sdcard/". The string is copied; NULL or "" removes
+ * it. The library creates no folders. Set it before creating instances.
  *
- * Returns 0, or -1 if the root is too long for the 256-byte path buffers (nothing changes then).
+ * Returns 0, or -1, with nothing changed, if the root is too long for the 256-byte path buffers.
  */
 int32_t SetDumpRoot(const char *directory);
 

@@ -1,11 +1,11 @@
 /*
  * enhancement_stream.h - better audio from audio in chunks of any size
  *
- * The suppressor and the dynamics control of orvalis.h work on whole frames, the suppressor gives
- * its output late, and leaves frames to its caller where it has nothing to say. This stream does
- * what callers then write by hand: it takes 16 kHz audio in chunks of any size, cuts frames, puts
- * the delayed input where the suppressor puts nothing out, makes up for the delay, and draws out
- * the end. No sample depends on how the audio was cut.
+ * The suppressor and the dynamics control of orvalis.h process whole frames. The suppressor delays
+ * its output, and leaves frames that it does not suppress to its caller. This stream does what
+ * callers would then write by hand: it takes 16 kHz audio in chunks of any size, makes frames of
+ * it, fills in the delayed input where nothing is suppressed, makes up for the delay, and flushes
+ * the end. No sample depends on the chunk size.
  *
  *
  * A worked example: a recording without its noise, and levelled
@@ -48,29 +48,29 @@
  *   2             13               the first microphone, without the noise of     160
  *                                  both; noise falls by up to 14 dB
  *
- * Where the suppressor puts nothing out, the first microphone appears as it came in, as late as the
- * rest: in null audio, while the level settles, and in very quiet frames of two microphones (see
+ * Frames that are not suppressed give the first microphone unchanged, with the same delay: null
+ * audio, the time until the level settles, and very quiet frames of two microphones (see
  * ProcessDoNSFrame in orvalis.h). With `level` all of this is levelled (see ProcessDRC), in frames
- * of 160 samples from the first that belongs to the input.
+ * of 160 samples that begin with the first sample of the input.
  *
  * Of n samples a microphone, an aligned stream gives n: sample i of the output belongs to sample i
- * of the input. One that is not aligned gives the delay in front of the same samples, n + delay
+ * of the input. One that is not aligned gives the same samples with the delay in front, n + delay
  * altogether, and so gives them a little earlier. Of no audio either gives none.
  *
- * The last frame is filled, and what the delay holds back drawn out, with the end of the audio
- * mirrored. Zeros would be null audio, and no speech ends so abruptly.
+ * The last frame is completed, and the delay flushed, with the end of the audio mirrored. Zeros
+ * would be null audio, and no speech ends so abruptly.
  *
  *
  * Room
  * ----
  * Samples come out in whole frames: a push gives at most numSample / microphones + 160, a flush at
  * most ENHANCEMENT_HELD_BACK. An `out` with room for as many samples as are pushed and
- * ENHANCEMENT_HELD_BACK more is always large enough. If it is too small for what would come out,
- * the call answers -1 and does nothing: no audio is taken and none lost, and the same call with
- * more room, or one with less audio, goes on where the stream was.
+ * ENHANCEMENT_HELD_BACK more is always large enough. If it is too small, the call returns -1 and
+ * does nothing: no audio is taken and none lost. The same call with more room, or one with less
+ * audio, goes on where the stream was.
  *
- * Threads: streams are independent, those of two microphones too, of each other and of every handle
- * of orvalis.h. Calls on one stream must not overlap. Memory: all of it is taken in
+ * Threads: streams are independent of each other and of every handle of orvalis.h, with two
+ * microphones too. Calls on one stream must not overlap. Memory: allocated only in
  * OpenEnhancementStream.
  */
 #ifndef ORVALIS_ENHANCEMENT_STREAM_H
@@ -88,17 +88,17 @@ typedef struct EnhancementSettings {
   int32_t microphones;    /* 1, or 2: interleaved pairs, the first microphone first */
   int32_t suppression_db; /* 0 for none, 13, or with one microphone 18 */
   int32_t level;          /* 1: dynamics control, 0: none */
-  int32_t aligned;        /* 1: the output is not late, 0: it keeps the delay */
+  int32_t aligned;        /* 1: the output is not delayed, 0: it keeps the delay */
 } EnhancementSettings;
 
 /* One microphone, 13 dB, not levelled, aligned. */
 #define ENHANCEMENT_SETTINGS_DEFAULT \
   { 1, 13, 0, 1 }
 
-/* The most samples that a stream holds back, and a flush gives. */
+/* Maximum number of samples that a stream holds back, and that a flush gives. */
 #define ENHANCEMENT_HELD_BACK 319
 
-/* Opens a stream. NULL if memory runs out, settings is NULL or a setting is none of the above. */
+/* Opens a stream. NULL if memory runs out, settings is NULL or a setting is not in the table. */
 EnhancementStream *OpenEnhancementStream(const EnhancementSettings *settings);
 
 /* The delay in samples, which an aligned stream makes up for: 0, 48 or 160; -1 if stream is NULL.
@@ -126,18 +126,18 @@ int32_t PushEnhancementAudio(EnhancementStream *stream, const int16_t *pcm, int3
  */
 int32_t FlushEnhancementStream(EnhancementStream *stream, int16_t *out, int32_t room);
 
-/* How often something was met. */
+/* How often something occurred. */
 typedef struct EnhancementCount {
   int64_t count;
-  int64_t first; /* which sample of a microphone it was, from 0; -1 if it was not met */
+  int64_t first; /* the first time: sample of a microphone, from 0; -1 for never */
 } EnhancementCount;
 
-/* What was met since the stream was opened. Full scale is 32767 and -32768. */
+/* What occurred since the stream was opened. Full scale is 32767 and -32768. */
 typedef struct EnhancementCounts {
   EnhancementCount clipped_in;  /* samples of the input at full scale, of all microphones */
   EnhancementCount loud_frames; /* frames that dynamics control found loud; see ProcessDRC */
   EnhancementCount clipped_out; /* samples of the output at full scale */
-  int64_t is_loud;              /* 1 if the newest of these frames was loud */
+  int64_t is_loud;              /* 1 if the latest frame was loud */
 } EnhancementCounts;
 
 /* Stores the counts. Returns 0, or -1 if a pointer is NULL. */

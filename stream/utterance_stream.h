@@ -1,10 +1,10 @@
 /*
  * utterance_stream.h - utterances from audio in chunks of any size
  *
- * A detector decides frame by frame, some of it late, and leaves the hangover to its caller. This
- * stream does what callers then write by hand, for either detector of the library: it takes audio
- * in chunks of any size, dates the decisions back, joins what a short silence has cut, leaves out
- * what is too short, pads, and hands out utterances. No result depends on how the audio was cut.
+ * A detector decides frame by frame, partly with a delay, and leaves the hangover to its caller.
+ * This stream does what callers would then write by hand, for either detector of the library: it
+ * takes audio in chunks of any size, dates decisions back, joins speech over short silences, drops
+ * what is too short, pads, and hands out utterances. No result depends on the chunk size.
  *
  *
  * A worked example
@@ -38,49 +38,50 @@
  * The detectors
  * -------------
  *   UTTERANCE_CHANNEL_ENERGY   that of orvalis.h: confirms speech over several frames, and at
- *                              16 kHz suppresses the noise before
- *   UTTERANCE_MCRA             that of MCRAvad.h: decides each frame at once. Takes no input_gain,
- *                              content_type or pcm_dump, but a configuration of its own
+ *                              16 kHz suppresses the noise first
+ *   UTTERANCE_MCRA             that of MCRAvad.h: decides on each frame at once. It has its own
+ *                              configuration instead of input_gain, content_type and pcm_dump
  *
  *
  * From decisions to utterances
  * ----------------------------
- * A run of decisions for speech is a piece. A piece is dated back by the detector's own delay, here
- * in ms, clipped to the input and to the previous piece:
+ * A run of decisions for speech is a segment. It is dated back by the detector's own delay, here in
+ * ms, but not before the start of the input or the end of the previous segment:
  *
  *   detector         content type   start   end at 16 kHz   end at 8 kHz
  *   channel energy   0, 1           50      250             280
  *                    2 and more     30      140             170
  *   MCRA             0              0       0               0
  *
- * The channel-energy detector judges frames of 10 ms, the MCRA detector frames of 160 samples.
+ * The channel-energy detector decides on frames of 10 ms, the MCRA detector on frames of 160
+ * samples.
  *
  * To the channel-energy detector null audio (a frame with more than 60 zero samples in a row) is
- * silence. A piece that it interrupts ends with its last frame of speech, not dated back; if the
- * detector decides for speech in the first frame that is not null again, the piece that begins
- * there is not dated back either. For content types of 2 and more a piece of at most 19 frames is
- * one that the detector refused as too short; it is not handed out.
+ * silence. A segment that it interrupts ends with its last frame of speech, not dated back; if the
+ * first frame after the null audio is speech again, the segment that begins there is not dated back
+ * either. For content types of 2 and more, a segment of at most 19 frames is one that the detector
+ * refused as too short; it is dropped.
  *
- * Pieces join when a decision for speech comes at most `hangover_ms` after the last one; what then
- * holds less than `min_speech_ms` is left out. Padding lengthens an utterance but never crosses a
- * neighbour: each of two owns half of the gap between them.
+ * Segments are joined if a decision for speech comes at most `hangover_ms` after the last one; what
+ * then holds less than `min_speech_ms` is dropped. Padding lengthens an utterance but never reaches
+ * into its neighbour: each of two may take half of the gap between them.
  *
  *
  * The first word of a recording
  * -----------------------------
  * The channel-energy detector learns the noise first and never decides for speech in its first 39
- * frames, so that a recording that begins with speech seems to begin with it after 0.39 s. With
- * `lead_in` the detector hears 0.6 s ahead of the recording that are made of it: the 100 ms of
- * least variance among the first 10 s, without null audio, forwards and backwards in turn. Nothing
- * else knows of them: positions, frames and dump files are those of the audio alone.
+ * frames, so that speech at the very beginning of a recording is found only after 0.39 s. With
+ * `lead_in` the detector first processes 0.6 s made from the recording: the 100 ms of minimum
+ * variance among the first 10 s, without null audio, forwards and backwards in turn. Nothing else
+ * is affected: positions, frames and dump files are those of the audio alone.
  *
  * For that the stream holds the first 10 s (320 KB at 16 kHz). Utterances in them are decided once
- * they are complete or flushed: the call that completes them, and NextUtterance while the queue was
- * full, judge up to 1000 frames at once. Leave it off for live audio, which begins with a pause of
- * 0.39 s as a rule.
+ * the 10 s are complete or flushed: the call that completes them, and NextUtterance if the queue
+ * was full, process up to 1000 frames at once. Leave it off for live audio, which usually begins
+ * with a pause of 0.39 s.
  *
  *
- * Threads: as for an EPD instance. Memory: all of it is taken in OpenUtteranceStream.
+ * Threads: as for an EPD instance. Memory: allocated only in OpenUtteranceStream.
  */
 #ifndef ORVALIS_UTTERANCE_STREAM_H
 #define ORVALIS_UTTERANCE_STREAM_H
@@ -107,7 +108,7 @@ typedef struct McraSettings {
   float exponent;
 } McraSettings;
 
-/* Noise may only fall, and nothing is calibrated. */
+/* The noise estimate may only fall; no calibration. */
 #define MCRA_SETTINGS_DEFAULT \
   { 0, 2, 0, 0, 0, 0.84f }
 
@@ -125,21 +126,21 @@ typedef struct UtteranceSettings {
   int32_t rate_hz;       /* 16000 or 8000 */
   int32_t input_gain;    /* 0: as it is, 1: divided by 4, 2: multiplied by 4 (wrapping) */
   int32_t content_type;  /* timing of the detector: 0, 1, or 2 and more; see orvalis.h */
-  int32_t hangover_ms;   /* longest time between decisions for speech that joins; 0 joins none */
+  int32_t hangover_ms;   /* maximum time between decisions for speech that are joined; 0: none */
   int32_t pad_before_ms; /* 0 or more, added before an utterance */
   int32_t pad_after_ms;  /* 0 or more, added after it */
   int32_t pcm_dump;      /* 1 writes the detector's dump files; see InitializeEPD in orvalis.h */
   int32_t detector;      /* UTTERANCE_CHANNEL_ENERGY or UTTERANCE_MCRA */
-  int32_t min_speech_ms; /* 0 or more: less speech, without padding, is no utterance */
+  int32_t min_speech_ms; /* 0 or more: minimum length of an utterance, without padding */
   int32_t lead_in;       /* 1: for recordings, whose first word may come at once; see above */
 
   /* Read by OpenUtteranceStream. NULL: MCRA_SETTINGS_DEFAULT, or another detector. */
   const McraSettings *mcra;
 
-  /* Unless NULL, called for each frame once it is judged, from within calls that take the stream,
-   * none of which it may make itself. What `frame` points to is valid until it returns. */
+  /* Unless NULL, called with each decision, from within calls on the stream; it must not make such
+   * calls itself. What `frame` points to is valid until it returns. */
   void (*on_frame)(const UtteranceFrame *frame, void *user);
-  void *user; /* what on_frame gets */
+  void *user; /* passed to on_frame */
 } UtteranceSettings;
 
 /* Channel energy at 16 kHz, no gain, content type 0, half a second of hangover, and padding that
@@ -151,13 +152,13 @@ typedef struct UtteranceSettings {
 typedef struct Utterance {
   int64_t start;  /* first sample */
   int64_t end;    /* one past the last sample */
-  int64_t began;  /* samples judged when the first decision for speech was taken */
-  int64_t ended;  /* samples judged when the last one was taken */
+  int64_t began;  /* samples processed up to the first decision for speech */
+  int64_t ended;  /* samples processed up to the last one */
   int32_t number; /* 1, 2, 3 ... */
   int32_t open;   /* 1 if the last frame of the audio was speech */
 } Utterance;
 
-/* Utterances that may wait in a stream. */
+/* Number of utterances that may wait in a stream. */
 #define UTTERANCE_QUEUE_LENGTH 16
 
 /* Opens a stream. NULL if memory runs out, settings is NULL, a setting is out of range, or the
@@ -165,8 +166,8 @@ typedef struct Utterance {
 UtteranceStream *OpenUtteranceStream(const UtteranceSettings *settings);
 
 /*
- * Judges audio. Returns how many of the numSample samples were taken: fewer only when the queue is
- * full; take utterances and push the rest. -1 if stream is NULL, if pcm is NULL though
+ * Processes audio. Returns how many of the numSample samples were taken: fewer only when the queue
+ * is full; take utterances and push the rest. -1 if stream is NULL, if pcm is NULL though
  * numSample > 0, if numSample < 0, or after the flush.
  */
 int32_t PushUtteranceAudio(UtteranceStream *stream, const int16_t *pcm, int32_t numSample);
@@ -175,15 +176,15 @@ int32_t PushUtteranceAudio(UtteranceStream *stream, const int16_t *pcm, int32_t 
 int32_t NextUtterance(UtteranceStream *stream, Utterance *utterance);
 
 /*
- * The first sample that an utterance still to be taken may hold: a caller that keeps audio to cut
- * utterances from it can forget what is before. It never goes back. -1 if stream is NULL.
+ * The first sample that an utterance still to be taken may hold: a caller that keeps audio to
+ * extract utterances from it can drop what is before. It never decreases. -1 if stream is NULL.
  */
 int64_t EarliestUtteranceStart(const UtteranceStream *stream);
 
 /*
- * Ends the audio and closes what is open. Whatever the queue holds, NextUtterance then hands out
- * all that is left. Returns the number of samples behind the last whole frame, which were not
- * judged (0..159), also when called again; -1 if stream is NULL.
+ * Ends the audio and closes what is open. NextUtterance then hands out all that is left, even if it
+ * exceeds the queue. Returns the number of samples after the last whole frame, which are not
+ * processed (0..159), also when called again; -1 if stream is NULL.
  */
 int32_t FlushUtteranceStream(UtteranceStream *stream);
 

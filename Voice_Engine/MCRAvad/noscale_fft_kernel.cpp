@@ -83,10 +83,18 @@ UnscaledPlan plan_of() {
   }
 }
 
-/// x[j] becomes x[i] - x[j] * w, x[i] becomes x[i] + x[j] * w, with w = cosine - i * sine.
-inline void butterfly(Word64 *re, Word64 *im, int i, int j, Word32 cosine, Word32 sine) {
-  const Word64 product_re = wrapping_add(L64_mult_q31(im[j], sine), L64_mult_q31(re[j], cosine));
-  const Word64 product_im = wrapping_sub(L64_mult_q31(im[j], cosine), L64_mult_q31(re[j], sine));
+/// The twiddle factor cosine - i * sine.
+struct Twiddle {
+  Word32 cosine;
+  Word32 sine;
+};
+
+/// x[j] becomes x[i] - x[j] * w, x[i] becomes x[i] + x[j] * w.
+inline void butterfly(Word64 *re, Word64 *im, int i, int j, Twiddle w) {
+  const Word64 product_re =
+      wrapping_add(L64_mult_q31(im[j], w.sine), L64_mult_q31(re[j], w.cosine));
+  const Word64 product_im =
+      wrapping_sub(L64_mult_q31(im[j], w.cosine), L64_mult_q31(re[j], w.sine));
   re[j] = wrapping_sub(re[i], product_re);
   re[i] = wrapping_add(re[i], product_re);
   im[j] = wrapping_sub(im[i], product_im);
@@ -130,7 +138,7 @@ void unscaled_fft(Direction direction, Word64 *re, Word64 *im) {
       const Word32 sine = plan.sines[k * step];
       const Word32 cosine = plan.sines[k * step + kPoints / 4];
       for (int i = k; i < kPoints; i += 2 * half) {
-        butterfly(re, im, i, i + half, cosine, inverse ? -sine : sine);
+        butterfly(re, im, i, i + half, {cosine, inverse ? -sine : sine});
       }
     }
   }

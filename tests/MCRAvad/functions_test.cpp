@@ -1,5 +1,5 @@
-// The functions of the extended mathematics: how far from the truth over their whole range, bit for
-// bit where every step is settled, and their fixed points.
+// The functions of the extended mathematics: errors over their whole range, every bit where the
+// steps are defined, and fixed points.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -24,7 +24,8 @@ struct ErrorRange {
     least = std::min(least, error);
     most = std::max(most, error);
   }
-  /// Holds both ends, and that the sweep came near them: a bound much too wide says nothing.
+  /// Checks both bounds, and that the sweep came near them: a bound that is much too wide proves
+  /// nothing.
   void expect(const char *name, double lower, double upper) const {
     EXPECT_TRUE(lower <= least && least <= 0.75 * lower && 0.75 * upper <= most && most <= upper)
         << name << ": " << least << " to " << most << ", not " << lower << " to " << upper;

@@ -25,7 +25,7 @@ public:
   }
   VADINFO *operator->() const { return info_.get(); }
   VADINFO &operator*() const { return *info_; }
-  std::int32_t hear(Pcm frame) const {
+  std::int32_t process(Pcm frame) const {
     VADINFO *vad = info_.get();
     return processVAD(&vad, frame.data(), 160, 0.84F);
   }
@@ -95,7 +95,7 @@ TEST(McraAnalysis, EveryFieldFollowsTheSteps) {
       const Detector vad(keeps_history);
       McraModel model;
       for (std::size_t i = from_loudest ? silence_ends : 0; i < frames.size(); ++i) {
-        vad.hear(frames[i]);
+        vad.process(frames[i]);
         model.analyse(frames[i], keeps_history);
         expect_same_analysis(*vad, model.state());
         if (HasFailure()) FAIL() << "frame " << i;
@@ -106,7 +106,7 @@ TEST(McraAnalysis, EveryFieldFollowsTheSteps) {
 
 TEST(McraAnalysis, FirstFramePrimesAndSaysNothing) {
   const Detector vad(false);
-  EXPECT_EQ(vad.hear(frame_of(kSquare, 20000)), 0);
+  EXPECT_EQ(vad.process(frame_of(kSquare, 20000)), 0);
   EXPECT_EQ(vad->frameIndex, 0);
   EXPECT_EQ(vad->frameSnr, 0);
   for (int k = 0; k < MCRA_BINS; ++k) {
@@ -115,7 +115,7 @@ TEST(McraAnalysis, FirstFramePrimesAndSaysNothing) {
     EXPECT_NEAR(static_cast<double>(vad->noisePower[k]), 0.999 * power, 1 + 1e-8 * power);
     EXPECT_EQ(vad->prioriSnrAvg[k], 0);
     EXPECT_EQ(vad->prioriSnr[k], 1);
-    // v is 0, and absence counts as 0.95 likely: 18 / (2 + 19).
+    // v is 0 and q 0.95: 18 / (2 + 19).
     EXPECT_NEAR(vad->speechProb[k] / 0x1p31, 18.0 / 21, 0.003);
   }
   EXPECT_EQ(vad->prevFrameEnergy, 0);
@@ -141,11 +141,11 @@ TEST(McraAnalysis, MinimaOfAllTimeFallAndThoseOfTheRingRiseAgain) {
   const Detector falling(false), ring(true);
   std::int64_t averages[80];
   for (int i = 0; i < 80; ++i) {
-    for (const Detector *vad : {&falling, &ring}) vad->hear(i < 30 ? quiet : loud);
+    for (const Detector *vad : {&falling, &ring}) vad->process(i < 30 ? quiet : loud);
     averages[i] = ring->recursivePower[kBin];
     EXPECT_EQ(falling->minPower[kBin], averages[0]) << i;
-    // Averages only rise here, so the oldest of the last 20 is the least; slot 0 is first refilled
-    // by frame 20.
+    // S only rises here, so the oldest of the last 20 is the minimum; frame 20 is the first to
+    // write slot 0 again.
     EXPECT_EQ(ring->minPower[kBin], averages[std::max(i - 19, 0)]) << i;
     EXPECT_EQ(ring->minHistory[i % 20][kBin], averages[i]) << i;
   }
@@ -155,7 +155,7 @@ TEST(McraAnalysis, MinimaOfAllTimeFallAndThoseOfTheRingRiseAgain) {
     EXPECT_EQ(falling->minHistory[slot][kBin], kNever);
 
   const Detector silent(true);
-  for (int i = 0; i < 25; ++i) silent.hear(Pcm(160));
+  for (int i = 0; i < 25; ++i) silent.process(Pcm(160));
   for (int k = 0; k < MCRA_BINS; ++k) {
     EXPECT_EQ(silent->minPower[k], 21474);
     EXPECT_EQ(silent->minHistory[24 % 20][k], 21474);
@@ -168,25 +168,25 @@ TEST(McraAnalysis, NoiseTakesAFrameInOneFrameLate) {
   const Detector vad(true);
   for (int i = 0; i < 60; ++i) {
     const VADINFO before = *vad;
-    vad.hear(frame_of(kTone, i % 2 == 0 ? 100 : 20000));
+    vad.process(frame_of(kTone, i % 2 == 0 ? 100 : 20000));
     if (i == 0) continue;
     for (int k = 0; k < MCRA_BINS; ++k) {
       const double kept = before.noiseSmoothing[k] / 0x1p31;
       const double noise = kept * static_cast<double>(before.noisePower[k]) +
                            (kOne - kept) * static_cast<double>(before.smoothedPeriodogram[k]);
       EXPECT_NEAR(static_cast<double>(vad->noisePower[k]), noise, 2 + 1e-8 * noise);
-      // A presence of 1 stops the noise; none lets a 1000th of the frame in.
+      // p' of 1 stops the update of the noise; with 0 a thousandth of the frame enters.
       const double presence = vad->presenceIndicatorAvg[k] / 0x1p31;
       EXPECT_NEAR(vad->noiseSmoothing[k] / 0x1p31, 0.999 + 0.001 * presence, 2e-9);
     }
   }
 }
 
-/// The bin's step from made powers and made history, beside the published formulas.
+/// One step of a bin from chosen powers and history, against the published formulas.
 TEST(McraAnalysis, SnrGainAndProbabilityAreThePublishedOnes) {
   const Detector vad(false);
   double least = 1, worst = 0;
-  int cut = 0;
+  int negligible = 0;
   for (int step = 0; step < 400; ++step) {
     vad->frameIndex = step % 2;
     const double posterior = std::pow(10, step / 200.0 - 0.5);  // to 15 dB
@@ -208,13 +208,13 @@ TEST(McraAnalysis, SnrGainAndProbabilityAreThePublishedOnes) {
       if (v > 0.05) {
         ASSERT_NEAR(vad->gain[k] / 32768.0, gain, 1e-3 + 0.002 * gain) << posterior << ' ' << xi;
       }
-      // Without SNR around it absence is 0.95 likely.
+      // Without SNR around it q is 0.95.
       const double p = 1 / (1 + 19 * (1 + xi) * std::exp(-v));
       const double first = std::min(1.0, 18 / (2 + 19 * (1 + xi) * std::exp(-v)));
       const double got = vad->speechProb[k] / 0x1p31;
       if (got == 0) {
         ASSERT_LT(step % 2 == 0 ? first : p, 0.0511);
-        ++cut;
+        ++negligible;
       } else {
         ASSERT_NEAR(got, step % 2 == 0 ? first : p, 0.004);
         least = std::min(least, got);
@@ -222,7 +222,7 @@ TEST(McraAnalysis, SnrGainAndProbabilityAreThePublishedOnes) {
       }
     }
   }
-  EXPECT_GT(cut, 1000);
+  EXPECT_GT(negligible, 1000);
   EXPECT_GE(least, 0.051);
   EXPECT_LT(least, 0.0512);
   std::printf("least probability %.6f, largest error %.5f\n", least, worst);

@@ -1,4 +1,4 @@
-// The frame decision, the calibration of its threshold, and what entries set, on made records.
+// The frame decision, the calibration of its threshold, and what the entries set.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -13,7 +13,7 @@
 namespace orvalis::test {
 namespace {
 
-/// What a frame shows to the decision.
+/// What the decision depends on in a frame.
 struct Measures {
   double energy;
   double smoothed_energy;
@@ -36,8 +36,8 @@ protected:
       vad.minPower[k] = k / 64 == 1 ? std::llrint(frame.minimum_energy * 0x1p25) : 0;
       vad.speechProb[k] = k < frame.speech_bins ? INT32_MAX : 0;
     }
-    // A bin's probability is at most 1 - 2^-31: the missing units are made up for, and half a bin
-    // more makes no other count.
+    // The probability of a bin is at most 1 - 2^-31: the missing units are added, and half a bin
+    // more does not change the count.
     vad.speechProb[MCRA_BINS - 1] += frame.speech_bins + (1 << 30);
     return decide_frame(vad, exponent);
   }
@@ -90,7 +90,7 @@ TEST_F(McraDecision, EveryConditionIsStrictAndOverTwoFrames) {
 TEST_F(McraDecision, StartupLearnsFromTenAndNineteenFrames) {
   decide(kNothing);
   for (int n = 1; n <= 30; ++n) {
-    // Frame 5 is too loud: frame 4 counts again. Frames 20 and later are not learnt.
+    // Frame 5 is too loud: frame 4 counts again. Frames from 20 on are not added.
     const double energy = n == 5 ? 30.25 : n == 6 ? 30 : n < 20 ? n * 0.125 : 30.5;
     decide({1, energy, 0, 0});
     EXPECT_EQ(record_.prevSmoothedEnergy, n == 5 ? 0.5 : energy);
@@ -199,7 +199,7 @@ TEST_F(McraDecision, ThresholdServesTheFrameThatCalibratedIt) {
   EXPECT_EQ(record_.calibrationCount, before.calibrationCount) << "only mode 1 calibrates";
 }
 
-/// A record in which everything is still to be set.
+/// A record of which nothing is set.
 std::unique_ptr<VADINFO> untouched() {
   auto record = std::make_unique<VADINFO>();
   std::memset(record.get(), 0x5A, sizeof *record);

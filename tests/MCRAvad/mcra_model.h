@@ -1,5 +1,5 @@
-// The analysis of the MCRA detector once more, step by step as it is defined, over the exported
-// mathematics. It keeps a state of its own.
+// The analysis of the MCRA detector a second time, step by step by its definition, on the exported
+// mathematics and with a state of its own.
 #pragma once
 
 #include <cstdint>

@@ -1,5 +1,5 @@
-// What the detector makes of real recordings in noise: how much of the words and of the pauses it
-// answers with speech.
+// The detector on real recordings in noise: how much of the words and of the pauses it takes for
+// speech.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -14,24 +14,24 @@ namespace {
 
 constexpr std::size_t kFrame = MCRA_FRAME_SAMPLES;
 
-std::vector<bool> answers_to(Pcm pcm, std::int32_t keeps_history) {
+std::vector<bool> decisions_on(Pcm pcm, std::int32_t keeps_history) {
   const auto record = std::make_unique<VADINFO>();
   VADINFO *vad = record.get();
   initialVADINFO(&vad);
   vad->historyUpdate = keeps_history;
-  std::vector<bool> answers;
+  std::vector<bool> decisions;
   for (std::size_t at = 0; at + kFrame <= pcm.size(); at += kFrame)
-    answers.push_back(processVAD(&vad, &pcm[at], kFrame, 0.84F) == 1);
-  return answers;
+    decisions.push_back(processVAD(&vad, &pcm[at], kFrame, 0.84F) == 1);
+  return decisions;
 }
 
-/// Frames and how many of them were answered with speech.
+/// Frames, and how many of them were decided to be speech.
 struct Share {
   int frames = 0;
   int speech = 0;
-  void take(bool answer) {
+  void take(bool decision) {
     ++frames;
-    speech += answer;
+    speech += decision;
   }
   double percent() const { return 100.0 * speech / frames; }
 };
@@ -50,12 +50,12 @@ void rate(const Pcm &speech, const Pcm &mixed, std::size_t margin, bool keeps_hi
     const std::size_t lead = margin / kFrame;
     return frame >= lead && frame - lead < levels.size() ? levels[frame - lead] : -99;
   };
-  const auto answers = answers_to(mixed, keeps_history);
-  for (std::size_t i = kAround; i + kAround < answers.size(); ++i) {
+  const auto decisions = decisions_on(mixed, keeps_history);
+  for (std::size_t i = kAround; i + kAround < decisions.size(); ++i) {
     double around = -99;
     for (std::size_t j = i - kAround; j <= i + kAround; ++j) around = std::max(around, level_at(j));
-    if (level_at(i) >= loudest - 20) rates.words.take(answers[i]);
-    if (around < loudest - 40) rates.pauses.take(answers[i]);
+    if (level_at(i) >= loudest - 20) rates.words.take(decisions[i]);
+    if (around < loudest - 40) rates.pauses.take(decisions[i]);
   }
 }
 
@@ -111,10 +111,10 @@ TEST(McraRecordings, LouderNoiseIsLearntOnlyWithHistory) {
   for (std::size_t i = 0; i < pcm.size(); ++i)
     pcm[i] = to_sample((i < pcm.size() / 4 ? 100 : 316) * noise[i]);  // 10 dB more after 5 s
   for (const bool keeps_history : {false, true}) {
-    const auto answers = answers_to(pcm, keeps_history);
-    EXPECT_EQ(std::count(answers.begin(), answers.begin() + 500, true), 0);
-    EXPECT_GT(std::count(answers.begin() + 500, answers.begin() + 600, true), 50);
-    const auto later = std::count(answers.begin() + 1000, answers.end(), true);  // by 5 s
+    const auto decisions = decisions_on(pcm, keeps_history);
+    EXPECT_EQ(std::count(decisions.begin(), decisions.begin() + 500, true), 0);
+    EXPECT_GT(std::count(decisions.begin() + 500, decisions.begin() + 600, true), 50);
+    const auto later = std::count(decisions.begin() + 1000, decisions.end(), true);  // by 5 s
     EXPECT_TRUE(keeps_history ? later == 0 : later > 950) << later;
   }
 }

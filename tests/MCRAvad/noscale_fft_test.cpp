@@ -43,7 +43,7 @@ const Size sizes[] = {
 
 using Turn = std::complex<double> (Size::*)(std::size_t) const;
 
-/// The Fourier transform from those of the even and of the odd values, by either kind of factors.
+/// The Fourier transform from those of the even and the odd values, with either kind of factors.
 Spectrum fourier(const Spectrum &x, const Size &size, Turn turn) {
   if (x.size() == 1) return x;
   Spectrum even, odd, result(x.size());

@@ -1,5 +1,5 @@
-// 64-bit helpers and windows. An exact integer result is known by its low 64 bits, which unsigned
-// arithmetic gives, and by its size in double precision.
+// 64-bit helpers and windows. Exact results are known by their low 64 bits, from unsigned
+// arithmetic, and by their size in double precision.
 #include <gtest/gtest.h>
 
 #include <algorithm>

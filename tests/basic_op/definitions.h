@@ -23,7 +23,7 @@ inline Wide wrapped(Wide x) { return static_cast<std::int32_t>(x); }
 inline Wide clip16(Wide x) { return std::clamp(x, min16, max16); }
 inline Wide clip32(Wide x) { return std::clamp(x, min32, max32); }
 
-/// floor(x * 2^n); counts are cut where every 32-bit value but 0 is out of range or 0 or -1.
+/// floor(x * 2^n); counts are clamped where any 32-bit value is out of range, or 0 or -1.
 inline Wide scaled(Wide x, Wide n) {
   n = std::clamp<Wide>(n, -32, 32);
   return n < 0 ? x >> -n : x * (Wide{1} << n);

@@ -1,4 +1,4 @@
-// Holds an exported operator against its definition: value, own flags, and everybody else's flags.
+// Compares an exported operator with its definition: value, own flags, and those of other copies.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -37,7 +37,7 @@ std::vector<Word> stepped(int step) {
   return values;
 }
 
-/// The fewer operands, the denser: one 16-bit operand is swept, two are crossed in a grid.
+/// Denser for fewer operands: one 16-bit operand is swept, two are crossed in a grid.
 template <class Word, int operands>
 const std::vector<Word> &operand_values() {
   static const std::vector<Word> values = [] {

@@ -1,4 +1,4 @@
-// Logarithm, exponential and root: bits by their definition, and how far they are from the truth.
+// Logarithm, exponential and root: bits by their definition, and their errors.
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -72,10 +72,10 @@ TEST(LogExp, Accuracy) {
     worst(exp10_error, fnExp10(static_cast<int32_t>(tenth)) / q31 / std::exp2(x / q26) - 1);
   }
   EXPECT_LT(log2_error, 0.0002);
-  EXPECT_LT(fn_log2_error, 0.01);
-  EXPECT_LT(fn_log10_error, 0.003);
-  EXPECT_LT(exp2_error, 0.005);
-  EXPECT_LT(exp10_error, 0.005);
+  EXPECT_LT(fn_log2_error, 0.0089);
+  EXPECT_LT(fn_log10_error, 0.0028);
+  EXPECT_LT(exp2_error, 0.0038);
+  EXPECT_LT(exp10_error, 0.0038);
 }
 
 TEST(LogExp, RootFollowsItsSeriesAndLeavesFlags) {

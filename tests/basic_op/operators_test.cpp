@@ -91,7 +91,7 @@ TEST(Operators, DoublePrecision) {
   });
 }
 
-// The definitions above are built from steps; these hold the steps against what they are for.
+// The definitions above are built from steps; these check the steps by their meaning.
 TEST(Operators, LongProductsAndQuotientsAreAccurate) {
   std::mt19937_64 random = seeded_generator();
   for (int i = 0; i < 100000; ++i) {

@@ -1,4 +1,4 @@
-// The decision whether noise may be learnt, and its neighbours, on both sides of every threshold.
+// The noise update decision and the functions around it, on both sides of every threshold.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -32,7 +32,7 @@ constexpr Limits kLimits[] = {
     {"Suppressor", &kSuppression, 42, 320, 896, 4, 1920, true, 11807152, 1660563, 32767},
 };
 
-/// A made state.
+/// A state made for a test.
 struct Channels {
   Word32 energy[kMaxChannels] = {}, noise[kMaxChannels] = {};
   Word16 long_term_q5[kMaxChannels] = {};
@@ -118,7 +118,7 @@ TEST_P(ChannelDecision, SevenUnchangedFramesForgetTheCount) {
   EXPECT_EQ(channels.hyster_cnt, MAX_16) << "noise may last";
 }
 
-TEST_P(ChannelDecision, NoiseIsSeededInTheFirstFrames) {
+TEST_P(ChannelDecision, FirstFramesAreTheNoise) {
   for (int past : {0, 1}) {
     Channels channels;
     channels.frame_cnt = GetParam().seeding + past;
@@ -132,17 +132,17 @@ TEST_P(ChannelDecision, NoiseIsSeededInTheFirstFrames) {
   }
 }
 
-TEST_P(ChannelDecision, ShareOfThePastFollowsItsCurve) {
+TEST_P(ChannelDecision, LongTermAlphaFollowsItsLine) {
   Flags flags;
   std::set<int> seen;
   for (double total = 300; total < MAX_32; total *= 1.002) {
     const auto energy = static_cast<Word32>(total);
     const int below = GetParam().alpha_high_level_q5 - level_q5(flags, energy);
     const int step = std::clamp(32 * below, -32768, 32767);
-    const int share_q10 = 1023 - static_cast<int>(std::floor(803.0 * step / 32768));
-    const int expected = share_q10 >= 1024 ? 32440 : share_q10 > 510 ? 32 * share_q10 : 16383;
-    ASSERT_EQ(long_term_alpha_q15(flags, *GetParam().plan, energy), expected) << share_q10;
-    seen.insert(share_q10);
+    const int alpha_q10 = 1023 - static_cast<int>(std::floor(803.0 * step / 32768));
+    const int expected = alpha_q10 >= 1024 ? 32440 : alpha_q10 > 510 ? 32 * alpha_q10 : 16383;
+    ASSERT_EQ(long_term_alpha_q15(flags, *GetParam().plan, energy), expected) << alpha_q10;
+    seen.insert(alpha_q10);
   }
   for (int edge : {510, 511, 1023, 1024}) EXPECT_TRUE(seen.contains(edge)) << edge;
 }

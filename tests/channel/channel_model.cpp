@@ -38,18 +38,18 @@ int snr_index(double energy, double noise) {
   return static_cast<int>(std::floor(decibels / 0.375 + 0.5));
 }
 
-/// Share of the past in the long-term levels.
-double share_of_past(const ModelPlan &plan, double total) {
+/// Weight of the past in the long-term levels.
+double long_term_alpha(const ModelPlan &plan, double total) {
   const double below_q10 = 32 * (plan.alpha_high_level_q5 - model_level_q5(total));
-  const double share_q10 = 1023 - 803.0 / 32768 * clip16(below_q10);
-  if (share_q10 >= 1024) return 0.99;
-  return share_q10 <= 510 ? 0.5 : share_q10 / 1024;
+  const double alpha_q10 = 1023 - 803.0 / 32768 * clip16(below_q10);
+  if (alpha_q10 >= 1024) return 0.99;
+  return alpha_q10 <= 510 ? 0.5 : alpha_q10 / 1024;
 }
 
 }  // namespace
 
-// Frame, overlap, size; energy floor, seeding frames; saturate_then_share; loud level; metric,
-// energy and deviation of the decision; remember_reset.
+// Frame, overlap, size; energy floor, initial noise frames; saturate_then_smooth; level of the
+// maximum alpha; metric, energy and deviation of the decision; remember_reset.
 const ModelPlan kWideModel = {
     {{0, 1},   {2, 3},   {4, 5},   {6, 7},   {8, 9},   {10, 11},  {12, 13},
      {14, 16}, {17, 19}, {20, 22}, {23, 26}, {27, 30}, {31, 35},  {36, 41},
@@ -128,7 +128,7 @@ ModelSpectrum model_spectrum(const ModelPlan &plan, ModelState &state, const std
   ModelSpectrum spectrum{
       .shift = block_shift(frame, plan.frame), .peak = 0, .bins = {}, .power = {}};
   const double scale = std::ldexp(1.0, spectrum.shift);
-  // Memories of a louder frame saturate in the scale of a quieter one.
+  // The memories of a louder frame may saturate in the scale of a quieter one.
   const auto rescaled = [scale](double x) { return clip16(x * scale) / scale; };
 
   std::vector<double> samples(plan.size);
@@ -185,7 +185,7 @@ double model_energies(const ModelPlan &plan, ModelState &state, const std::vecto
       energy = full_scale(power[i]);
     } else {
       const double taken =
-          plan.saturate_then_share ? 0.55 * full_scale(power[i]) : full_scale(0.55 * power[i]);
+          plan.saturate_then_smooth ? 0.55 * full_scale(power[i]) : full_scale(0.55 * power[i]);
       energy = full_scale(0.45 * energy + taken);
     }
     total += energy;
@@ -209,7 +209,7 @@ ModelFindings model_findings(const ModelPlan &plan, ModelState &state) {
   ModelFindings found;
   found.total =
       std::min(std::accumulate(state.energy.begin(), state.energy.end(), 0.0), kMaxWord32);
-  const double share = share_of_past(plan, found.total);
+  const double share = long_term_alpha(plan, found.total);
   for (std::size_t i = 0; i < plan.channels(); ++i) {
     if (state.frame_cnt <= plan.initial_noise_frames)
       state.noise[i] = std::max(state.energy[i], 4096.0);
@@ -218,8 +218,8 @@ ModelFindings model_findings(const ModelPlan &plan, ModelState &state) {
     const double level = model_level_q5(state.energy[i]);
     double &long_term = state.long_term_q5[i];
     if (state.frame_cnt == 1) long_term = level;
-    found.surprise_q5.push_back(std::abs(long_term - level));
-    found.deviation_q5 += found.surprise_q5[i];
+    found.distance_q5.push_back(std::abs(long_term - level));
+    found.deviation_q5 += found.distance_q5[i];
     long_term = share * long_term + (1 - share) * level;
   }
   return found;

@@ -1,7 +1,6 @@
-// The channel analysis of the voice detector and the suppressor in double precision: what the
-// method means, without the engine's rounding. Kept apart from the engine's code on purpose: no
-// table and no function is shared. Only where the fixed-point engine saturates or truncates by
-// design does the model do so too.
+// The channel analysis of the voice detector and the suppressor in double precision, without the
+// engine's rounding. It shares no table and no function with the engine on purpose. It saturates or
+// truncates only where the engine does so by design.
 #pragma once
 
 #include <array>
@@ -21,7 +20,7 @@ struct ModelPlan {
   int size;  ///< samples of the transform
   double energy_floor;
   int initial_noise_frames;
-  bool saturate_then_share;  ///< full scale limits the frame's energy before its share is taken
+  bool saturate_then_smooth;  ///< full scale limits the frame's energy before the product with 0.55
   double alpha_high_level_q5;
   int metric_noise;        ///< noise up to this voice metric
   double silent_energy;    ///< undecided up to this total energy
@@ -58,7 +57,7 @@ struct ModelSpectrum {
 struct ModelFindings {
   std::vector<int> snr;  ///< in steps of 3/8 dB
   int metric = 0;
-  std::vector<double> surprise_q5;  ///< distance of each channel's level from its long-term level
+  std::vector<double> distance_q5;  ///< distance of each channel's level from its long-term level
   double deviation_q5 = 0;          ///< the sum of these
   double total = 0;
 };
@@ -74,13 +73,13 @@ std::vector<double> model_inverse(int size, const std::vector<std::complex<doubl
 /// Smooths the channel energies; returns their sum before the floor.
 double model_energies(const ModelPlan &plan, ModelState &state, const std::vector<double> &power);
 
-/// Seeds the noise in the first frames, compares energies with it, moves the long-term levels.
+/// Sets the noise in the first frames, compares energies with it, updates the long-term levels.
 ModelFindings model_findings(const ModelPlan &plan, ModelState &state);
 
 int model_metric(int snr);             ///< contribution of one channel to the voice metric
 double model_level_q5(double energy);  ///< dB relative to 256
 
-/// The noise-update decision; moves the counters.
+/// The noise update decision; updates the counters.
 bool model_decision(const ModelPlan &plan, ModelState &state, const ModelFindings &found);
 
 void model_track_noise(const ModelPlan &plan, ModelState &state);

@@ -1,5 +1,5 @@
-// One frame of the engine against one frame of the double-precision model that starts from the
-// engine's own state, so that errors do not pile up and decisions stay comparable.
+// One frame of the engine against one frame of the double-precision model. The model starts from
+// the engine's own state, so that errors do not accumulate and decisions stay comparable.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -14,7 +14,7 @@
 
 namespace orvalis::test {
 
-/// The largest error of each quantity in multiples of its bound; judged at the end.
+/// The maximum error of each quantity in multiples of its bound, checked at the end.
 class Bounds {
 public:
   void hold(const std::string &quantity, double error, double bound) {
@@ -29,7 +29,7 @@ private:
   std::map<std::string, double> worst_;
 };
 
-/// A user of the channel analysis: its plans and what its state record calls by a name of its own.
+/// A user of the channel analysis: its plans, and the fields of its record with other names.
 template <class State>
 struct Subject {
   const ChannelPlan &plan;
@@ -70,7 +70,7 @@ struct Subject {
     std::vector<double> noise;  ///< before its update
   };
 
-  /// Holds one frame, from `before` to `after`, to the model.
+  /// Compares one frame, from `before` to `after`, with the model.
   Step hold(Bounds &bounds, State before, const State &after, const Word16 *frame) {
     before.*frame_cnt = after.*frame_cnt;
     ModelState state = model_of(before);
@@ -88,7 +88,8 @@ struct Subject {
     const bool clear = spectrum.peak < 16384;
     frames += 1;
     crowded += !clear;
-    // Else it errs by units of its normalised scale: by 2 in strong channels, by 6 in weak ones.
+    // Otherwise its error is in units of the normalised scale: 2 in strong channels, 6 in weak
+    // ones.
     const double total = model_energies(model, state, spectrum.power);
     double total_bound = 0;
     for (std::size_t i = 0; i < model.channels(); ++i) {
@@ -100,7 +101,7 @@ struct Subject {
     }
     if (clear) bounds.hold("energy before the floor", found.unclamped_energy - total, total_bound);
 
-    // From here on every quantity is held to what the engine formed it from.
+    // From here on the model of each quantity starts from the engine's own inputs.
     state.energy = engine.energy;
     ModelFindings expected = model_findings(model, state);
     bounds.hold("total", found.total_energy - expected.total, 0.5);
@@ -110,7 +111,7 @@ struct Subject {
       snr_differs += found.snr[i] != expected.snr[i];
       metric += model_metric(found.snr[i]);
       bounds.hold("long-term level", engine.long_term_q5[i] - state.long_term_q5[i],
-                  3 + 0.0125 * expected.surprise_q5[i]);
+                  3 + 0.0125 * expected.distance_q5[i]);
     }
     bounds.hold("voice metric", found.voice_metric - metric, 0.5);
     bounds.hold("deviation", found.deviation_q5 - expected.deviation_q5, 3.0 * model.channels());

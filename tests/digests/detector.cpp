@@ -38,8 +38,8 @@ std::int32_t judge_samples(EpdInstance *epd, const std::int16_t *pcm, std::int32
 }
 
 /// Frame after frame, one at a time; or, if hostile, as no caller should.
-void run(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t dump, Random random,
-         bool hostile) {
+void run(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t dump, Caller caller) {
+  auto &[random, hostile] = caller;
   Observer observer(judge);
   EpdInstance *epd = InitializeEPD(mode, dump);
   observer.watch(epd);
@@ -74,7 +74,7 @@ void run(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t dump, R
   observer.take_dumps();
 }
 
-/// The reasons of every frame, and that asking for them changes no answer.
+/// The reasons of every frame, and that asking for them changes no decision.
 void run_explained(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t type) {
   Observer observer(judge);
   EpdInstance *epd = InitializeEPD(mode, 0);
@@ -99,14 +99,18 @@ void run_explained(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32
 
 TEST(Digests, Detector) {
   Judge judge("detector");
-  judge.sequence("sentence",
-                 [&] { run(judge, speech_16k(kSentences[3]), 0, 0, Random(1), false); });
-  judge.sequence("overdriven",
-                 [&] { run(judge, speech_16k("cards/005.wav"), 20000, 1, Random(1), false); });
-  judge.sequence("narrow",
-                 [&] { run(judge, speech_8k("wav/hts1a.wav"), 1000, 1, Random(1), false); });
-  judge.sequence("narrow-quiet",
-                 [&] { run(judge, speech_8k("wav/mmt1.wav"), 11000, 0, Random(1), false); });
+  judge.sequence("sentence", [&] {
+    run(judge, speech_16k(kSentences[3]), 0, 0, {Random(1), false});
+  });
+  judge.sequence("overdriven", [&] {
+    run(judge, speech_16k("cards/005.wav"), 20000, 1, {Random(1), false});
+  });
+  judge.sequence("narrow", [&] {
+    run(judge, speech_8k("wav/hts1a.wav"), 1000, 1, {Random(1), false});
+  });
+  judge.sequence("narrow-quiet", [&] {
+    run(judge, speech_8k("wav/mmt1.wav"), 11000, 0, {Random(1), false});
+  });
 
   const Pcm wide = speech_16k(kSentences[0]);
   const Pcm narrow = speech_8k("wav/vk5qi.wav");
@@ -120,7 +124,7 @@ TEST(Digests, Detector) {
       const auto samples = static_cast<std::size_t>(is_narrow ? 60000 : 120000);
       run(judge,
           hostile_signal(static_cast<std::uint64_t>(seed), samples, is_narrow ? narrow : wide),
-          mode, seed % 3, Random(static_cast<std::uint64_t>(seed)), true);
+          mode, seed % 3, {Random(static_cast<std::uint64_t>(seed)), true});
     });
   }
 

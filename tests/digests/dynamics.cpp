@@ -5,8 +5,8 @@
 namespace orvalis::test {
 namespace {
 
-void run(Judge &judge, const Pcm &audio, std::int32_t rate_hz, std::int32_t dump, Random random,
-         bool hostile) {
+void run(Judge &judge, const Pcm &audio, std::int32_t rate_hz, std::int32_t dump, Caller caller) {
+  auto &[random, hostile] = caller;
   Observer observer(judge);
   const std::int64_t handle = InitializeDRC(rate_hz, dump);
   const auto *drc = reinterpret_cast<const DrcInstance *>(static_cast<std::intptr_t>(handle));
@@ -40,16 +40,16 @@ void run(Judge &judge, const Pcm &audio, std::int32_t rate_hz, std::int32_t dump
 TEST(Digests, Dynamics) {
   Judge judge("dynamics");
   const Pcm speech = speech_16k(kSentences[1]);
-  judge.sequence("sentence", [&] { run(judge, speech, 16000, 0, Random(1), false); });
-  judge.sequence("sentence-dumped", [&] { run(judge, speech, 16000, 1, Random(1), false); });
+  judge.sequence("sentence", [&] { run(judge, speech, 16000, 0, {Random(1), false}); });
+  judge.sequence("sentence-dumped", [&] { run(judge, speech, 16000, 1, {Random(1), false}); });
   for (std::uint64_t seed = 300; seed < 306; ++seed) {
     judge.sequence("hostile-" + std::to_string(seed), [&] {
-      run(judge, hostile_signal(seed, 100000, speech), 16000, seed % 3, Random(seed), true);
+      run(judge, hostile_signal(seed, 100000, speech), 16000, seed % 3, {Random(seed), true});
     });
   }
   for (const std::int32_t rate_hz : {8000, 0, -16000}) {
     judge.sequence("rate-" + std::to_string(rate_hz), [&] {
-      run(judge, hostile_signal(310, 20000, speech), rate_hz, 1, Random(310), true);
+      run(judge, hostile_signal(310, 20000, speech), rate_hz, 1, {Random(310), true});
     });
   }
   judge.sequence("refusals", [&] {

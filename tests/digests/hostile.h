@@ -1,5 +1,5 @@
-// Audio that no microphone gives and every host may hand over, the same for the same seed.
-// Integers alone, so that no library's rounding has a say.
+// Audio that no microphone gives but any host may pass, the same for the same seed. Made of
+// integers only, so that it depends on no library's rounding.
 #pragma once
 
 #include <algorithm>
@@ -11,6 +11,12 @@
 namespace orvalis::test {
 
 using Random = std::mt19937_64;
+
+/// How a sequence makes its calls: at random where it is hostile.
+struct Caller {
+  Random random;
+  bool hostile;
+};
 
 /// A number from first to last.
 inline std::int64_t draw(Random &random, std::int64_t first, std::int64_t last) {

@@ -1,7 +1,7 @@
-// Everything that a caller can observe, folded into digests and held against a file for each
+// Everything that a caller can observe, folded into digests and compared with a file for each
 // service: the same on every processor, with every compiler and optimisation.
 //
-// docs/digests.md tells how the files are made anew, and when that is allowed.
+// docs/digests.md says how to write the files again, and when that is allowed.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -19,9 +19,9 @@
 
 namespace orvalis::test {
 
-/// Judges one service, sequence by sequence, call by call. Within a sequence the digest runs on, so
-/// that the last one stands for everything; of each call two hexadecimal digits are kept, which
-/// tell where two runs part.
+/// Judges one service, sequence by sequence, call by call. The digest runs on through a sequence,
+/// so that the last one covers all of it; two hexadecimal digits of each call show where two runs
+/// differ first.
 class Judge {
 public:
   explicit Judge(const std::string &service) : service_(service) {
@@ -51,7 +51,7 @@ public:
     (take_one(values), ...);
   }
 
-  /// Ends a call. `what` is said of it if it is the first one to differ.
+  /// Ends a call. `what` describes it if it is the first one to differ.
   void call(const std::string &what = {}) {
     char digits[3];
     std::snprintf(digits, sizeof digits, "%02x", static_cast<unsigned>(digest_ >> 56));

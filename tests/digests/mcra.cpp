@@ -38,7 +38,7 @@ void run(Judge &judge, const Pcm &audio, const Configuration &configured, Random
   Observer observer(judge);
   const auto record = std::make_unique<VADINFO>();
   VADINFO *vad = record.get();
-  std::memset(vad, 0x5A, sizeof *vad);  // what initialVADINFO leaves alone stays so
+  std::memset(vad, 0x5A, sizeof *vad);  // fields that initialVADINFO does not set keep this
   initialVADINFO(&vad);
   take_record(judge, *vad);
   observer.call();
@@ -65,7 +65,7 @@ void run(Judge &judge, const Pcm &audio, const Configuration &configured, Random
   }
 }
 
-/// The reasons of every frame, whose answer is that of the frame.
+/// The reasons of every frame, and that their decision is that of the frame.
 void run_explained(Judge &judge, const Pcm &audio, const Configuration &configured) {
   const auto record = std::make_unique<VADINFO>();
   VADINFO *vad = record.get();

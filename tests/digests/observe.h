@@ -1,6 +1,6 @@
-// What a service shows beside its answers: the flags of all operators, its log lines, its dump
-// files, and what it prints before it ends the process. A handle's number, which lines and names
-// hold, is read as '#'.
+// What a service shows beside its results: the flags of all operators, its log lines, its dump
+// files, and what it prints before it ends the process. Handle numbers in lines and names count as
+// '#'.
 #pragma once
 
 #include <sys/wait.h>
@@ -71,7 +71,7 @@ public:
   /// The instance whose number is a handle's.
   void watch(const void *handle) { number_ = std::to_string(handle_number(handle)); }
 
-  /// Sometimes leaves what no operator would in the flags, as a host may.
+  /// Sometimes leaves values in the flags that no operator would, as a host may.
   void disturb_flags(Random &random) {
     if (draw(random, 0, 7) != 0) return;
     FlagWords words;
@@ -86,8 +86,8 @@ public:
     judge_.call();
   }
 
-  /// Takes the names and contents of all dump files there are and removes them; and whether files
-  /// were left open.
+  /// Takes the names and contents of all dump files and removes them; also whether files were left
+  /// open.
   void take_dumps() {
     judge_.take(open_files() - opened_before_);
     std::map<std::string, Pcm> dumps;

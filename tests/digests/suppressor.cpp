@@ -24,8 +24,9 @@ void take_record(Judge &judge, const S2chnsState &state) {
 }
 
 /// Through the flat interface: one frame at a time, or, if hostile, as no caller should.
-void run(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t microphones, Random random,
-         bool hostile) {
+void run(Judge &judge, const Pcm &audio, std::int32_t mode, std::int32_t microphones,
+         Caller caller) {
+  auto &[random, hostile] = caller;
   Observer observer(judge);
   NsInstance *ns =
       InitializeDoNS(mode, microphones, static_cast<std::int32_t>(draw(random, -1, 1)));
@@ -99,18 +100,19 @@ void run_two(Judge &judge, const Pcm &pairs, std::int16_t frames) {
 TEST(Digests, OneMicrophone) {
   Judge judge("one_microphone");
   const Pcm speech = speech_16k(kSentences[4]);
-  judge.sequence("sentence", [&] { run(judge, speech, 0, 1, Random(1), false); });
-  judge.sequence("sentence-strong",
-                 [&] { run(judge, speech_16k(kSentences[1]), 2, 1, Random(1), false); });
+  judge.sequence("sentence", [&] { run(judge, speech, 0, 1, {Random(1), false}); });
+  judge.sequence("sentence-strong", [&] {
+    run(judge, speech_16k(kSentences[1]), 2, 1, {Random(1), false});
+  });
   int seed = 100;
   for (const std::int32_t mode : {0, 2, 0, 2, 1000, 2000, 3002, -1000}) {
     ++seed;
     judge.sequence("hostile-" + std::to_string(seed) + "-mode" + std::to_string(mode), [&] {
       run(judge, hostile_signal(static_cast<std::uint64_t>(seed), 100000, speech), mode, 1,
-          Random(static_cast<std::uint64_t>(seed)), true);
+          {Random(static_cast<std::uint64_t>(seed)), true});
     });
   }
-  judge.sequence("no-microphone", [&] { run(judge, speech, 0, 3, Random(3), true); });
+  judge.sequence("no-microphone", [&] { run(judge, speech, 0, 3, {Random(3), true}); });
   judge.sequence("default-log", [&] {
     judge.take(last_words([] {
       static NsInstance *const ns = InitializeDoNS(0, 1, 0);  // releases would log the handle
@@ -151,7 +153,7 @@ TEST(Digests, TwoMicrophones) {
   Judge judge("two_microphones");
   const Pcm speech = speech_16k(kSentences[1]);
   const Pcm pairs = pairs_of(speech);
-  judge.sequence("sentence", [&] { run(judge, pairs, 0, 2, Random(1), false); });
+  judge.sequence("sentence", [&] { run(judge, pairs, 0, 2, {Random(1), false}); });
   judge.sequence("record", [&] { run_two(judge, pairs, 1); });
   judge.sequence("record-two-frames",
                  [&] { run_two(judge, Pcm(pairs.begin(), pairs.begin() + 40000), 2); });
@@ -183,8 +185,9 @@ TEST(Digests, TwoMicrophones) {
   for (std::uint64_t seed = 200; seed < 204; ++seed) {
     const Pcm hostile =
         interleaved(hostile_signal(seed, 60000, speech), hostile_signal(seed + 50, 60000, speech));
-    judge.sequence("hostile-" + std::to_string(seed),
-                   [&] { run(judge, hostile, 0, 2, Random(seed), true); });
+    judge.sequence("hostile-" + std::to_string(seed), [&] {
+      run(judge, hostile, 0, 2, {Random(seed), true});
+    });
     judge.sequence("record-hostile-" + std::to_string(seed), [&] { run_two(judge, hostile, 1); });
   }
   judge.sequence("gates", [&] {

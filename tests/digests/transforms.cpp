@@ -1,5 +1,5 @@
-// The three transforms, both ways, with the flags and the tables of the fixed-point one; and what
-// is asked of a block of samples.
+// The three transforms in both directions, with the flags and tables of the fixed-point one, and
+// the queries.
 #include "fixed_fft.h"
 #include "float_fft.h"
 #include "noscale_fft_512p.h"

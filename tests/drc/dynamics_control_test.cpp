@@ -1,5 +1,5 @@
-// Dynamics control: its steps once more over the exported operators, bit by bit, and what they mean
-// for the ear.
+// Dynamics control: its steps a second time on the exported operators, bit by bit, and their effect
+// on levels.
 #include "Voice_Engine/drc/dynamics_control.h"
 
 #include <gtest/gtest.h>
@@ -96,7 +96,7 @@ TEST_F(DynamicsControl, FollowsItsStepsOverTheOperators) {
   const Control drc(16000, 1);
   Model model;
   Pcm before, after;
-  std::array<int, 2> answers{};
+  std::array<int, 2> results{};
   log.take();
   for (std::size_t at = 0; at + 4 * kFrame <= audio.size();) {
     const int count = 1 + static_cast<int>(random() % (3 * kFrame));
@@ -115,10 +115,10 @@ TEST_F(DynamicsControl, FollowsItsStepsOverTheOperators) {
     ASSERT_EQ(ProcessDRC(drc.handle, pcm.data(), count), loud) << at;
     ASSERT_EQ(read_flags(), flags) << at;
     ASSERT_EQ(pcm, expected) << at;
-    ++answers[loud];
+    ++results[loud];
   }
-  EXPECT_GT(answers[0], 100);
-  EXPECT_GT(answers[1], 100);
+  EXPECT_GT(results[0], 100);
+  EXPECT_GT(results[1], 100);
   EXPECT_EQ(log.take(), LogLines{debug_line("TQE: with doDRC ... samplingRate = 16000")});
   const std::string stem = root / ("sdcard/" + std::to_string(drc.handle));
   EXPECT_EQ(load_recording(stem + "_beforeDRC.pcm"), before);
@@ -139,7 +139,7 @@ TEST_F(DynamicsControl, RaisesQuietAudioByTwelveDecibelsAndFullScaleByNone) {
 TEST_F(DynamicsControl, RisesWithin12MillisecondsAndFallsWithinAFifthOfASecond) {
   const Control drc;
   const double e = std::exp(1.0);
-  Pcm pcm(200 * kFrame, 1000);  // most of it tells the gain
+  Pcm pcm(200 * kFrame, 1000);  // most of it shows the gain
   drc.process(pcm);
   EXPECT_NEAR(std::ranges::count_if(pcm, [&](int x) { return x < 3981 * (1 - 1 / e); }), 200, 1);
   pcm.assign(pcm.size(), 1000);
@@ -176,7 +176,7 @@ TEST_F(DynamicsControl, RaisesQuietPassagesOfSpeechByTheCurve) {
 
 TEST_F(DynamicsControl, CountsLoudSamplesOfTenFramesAndTheNewestTwice) {
   const struct {
-    int loud_samples, loud_frames, first, last;  // frames answered with 1
+    int loud_samples, loud_frames, first, last;  // frames that return 1
   } cases[] = {{10, 15, 9, 14}, {9, 20, 0, -1}, {11, 12, 8, 11}, {50, 1, 0, -1},
                {51, 1, 0, 0},   {101, 1, 0, 9}, {160, 2, 0, 10}};
   for (const auto &[loud_samples, loud_frames, first, last] : cases) {

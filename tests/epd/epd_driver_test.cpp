@@ -1,4 +1,4 @@
-// The EPD instance and its frame driver, seen through answers, log lines, dump files, flags and
+// The EPD instance and its frame driver, seen through decisions, log lines, dump files, flags and
 // counters.
 #include <gtest/gtest.h>
 
@@ -38,15 +38,8 @@ struct FreeDetector {
 };
 using Detector = std::unique_ptr<EpdInstance, FreeDetector>;
 
-template <class... Values>
-LogLine line(const char *format, Values... values) {
-  std::array<char, 200> text;
-  std::snprintf(text.data(), text.size(), format, values...);
-  return debug_line(text.data());
-}
-
 LogLine version_line(Word32 mode) {
-  return line("TQE: libOrvalis.so version 160705 IS127 in EPD Create, EPD MODE : %d", mode);
+  return debug_line("TQE: libOrvalis.so version 160705 IS127 in EPD Create, EPD MODE : %d", mode);
 }
 
 long number(const EpdInstance *epd) { return reinterpret_cast<std::intptr_t>(epd); }
@@ -64,7 +57,7 @@ auto words(const Record &record) {
   return std::bit_cast<std::array<Word32, sizeof(Record) / sizeof(Word32)>>(record);
 }
 
-/// What an instance knows.
+/// The state of an instance.
 auto snapshot(const EpdInstance &epd) {
   const VelmoraVadState &vad = epd.vad;
   const S1chnsState &suppressor = epd.suppressor;
@@ -90,7 +83,7 @@ protected:
   const TemporaryFolder root;
 };
 
-// ---- The driver once more, as the list of its steps over the engine's parts ----
+// ---- The driver a second time, as the list of its steps on the engine's parts ----
 
 struct Mode {
   Word32 mode, sub_mode, rate, gain;
@@ -128,24 +121,24 @@ struct DriverModel {
     const Word16 calm_before = record.abnormalCheckCount;
     const Word32 heard_before = record.processedSamples;
     if (samples % length != 0)
-      keep(line("VoiceEngine_JNI, Check pcm buffer size : numSample = %d, PCM_LEN = %d", samples,
-                length));
+      keep(debug_line("VoiceEngine_JNI, Check pcm buffer size : numSample = %d, PCM_LEN = %d",
+                      samples, length));
     if (heard_before == 0)
-      keep(line("TQE: Velmora EPD ... numSample = %d ... epdMode = %d ... RATE : %d", samples,
-                record.epdMode, 100 * length));
+      keep(debug_line("TQE: Velmora EPD ... numSample = %d ... epdMode = %d ... RATE : %d", samples,
+                      record.epdMode, 100 * length));
     int small_samples = 0;
     bool spoken = false;
     for (int at = 0; at + length <= samples; at += length) {
       record.processedSamples += length;
       const Pcm frame(&pcm[at], &pcm[at] + length);
       if (is_null(frame, small_samples)) {
-        keep(line("TQE: Null Check fail ... dont do EPD!"));
+        keep(debug_line("TQE: Null Check fail ... dont do EPD!"));
       } else {
-        spoken |= answer(frame, small_samples < 120, type) != 0;
+        spoken |= decide(frame, small_samples < 120, type) != 0;
       }
     }
     if (samples % length == 0) return spoken;
-    // The whole frames of a partial call are judged; only the call's own bookkeeping is dropped.
+    // The whole frames of a partial call are processed; only the call's own counts are dropped.
     record.abnormalCheckCount = calm_before;
     record.processedSamples = heard_before;
     return 0;
@@ -161,7 +154,7 @@ struct DriverModel {
     return false;
   }
 
-  Word32 answer(Pcm frame, bool is_normal, Word32 type) {
+  Word32 decide(Pcm frame, bool is_normal, Word32 type) {
     for (Word16 &x : frame) {
       const int scaled = record.inputGainMode == 1   ? static_cast<int>(std::floor(x / 4.0))
                          : record.inputGainMode == 2 ? x * 4
@@ -176,17 +169,18 @@ struct DriverModel {
       if (length == 160) s1chns_C(ns_flags, &record.suppressor, &suppressed[0], &suppressed[0]);
     } else {
       calm = static_cast<Word16>(is_normal ? calm + 1 : 0);
-      keep(line("TQE: Check Abnormal Audio ...%s dont do NS ... in EPD_Proc_Frame",
-                is_normal ? " wait few more frame ..." : ""));
+      keep(debug_line("TQE: Check Abnormal Audio ...%s dont do NS ... in EPD_Proc_Frame",
+                      is_normal ? " wait few more frame ..." : ""));
     }
-    const Word32 answer =
+    const Word32 decision =
         KEPDfunc(flags, &handle, suppressed.data(), static_cast<std::uint32_t>(type), reasons);
     for (const LogLine &said : log.take()) keep(said);
-    KEPDfunc_NoiseEstimation(&handle, frame.data(), answer);
+    KEPDfunc_NoiseEstimation(&handle, frame.data(), decision);
     dumped_input.insert(dumped_input.end(), frame.begin(), frame.end());
-    dumped_answers.insert(dumped_answers.end(), frame.size(), static_cast<Word16>(1000 * answer));
-    count_hangover(answer == 1);
-    return answer;
+    dumped_decisions.insert(dumped_decisions.end(), frame.size(),
+                            static_cast<Word16>(1000 * decision));
+    count_hangover(decision == 1);
+    return decision;
   }
 
   void count_hangover(bool speech) {
@@ -194,8 +188,8 @@ struct DriverModel {
     const bool starts = !speech && frames <= 0;
     frames = speech ? -1 : starts ? 1 : frames + 1;
     if (record.hangLogEnabled == 0) return;
-    if (starts) keep(line("%ld:TQE: vm_sum ... JAVA HANGOVER started!", id));
-    if (frames % 10 == 0) keep(line("%ld:TQE: _vm_sum ... HANGframe = %d", id, frames));
+    if (starts) keep(debug_line("%ld:TQE: vm_sum ... JAVA HANGOVER started!", id));
+    if (frames % 10 == 0) keep(debug_line("%ld:TQE: _vm_sum ... HANGframe = %d", id, frames));
   }
 
   void reset() {
@@ -207,7 +201,7 @@ struct DriverModel {
 
   void stop_logging() {
     record.hangLogEnabled = 0;
-    keep(line("TQE: EPD(%ld) LOG is disabled before ResetEPD", id));
+    keep(debug_line("TQE: EPD(%ld) LOG is disabled before ResetEPD", id));
   }
 
   const long id;
@@ -219,7 +213,7 @@ struct DriverModel {
   EpdReasons reasons{};
   Flags ns_flags;
   LogLines lines;
-  Pcm dumped_input, dumped_answers;
+  Pcm dumped_input, dumped_decisions;
 };
 
 /// A frame at the limits of screening: so many samples of magnitude 4, so many zeros in a row.
@@ -237,7 +231,7 @@ Pcm limit_frame(std::mt19937_64 &random, int length) {
   return frame;
 }
 
-/// Low square waves of full scale between breaths of noise: what saturates most after suppression.
+/// Low-pitched square waves of full scale between noise: what saturates most after suppression.
 Pcm loud_wave(std::mt19937_64 &random, int length, int frame) {
   Pcm pcm;
   const bool quiet = frame < 20 || frame % 50 < 10;
@@ -311,11 +305,11 @@ TEST_F(EpdDriver, FollowsItsSteps) {
       ASSERT_TRUE(snapshot(*epd) == snapshot(model.record)) << call;
     }
     epd.reset();
-    ASSERT_EQ(log.take(), LogLines{line("TQE: free EPD memory id : %ld", id)});
+    ASSERT_EQ(log.take(), LogLines{debug_line("TQE: free EPD memory id : %ld", id)});
     if (dumps) {
       const std::string stem = folder / std::to_string(id);
       ASSERT_EQ(load_recording(stem + "_inputEPD.pcm"), model.dumped_input);
-      ASSERT_EQ(load_recording(stem + "_resultEPD.pcm"), model.dumped_answers);
+      ASSERT_EQ(load_recording(stem + "_resultEPD.pcm"), model.dumped_decisions);
       fs::remove(stem + "_inputEPD.pcm");
       fs::remove(stem + "_resultEPD.pcm");
     }
@@ -339,12 +333,12 @@ TEST_F(EpdDriver, RefusesWhatIsNotThere) {
   EXPECT_EQ(setLogging(nullptr, 1), -1);
   log.take();
   EXPECT_EQ(FreeMemoryEPD(nullptr), -1);
-  EXPECT_EQ(log.take(), LogLines{line("TQE: free EPD memory id : %d", 0)});
+  EXPECT_EQ(log.take(), LogLines{debug_line("TQE: free EPD memory id : %d", 0)});
   EXPECT_EQ(FreeMemoryEPD(reinterpret_cast<EpdInstance *>(std::intptr_t{-1})), -1);
-  EXPECT_EQ(log.take(), LogLines{line("TQE: free EPD memory id : %d", -1)});
+  EXPECT_EQ(log.take(), LogLines{debug_line("TQE: free EPD memory id : %d", -1)});
 
   EXPECT_STREQ(GetVersion(), "160705");
-  // What stays of 256 bytes beside folder, the longest handle and suffix.
+  // What is left of 256 bytes beside folder, the longest handle and suffix.
   EXPECT_EQ(SetDumpRoot(std::string(200, 'x').c_str()), 0);
   EXPECT_EQ(SetDumpRoot(std::string(201, 'x').c_str()), -1);
 

@@ -1,4 +1,4 @@
-// The end-point decision over runs of voice decisions, and the noise floor.
+// The end-point decision over runs of voiced and unvoiced frames, and the noise floor.
 #include "Voice_Engine/epd/kepd.h"
 
 #include <gtest/gtest.h>
@@ -29,9 +29,9 @@ protected:
   EpdReasons reasons{};
 };
 
-/// The answers to voice decisions, both as runs like "45n 26s 1e": voiced or unvoiced frames in,
-/// none, speech or end of speech out.
-std::string answers(const std::string &runs, std::uint32_t type, bool narrow_band) {
+/// The decisions on frames with or without voice, both as runs like "45n 26s 1e": voiced or
+/// unvoiced frames in, none, speech or end of speech out.
+std::string decisions(const std::string &runs, std::uint32_t type, bool narrow_band) {
   KepdState kepd{};
   EpdReasons reasons{};
   std::istringstream in(runs);
@@ -57,11 +57,11 @@ TEST_F(KepdTest, AnswersRunsOfVoiceAndPause) {
   } long_timing[] =
       {
           {"300u", "300n", "300n"},
-          {"100v 40u", "44n 80s 1e 15n", "44n 83s 1e 12n"},  // deaf at first
+          {"100v 40u", "44n 80s 1e 15n", "44n 83s 1e 12n"},  // initial noise frames
           {"39u 5v 1u 6v 10u", "50n 11s", "50n 11s"},
           {"45v 60u", "44n 25s 1e 35n", "44n 28s 1e 32n"},  // never too short
           {"100v 25u 10v", "44n 80s 1e 5n 5s", "44n 83s 1e 5n 2s"},
-          // Four voiced frames in a row forget the pause.
+          // Four voiced frames in a row clear the pause.
           {"50v 20u 3v 5u", "44n 33s 1e", "44n 34s"},
           {"50v 20u 4v 24u 4u", "44n 54s 1e 3n", "44n 57s 1e"},
           {"50v 10u 2v 1u 2v 14u", "44n 34s 1e", "44n 35s"},
@@ -69,25 +69,25 @@ TEST_F(KepdTest, AnswersRunsOfVoiceAndPause) {
     short_timing[] = {
         {"60v 20u", "42n 31s 1e 6n", "42n 34s 1e 3n"},
         {"39u 3v 1u 4v 20u", "46n 14s 7n", "46n 14s 7n"},
-        // Refused at the limit of the pause, and all is forgotten.
+        // Refused at the limit of the pause, and everything is cleared.
         {"48v 20u", "42n 19s 7n", "42n 19s 7n"},
         {"49v 20u", "42n 20s 1e 6n", "42n 23s 1e 3n"},
         {"48v 20u 60v 14u", "42n 19s 10n 70s 1e", "42n 19s 10n 71s"},
     };
   for (const std::uint32_t type : {0U, 1U}) {
     for (const auto &[runs, wide, narrow] : long_timing) {
-      EXPECT_EQ(answers(runs, type, false), wide) << runs;
-      EXPECT_EQ(answers(runs, type, true), narrow) << runs;
+      EXPECT_EQ(decisions(runs, type, false), wide) << runs;
+      EXPECT_EQ(decisions(runs, type, true), narrow) << runs;
     }
   }
   for (const std::uint32_t type : {2U, 9U, 0xFFFFFFFFU}) {
     for (const auto &[runs, wide, narrow] : short_timing) {
-      EXPECT_EQ(answers(runs, type, false), wide) << runs;
-      EXPECT_EQ(answers(runs, type, true), narrow) << runs;
+      EXPECT_EQ(decisions(runs, type, false), wide) << runs;
+      EXPECT_EQ(decisions(runs, type, true), narrow) << runs;
     }
   }
   log.take();
-  answers("60v 10u 5v 10u 20v", 0, false);
+  decisions("60v 10u 5v 10u 20v", 0, false);
   EXPECT_EQ(log.take(), (LogLines{kOnsetLine, kOnsetLine}));
 }
 
@@ -217,7 +217,7 @@ TEST_F(NoiseFloor, SwitchesTheGateOnAfterFortyFiveSpeechFrames) {
     EXPECT_EQ(vad.blk_count, blocks + 1);
     return vad.energy_th;
   };
-  EXPECT_EQ(threshold_after(1), 1) << "the detector heard of it too early";
+  EXPECT_EQ(threshold_after(1), 1) << "the detector got it too early";
   EXPECT_EQ(record->kepd.EnergyTHscore, 0.84F);
   EXPECT_EQ(record->noise_floor.speech_frames_ne, 46);
   EXPECT_EQ(log.take(), LogLines{info_line("TQE: EnergyTHscore: 0.840000")});

@@ -1,4 +1,4 @@
-// Instances on their own threads, under one log sink, answer as they do alone.
+// Instances on threads of their own, with one log sink, give the same results as alone.
 #include <gtest/gtest.h>
 
 #include <atomic>
@@ -14,10 +14,10 @@ namespace orvalis::test {
 namespace {
 
 std::vector<int64_t> answers_of(const Pcm &pcm) {
-  std::vector<int64_t> answers;
+  std::vector<int64_t> results;
   EpdInstance *epd = InitializeEPD(0, 0);
   for (std::size_t at = 0; at + 160 <= pcm.size(); at += 160) {
-    answers.push_back(ProcessEPDFrame(epd, &pcm[at], 160));
+    results.push_back(ProcessEPDFrame(epd, &pcm[at], 160));
   }
   FreeMemoryEPD(epd);
 
@@ -26,22 +26,22 @@ std::vector<int64_t> answers_of(const Pcm &pcm) {
   const int64_t drc = InitializeDRC(16000, 0);
   Pcm suppressed = pcm, scratch = pcm;
   for (std::size_t at = 0; at + 160 <= pcm.size(); at += 160) {
-    answers.push_back(ProcessDoNSFrame(ns, &scratch[at], 160, &suppressed[at], 160));
-    answers.push_back(ProcessDRC(drc, &suppressed[at], 160));
+    results.push_back(ProcessDoNSFrame(ns, &scratch[at], 160, &suppressed[at], 160));
+    results.push_back(ProcessDRC(drc, &suppressed[at], 160));
   }
   FreeMemoryNS(ns);
   FreeMemoryDRC(drc);
-  answers.insert(answers.end(), suppressed.begin(), suppressed.end());
+  results.insert(results.end(), suppressed.begin(), suppressed.end());
 
   const UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   UtteranceStream *stream = OpenUtteranceStream(&settings);
   PushUtteranceAudio(stream, pcm.data(), static_cast<int32_t>(pcm.size()));
   FlushUtteranceStream(stream);
   for (Utterance found; NextUtterance(stream, &found) == 1;) {
-    answers.insert(answers.end(), {found.start, found.end, found.number});
+    results.insert(results.end(), {found.start, found.end, found.number});
   }
   CloseUtteranceStream(stream);
-  return answers;
+  return results;
 }
 
 TEST(Threads, InstancesDoNotDisturbEachOther) {

@@ -33,7 +33,7 @@ public:
     state.blk_frames = state.blk_count = 0;
     state.energy_th = state.blk_acc = state.blk_mean = state.speech_level = 0;
   }
-  Word32 judge(const Word16 *frame) {
+  Word32 decide(const Word16 *frame) {
     return VelmoraVAD(flags_, &pointer_, frame, band_, reasons_);
   }
   Word32 gated(const Word16 *frame, float score) {
@@ -55,9 +55,9 @@ std::vector<Word16> speech(Word32 band) {
                    : with_level_jumps(speech_8k("raw/hts1.raw"), 4000);
 }
 
-template <class Judge>
-void for_each_frame(const std::vector<Word16> &audio, std::size_t samples, Judge judge) {
-  for (std::size_t at = 0; at + samples <= audio.size(); at += samples) judge(&audio[at]);
+template <class Decide>
+void for_each_frame(const std::vector<Word16> &audio, std::size_t samples, Decide decide) {
+  for (std::size_t at = 0; at + samples <= audio.size(); at += samples) decide(&audio[at]);
 }
 
 class VelmoraVadBand : public testing::TestWithParam<Word32> {};
@@ -69,7 +69,7 @@ TEST_P(VelmoraVadBand, FollowsTheModelFrameByFrame) {
   DetectorSubject engine = subject(GetParam());
   for_each_frame(speech(GetParam()), detector.samples(), [&](const Word16 *frame) {
     const VelmoraVadState before = detector.state;
-    const Word32 voice = detector.judge(frame);
+    const Word32 voice = detector.decide(frame);
     const auto step = engine.hold(bounds, before, detector.state, frame);
     const bool loud = step.found.total_energy > 299999;
     bounds.hold("flag", voice - (loud && !step.found.is_noise), 0.5);
@@ -92,7 +92,7 @@ TEST_P(VelmoraVadBand, AgreesWithAModelThatRunsOnItsOwn) {
     const bool voice = !is_noise && found.total > 299999;
     frames += 1;
     voiced += voice;
-    differ += voice != (detector.judge(frame) == 1);
+    differ += voice != (detector.decide(frame) == 1);
   });
   EXPECT_LE(differ, frames / 100);
   EXPECT_GT(voiced, frames / 10);
@@ -125,7 +125,7 @@ TEST_P(VelmoraVadBand, VoiceNeedsATotalOf300000) {
     std::ranges::fill(detector.state.ch_enrg_long_db, Word16{0});
     detector.state.ch_enrg[0] = 665600;
     detector.state.ch_enrg[1] = step;
-    const Word32 voice = detector.judge(silence.data());
+    const Word32 voice = detector.decide(silence.data());
     const Word64 total = std::accumulate(std::begin(detector.state.ch_enrg),
                                          std::end(detector.state.ch_enrg), Word64{0});
     ASSERT_EQ(voice, total > 299999) << total;
@@ -139,7 +139,7 @@ TEST_P(VelmoraVadBand, CountsItsFramesWithoutWrapping) {
   const std::vector<Word16> silence(160);
   detector.state.vad_frame_cnt = 32765;
   for (int expected : {32766, 32767, 32767}) {
-    EXPECT_EQ(detector.judge(silence.data()), 0);
+    EXPECT_EQ(detector.decide(silence.data()), 0);
     EXPECT_EQ(detector.state.vad_frame_cnt, expected);
   }
 }
@@ -151,10 +151,10 @@ TEST_P(VelmoraVadBand, GateLearnsItsThresholdFromSixBlocks) {
     Word64 level = 0, threshold = 0;
     int closed = 0;
     for_each_frame(speech(GetParam()), detector.samples(), [&](const Word16 *frame) {
-      const Word32 answer = detector.gated(frame, score);
+      const Word32 voice = detector.gated(frame, score);
       const Word64 energy = detector.state.tot_enrg;
       if (detector.state.vad_flag == 0) {
-        ASSERT_EQ(answer, 0);
+        ASSERT_EQ(voice, 0);
         return;
       }
       voiced.push_back(energy);
@@ -168,8 +168,8 @@ TEST_P(VelmoraVadBand, GateLearnsItsThresholdFromSixBlocks) {
       }
       ASSERT_EQ(detector.state.speech_level, level);
       ASSERT_EQ(detector.state.energy_th, threshold);
-      ASSERT_EQ(answer, threshold <= energy);
-      closed += answer == 0;
+      ASSERT_EQ(voice, threshold <= energy);
+      closed += voice == 0;
     });
     EXPECT_GT(voiced.size(), 200u);
     EXPECT_EQ(detector.state.blk_count, 6);
@@ -186,7 +186,7 @@ TEST_P(VelmoraVadBand, GateAtItsEdges) {
   const std::vector<Word16> audio = speech(GetParam());
   const Word16 *frame = audio.data();
   VelmoraVadState before = detector.state;
-  for (; detector.judge(frame) == 0; frame += detector.samples()) before = detector.state;
+  for (; detector.decide(frame) == 0; frame += detector.samples()) before = detector.state;
   const Word64 energy = detector.state.tot_enrg;
 
   const auto gated_from = [&](Word32 blocks, Word64 sum, Word64 mean, Word64 threshold,
@@ -222,7 +222,7 @@ TEST_P(VelmoraVadBand, GateAtItsEdges) {
 TEST(VelmoraVad, AnyOtherBandIsNarrow) {
   Detector narrow(1), negative(-1);
   for_each_frame(speech(1), 80, [&](const Word16 *frame) {
-    ASSERT_EQ(narrow.judge(frame), negative.judge(frame));
+    ASSERT_EQ(narrow.decide(frame), negative.decide(frame));
     ASSERT_EQ(narrow.state.tot_enrg, negative.state.tot_enrg);
   });
 }

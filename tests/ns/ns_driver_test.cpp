@@ -30,15 +30,8 @@ struct FreeSuppressor {
 };
 using Suppressor = std::unique_ptr<NsInstance, FreeSuppressor>;
 
-template <class... Values>
-LogLine line(const char *format, Values... values) {
-  std::array<char, 200> text;
-  std::snprintf(text.data(), text.size(), format, values...);
-  return debug_line(text.data());
-}
-
 LogLine version_line(Word32 argument) {
-  return line("TQE: libOrvalis.so version 160705 IS127 in doNS, NS MODE : %d", argument);
+  return debug_line("TQE: libOrvalis.so version 160705 IS127 in doNS, NS MODE : %d", argument);
 }
 
 struct Mode {
@@ -57,12 +50,12 @@ int frame_length(Word32 mics, Word32 rate) {
   return rate == 0 ? 160 : rate == 1 ? 0 : 80;
 }
 
-/// The driver once more, as the list of its steps over the engine's suppressors.
+/// The driver a second time, as the list of its steps on the engine's suppressors.
 struct Model {
   Model(const Mode &mode, Word32 mic_count, S2chnsState &shared)
       : mics(mic_count), length(frame_length(mics, mode.rate)), both(shared) {
-    if (mics == 1) lines.push_back(line("TQE: DoNS_Create 1Mic NS Initialize"));
-    if (mics == 2) lines.push_back(line("TQE: DoNS_Create 2Mic NS Initialize"));
+    if (mics == 1) lines.push_back(debug_line("TQE: DoNS_Create 1Mic NS Initialize"));
+    if (mics == 2) lines.push_back(debug_line("TQE: DoNS_Create 2Mic NS Initialize"));
     lines.push_back(version_line(mode.argument));
     S1CHNSInit(&single, mode.argument);
     if (mics == 2) both = {};
@@ -71,23 +64,24 @@ struct Model {
   Word32 process(Word16 *in, Word32 samples, Word16 *out) {
     if (length == 0) return -1;
     if (samples % length != 0) {
-      lines.push_back(
-          line("TQE: Check pcm buffer size : numInSample = %d, PCM_LEN = %d", samples, length));
+      lines.push_back(debug_line("TQE: Check pcm buffer size : numInSample = %d, PCM_LEN = %d",
+                                 samples, length));
       lines.back().priority = 6;
     }
-    if (heard == 0) lines.push_back(line("TQE: with DoNS ... numInSample = %d ", samples));
+    if (processed == 0)
+      lines.push_back(debug_line("TQE: with DoNS ... numInSample = %d ", samples));
     int small = 0;
     for (Word32 at = 0; at < samples; at += length) {
-      heard += length;
+      processed += length;
       if (is_null(in + at, small)) {
-        lines.push_back(line("TQE: Audio Null Check fail ... dont do NS !"));
+        lines.push_back(debug_line("TQE: Audio Null Check fail ... dont do NS !"));
       } else if (is_settled(4 * small < 3 * length)) {
         calm = 3;
         if (mics == 1) s1chns_C(flags, &single, in + at, out + at);
         if (mics == 2) S2CHNSProcessNSFrame(both, in + at, out + at, 160);
       }
     }
-    return heard;
+    return processed;
   }
 
   bool is_null(const Word16 *frame, int &small) const {
@@ -101,12 +95,12 @@ struct Model {
   }
 
   bool is_settled(bool normal) {
-    const bool first = heard == length;
-    if (calm == 3 || (first ? normal : heard >= 3200)) return true;
+    const bool first = processed == length;
+    if (calm == 3 || (first ? normal : processed >= 3200)) return true;
     const bool counts = normal && !first;
     calm = counts ? calm + 1 : 0;
-    lines.push_back(line("TQE: Check Abnormal Audio ...%s dont do NS ... in DoNS_Proc_Frame",
-                         counts ? " wait few more frame ..." : ""));
+    lines.push_back(debug_line("TQE: Check Abnormal Audio ...%s dont do NS ... in DoNS_Proc_Frame",
+                               counts ? " wait few more frame ..." : ""));
     return false;
   }
 
@@ -115,7 +109,7 @@ struct Model {
   S2chnsState &both;  ///< of all instances with two microphones
   S1chnsState single{};
   Flags flags;
-  Word32 heard = 0;
+  Word32 processed = 0;
   int calm = 0;
   LogLines lines;
 };
@@ -169,20 +163,20 @@ TEST_F(NsDriver, FollowsItsSteps) {
       ++changed[in_place ? 0 : out != Pcm(out.size(), 12345)];
       if (mics == 2 && one_in(60)) {
         *both = {};
-        create();  // starts the suppressor of all afresh
+        create();  // resets the suppressor that all share
         log.take();
       }
     }
     const long id = reinterpret_cast<std::intptr_t>(ns.get());
     ns.reset();
-    ASSERT_EQ(log.take(), LogLines{line("TQE: free NS memory id : %li", id)});
+    ASSERT_EQ(log.take(), LogLines{debug_line("TQE: free NS memory id : %li", id)});
   }
   EXPECT_GT(changed[1], 1000);
 }
 
 TEST_F(NsDriver, SettlesByTheFirstFrameByThreeOrByTime) {
   // Frames: normal, hissing (three quarters of small samples), barely normal, of zeros; what
-  // follows tells which are suppressed.
+  // follows shows which are suppressed.
   const std::pair<std::string, std::string> cases[] = {
       {"nhz", "ww."},     {"bh", "ww"},         {"hnnnnh", "....ww"},
       {"znnbn", "....w"}, {"hnznnn", ".....w"}, {"hnnhnnnn", ".......w"}};
@@ -192,14 +186,14 @@ TEST_F(NsDriver, SettlesByTheFirstFrameByThreeOrByTime) {
       const auto suppressed = [&](const std::string &frames) {
         const Suppressor ns(InitializeDoNS(mode.mode, mics, 0));
         std::string written;
-        Word32 heard = 0;
+        Word32 processed = 0;
         for (const char kind : frames) {
           Pcm in(length + kTail, static_cast<Word16>(kind == 'z' ? 0 : 1000));
           if (kind == 'h' || kind == 'b') std::fill_n(in.begin(), length * 3 / 4, Word16{-4});
           if (kind == 'b') in[0] = 5;
           Pcm out(in.size(), 12345);
-          heard += length;
-          EXPECT_EQ(ProcessDoNSFrame(ns.get(), in.data(), length, out.data(), length), heard);
+          processed += length;
+          EXPECT_EQ(ProcessDoNSFrame(ns.get(), in.data(), length, out.data(), length), processed);
           written += out == Pcm(in.size(), 12345) ? '.' : 'w';
         }
         return written;
@@ -236,8 +230,8 @@ TEST_F(NsDriver, RefusesWhatIsNotThere) {
 
   EXPECT_EQ(FreeMemoryNS(nullptr), -1);
   EXPECT_EQ(FreeMemoryNS(reinterpret_cast<NsInstance *>(std::intptr_t{-1})), -1);
-  EXPECT_EQ(log.take(),
-            (LogLines{line("TQE: free NS memory id : 0"), line("TQE: free NS memory id : -1")}));
+  EXPECT_EQ(log.take(), (LogLines{debug_line("TQE: free NS memory id : 0"),
+                                  debug_line("TQE: free NS memory id : -1")}));
   const auto no_memory = ScriptedMalloc::failing();
   for (const Word32 mics : {1, 2, 3}) EXPECT_EQ(InitializeDoNS(2, mics, 0), nullptr);
   EXPECT_EQ(log.take(), (LogLines{version_line(0), version_line(0), version_line(0)}));

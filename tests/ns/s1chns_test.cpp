@@ -61,8 +61,8 @@ double level_db(const Word16 *samples, std::size_t count) {
   return 10 * std::log10(sum / count + 1e-9);
 }
 
-/// Channel gains by the definition: the noise level turned over, a floor, and a rise of 0.45 dB for
-/// each step of signal-to-noise ratio beyond 6. Few speech-like channels count as none.
+/// Channel gains by their definition: the reciprocal of the noise, a floor, and 0.454 dB for each
+/// step of the SNR index above 6. If few channels hold speech, none does.
 std::vector<double> model_gains(const ChannelFindings &found, double noise, double floor_db) {
   std::vector<int> snr(found.snr, found.snr + kSuppressionChannels);
   if (std::ranges::count_if(snr, [](int index) { return index >= 12; }) < 5)
@@ -200,7 +200,7 @@ TEST(S1chns, SilenceGivesTheTailThroughTheDeEmphasis) {
   suppressor.frame(silence.data());  // still holds the last samples of speech
   S1chnsState before = suppressor.state;
   ASSERT_NE(before.synthesis_overlap[0], 0);
-  // Small memories tell the truncated product with the first sample from the rounded others.
+  // Small memories distinguish the truncated product of the first sample from the rounded others.
   for (int memory = -300; memory <= 300; ++memory) {
     suppressor.state = before;
     suppressor.state.de_emp_mem = static_cast<Word16>(memory);
@@ -237,7 +237,7 @@ TEST(S1chns, ExtremesSaturateAndPass) {
   }
   std::ranges::fill(frame, Word16{0});
   for (int i = 0; i < 3; ++i) suppressor.frame(frame.data());
-  EXPECT_LE(peak(suppressor.frame(frame.data())), 2) << "loud audio is still heard";
+  EXPECT_LE(peak(suppressor.frame(frame.data())), 2) << "loud audio is still there";
 }
 
 TEST(S1chns, CountsItsFramesWithoutWrapping) {

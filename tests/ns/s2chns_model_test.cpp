@@ -87,7 +87,7 @@ struct Model {
     }
   }
 
-  /// Processes 160 pairs; the output before it is cut to integers.
+  /// Processes 160 pairs; the output before it is truncated to integers.
   Reals process(const Word16 *pairs) {
     std::array<Spectra, 2> Y;
     for (int c = 0; c < 2; ++c) {
@@ -113,10 +113,10 @@ struct Model {
     } else {
       for (int k = 0; k < kBins; ++k) smooth(input[k], 0.61, outer[k]);
       const Reals before = presence;
-      judge();
+      update_presence();
       for (int k = 0; k < kBins; ++k) presence[k] = 0.6 * before[k] + 0.4 * presence[k];
       learn();
-      judge();
+      update_presence();
       learn();
       for (int k = 2; k < kBins; ++k) out[k] = filtered(k);
     }
@@ -138,7 +138,7 @@ struct Model {
   }
 
   /// Probability that a bin holds speech.
-  void judge() {
+  void update_presence() {
     Reals gamma(kBins), r(kBins), beta(kBins);
     double sum = 0;
     for (int k = 0; k < kBins; ++k) {
@@ -208,7 +208,7 @@ Pcm mixture() {
 struct Errors {
   double input = 0, noise = 0;  ///< of a covariance, relative to its trace
   double presence = 0;
-  double tail = 0;    ///< of a sample, before it is cut
+  double tail = 0;    ///< of a sample, before truncation
   double output = 0;  ///< and after
 };
 

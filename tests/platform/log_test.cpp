@@ -1,4 +1,4 @@
-// Where log lines go, as a host meets it.
+// Where log lines go, as a host sees it.
 #include <gtest/gtest.h>
 
 #include <string>
@@ -23,16 +23,16 @@ TEST(Log, WritesToStandardErrorUnlessTheHostTakesIt) {
   EXPECT_EQ(lines_of("one"), "D/Orvalis: one\nI/Orvalis: 4\nE/Orvalis: five\n");
   const std::string endless(1000, 'x');
   EXPECT_EQ(lines_of(endless).find('\n'), std::string("D/Orvalis: ").size() + 255)
-      << "cut, not lost";
+      << "truncated, not lost";
 
-  std::string heard;
+  std::string received;
   SetLogSink(
       [](int priority, const char *tag, const char *text, void *user) {
         *static_cast<std::string *>(user) += std::to_string(priority) + tag + text + ";";
       },
-      &heard);
+      &received);
   EXPECT_EQ(lines_of("one"), "");
-  EXPECT_EQ(heard, "3Orvalisone;4Orvalis4;6Orvalisfive;");
+  EXPECT_EQ(received, "3Orvalisone;4Orvalis4;6Orvalisfive;");
   SetLogSink(nullptr, nullptr);
   EXPECT_NE(lines_of("one"), "") << "a null sink restores the default";
 }

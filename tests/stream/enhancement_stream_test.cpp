@@ -1,5 +1,5 @@
-// The enhancement stream against the engine's frames and against laws that hold for any audio:
-// cuts, ends, delays, neighbours. Linked with --wrap for malloc.
+// The enhancement stream against the engine's frames, and what holds for any audio: chunk sizes,
+// ends, delays, several streams. Linked with --wrap for malloc.
 #include "stream/enhancement_stream.h"
 
 #include <gtest/gtest.h>
@@ -29,8 +29,8 @@ Pcm part(const Pcm &samples, std::ptrdiff_t from, std::ptrdiff_t count) {
   return {samples.begin() + from, samples.begin() + from + count};
 }
 
-/// A stream with all that came out of it. Each call is first refused for want of room, then gets
-/// exactly as much as is promised to suffice, with a guard behind it.
+/// A stream and its output. Each call is first refused for lack of room, then gets exactly the room
+/// that is promised to suffice, with a guard behind it.
 class Enhancer {
 public:
   explicit Enhancer(const Settings &settings)

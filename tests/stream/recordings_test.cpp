@@ -179,7 +179,7 @@ TEST(Recordings, TheFirstWordCountsWithALeadIn) {
     const auto late = utterances_of(speech, without), found = utterances_of(speech, with);
     ASSERT_EQ(late.size(), 1U);
     ASSERT_EQ(found.size(), 1U);
-    EXPECT_DOUBLE_EQ(late[0].start_s, 0.39) << "the detector hears nothing before";
+    EXPECT_DOUBLE_EQ(late[0].start_s, 0.39) << "the detector finds nothing before";
     EXPECT_LT(found[0].start_s, 0.30);
     EXPECT_NEAR(found[0].start_s, utterances_of(speech, reference)[0].start_s, 0.135);
     EXPECT_NEAR(found[0].end_s, late[0].end_s, 0.025);
@@ -231,7 +231,7 @@ std::vector<double> unit_background(Background kind, const std::vector<Pcm> &rec
   return babble;
 }
 
-/// How much of the speech lies in utterances, and how much of these does not lie where it is.
+/// How much of the speech lies in utterances, and how much of the utterances lies beside it.
 struct Coverage {
   int speech = 0, kept = 0, recordings = 0;
   double beyond_s = 0;

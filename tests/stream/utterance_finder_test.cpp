@@ -35,7 +35,7 @@ std::string frames(const std::string &runs) {
   return script;
 }
 
-/// A finder and its queue, from which all is taken at once. What it tells is held against itself.
+/// A finder and its queue, which is always emptied. Checks that what it reports is consistent.
 class Finder {
 public:
   explicit Finder(const FinderSettings &settings) : finder_(settings) {}
@@ -128,9 +128,9 @@ TEST(UtteranceFinder, DatesPiecesBackByTheDetectorsDelay) {
 TEST(UtteranceFinder, ClipsToTheInputAndToThePreviousPiece) {
   const auto no_hangover = settings_of(16000, 0, 0);
   expect_spans({{no_hangover, "2o 60s 2o", "0-37"},
-                // The interrupted piece ends undated; the next onset is dated back into it.
+                // The interrupted segment ends undated; the next onset is dated back into it.
                 {no_hangover, "50o 40s 1n 1o 60s 2o", "45-90 90-127"},
-                // A piece that is no longer than the closing pause holds no speech.
+                // A segment no longer than the closing pause holds no speech.
                 {no_hangover, "50o 20s 40o", ""}});
 }
 
@@ -150,7 +150,7 @@ TEST(UtteranceFinder, TreatsNullAudioAsSilence) {
                 // Resumed without a new onset: not dated back, whether joined or not.
                 {settings, "50o 60s 9n 40s 60o", "45-134"},
                 {settings, "50o 60s 10n 40s 60o", "45-110 120-135"},
-                // A judged frame without speech in between, so the next run is a new onset.
+                // A decision for no speech in between, so the next run is a new onset.
                 {settings, "50o 60s 2n 1o 21n 40s 60o", "45-110 129-149"},
                 // Resumed into nothing but the closing pause: the joined end stays.
                 {settings, "50o 60s 2n 10s 60o", "45-110"}});
@@ -186,7 +186,7 @@ TEST(UtteranceFinder, PadsUpToTheMiddleOfAGap) {
                 {settings_of(16000, 0, 0, 0, 100000), runs, "45-120 155-320"},
                 {settings_of(16000, 0, 0, 0, 500), runs, "45-120 155-245"}});
 
-  // An odd gap leaves no sample to both and none to neither.
+  // The halves of an odd gap neither overlap nor leave a sample out.
   const auto found = utterances_of(settings_of(8000, 0, 0, 5000, 5000), runs, 33);
   ASSERT_EQ(found.size(), 2u);
   EXPECT_EQ(found[0].end, found[1].start);
@@ -199,22 +199,22 @@ TEST(UtteranceFinder, PaddingKeepsOffAPieceThatHeldNoSpeech) {
 }
 
 TEST(UtteranceFinder, TellsWhatAudioMayBeForgotten) {
-  // 45-85 is handed out when its padding's room is known, 155-195 alike, 255 is still open.
+  // 45-85 and 155-195 are handed out once there is room for their padding; 255 is still open.
   const int32_t frame = 160, pad_frames = 10;
   const auto settings = settings_of(16000, 0, 0, pad_frames * 10, pad_frames * 10);
   Finder finder(finder_settings(settings, decision_timing(settings)));
-  std::vector<int64_t> told;
+  std::vector<int64_t> earliest_starts;
   for (const char kind : frames("50o 60s 50o 60s 40o 60s")) {
     finder.process(kind);
-    told.push_back(finder.earliest());
+    earliest_starts.push_back(finder.earliest());
   }
-  const auto found = finder.finish(std::ssize(told) * frame);
+  const auto found = finder.finish(std::ssize(earliest_starts) * frame);
   ASSERT_EQ(found.size(), 3u);
-  // In silence it keeps up but for the delay and the padding; in speech it waits at the start.
-  EXPECT_EQ(told[39], (40 - 5 - pad_frames) * frame);
-  EXPECT_EQ(told[100], found[0].start);
-  EXPECT_EQ(told[150], (151 - 5 - pad_frames) * frame);
-  EXPECT_EQ(told.back(), found[2].start);
+  // In silence it follows, less the delay and the padding; in speech it waits at the start.
+  EXPECT_EQ(earliest_starts[39], (40 - 5 - pad_frames) * frame);
+  EXPECT_EQ(earliest_starts[100], found[0].start);
+  EXPECT_EQ(earliest_starts[150], (151 - 5 - pad_frames) * frame);
+  EXPECT_EQ(earliest_starts.back(), found[2].start);
 }
 
 TEST(UtteranceFinder, AnEndThatTheDetectorHasNotSeenIsNotDatedBack) {
@@ -226,7 +226,7 @@ TEST(UtteranceFinder, AnEndThatTheDetectorHasNotSeenIsNotDatedBack) {
   }
 }
 
-/// Of a detector without delays, border by border, as a reader of all its decisions would set them.
+/// Of a detector without delays, border by border, from all its decisions at once.
 std::vector<Utterance> expected_of(const FinderSettings &settings, const std::string &script,
                                    int64_t input_end) {
   const int64_t frame = settings.timing.frame_samples;

@@ -1,4 +1,4 @@
-// The utterance stream on real recordings: cut at random, into a full queue, and to the end.
+// The utterance stream on real recordings: chunks of any size, a full queue, the end.
 #include "stream/utterance_stream.h"
 
 #include <gtest/gtest.h>
@@ -58,14 +58,14 @@ void take_all(const Stream &stream, std::vector<Fields> &found) {
 
 /// Pushes what is left of the audio, as far as it is taken.
 void push_rest(const Stream &stream, const Pcm &pcm, std::size_t &done,
-               std::size_t piece = INT32_MAX) {
-  const std::size_t length = std::min(piece, pcm.size() - done);
+               std::size_t chunk = INT32_MAX) {
+  const std::size_t length = std::min(chunk, pcm.size() - done);
   const auto taken = PushUtteranceAudio(stream.get(), pcm.data() + done, static_cast<int>(length));
   ASSERT_GE(taken, 0);
   done += static_cast<std::size_t>(taken);
 }
 
-/// What a stream finds in audio that comes in pieces.
+/// What a stream finds in audio that comes in chunks.
 template <class PieceLength>
 std::vector<Fields> utterances_of(const UtteranceSettings &settings, const Pcm &pcm,
                                   PieceLength piece_length) {
@@ -92,7 +92,7 @@ Pcm long_speech() {
   return pcm;
 }
 
-/// Speech with a null frame behind every four others, which ends utterances like nothing else. The
+/// Speech in which every fifth frame is null audio, which makes as many utterances as possible. The
 /// first 0.2 s are left alone.
 Pcm interrupted(const Pcm &speech) {
   Pcm pcm(speech.begin(), speech.begin() + 3200);
@@ -172,7 +172,7 @@ TEST(UtteranceStream, FlushEndsTheAudio) {
   EXPECT_EQ(PushUtteranceAudio(stream.get(), pcm.data(), 3), -1);
 }
 
-/// What was judged, how, and by what energy and noise.
+/// What was decided on which frame, with its energy and noise.
 struct Frames {
   std::vector<int64_t> starts;
   std::vector<bool> speech;
@@ -317,12 +317,12 @@ TEST(UtteranceStream, NoSettingDependsOnTheCut) {
     settings.pad_after_ms = up_to(300);
     const auto expected = utterances_of(settings, pcm);
     found += expected.size();
-    for (const double longest : {2.5, 5.0}) {  // pieces from single samples to several seconds
+    for (const double longest : {2.5, 5.0}) {  // chunks from single samples to several seconds
       std::uniform_real_distribution<double> exponent(0, longest);
-      const auto piece = [&] {
+      const auto chunk = [&] {
         return static_cast<std::size_t>(std::pow(10, exponent(generator)));
       };
-      ASSERT_EQ(utterances_of(settings, pcm, piece), expected) << "round " << round;
+      ASSERT_EQ(utterances_of(settings, pcm, chunk), expected) << "round " << round;
     }
   }
   EXPECT_GT(found, 100U);

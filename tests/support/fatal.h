@@ -1,4 +1,4 @@
-// What ends the process, held in a child.
+// What ends the process, run in a child.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -7,7 +7,7 @@
 #include <cstdio>
 #include <string>
 
-/// Dies in a child whose standard output is what the death test reads, and standard error is shut.
+/// Dies in a child, of whose output the death test reads standard output only.
 #define EXPECT_FATAL(statement, status, line)                              \
   do {                                                                     \
     std::fflush(stdout); /* or the child repeats what is still buffered */ \

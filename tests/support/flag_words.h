@@ -1,4 +1,4 @@
-// The six process-wide flag words as one value, to prove who touches which.
+// The six process-wide flag words as one value, to check who changes which.
 #pragma once
 
 #include <array>

@@ -9,8 +9,8 @@
 
 namespace orvalis::test {
 
-/// A recording in stretches of as it is, four times (saturated), as it is, a quarter; then a
-/// stretch of a tone that fades from full scale, where no 32 bits hold its energy.
+/// A recording in stretches at its own level, four times (saturated), its own, a quarter; then a
+/// tone that fades from full scale, where 32 bits cannot hold its energy.
 inline Pcm with_level_jumps(Pcm samples, std::size_t stretch) {
   constexpr double kGains[] = {1, 4, 1, 0.25};
   for (std::size_t i = 0; i < samples.size(); ++i) {

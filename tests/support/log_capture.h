@@ -1,6 +1,7 @@
 // Collects the library's log lines.
 #pragma once
 
+#include <cstdio>
 #include <ostream>
 #include <string>
 #include <utility>
@@ -23,6 +24,15 @@ struct LogLine {
 using LogLines = std::vector<LogLine>;
 
 inline LogLine debug_line(std::string text) { return {3, "Orvalis", std::move(text)}; }
+
+/// The same from a printf format and its values.
+template <class Value, class... Values>
+LogLine debug_line(const char *format, Value value, Values... values) {
+  char text[200];
+  std::snprintf(text, sizeof text, format, value, values...);
+  return debug_line(text);
+}
+
 inline LogLine info_line(std::string text) { return {4, "Orvalis", std::move(text)}; }
 
 class LogCapture {

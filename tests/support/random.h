@@ -1,4 +1,4 @@
-// Random operands that a failing test can be repeated with.
+// Random operands from a seed that a failing test prints.
 #pragma once
 
 #include <cstdint>
@@ -8,7 +8,7 @@
 
 namespace orvalis::test {
 
-/// A generator seeded from ORVALIS_SEED or the clock's choice; prints the command that repeats it.
+/// A generator seeded from ORVALIS_SEED or at random; prints the command that repeats the test.
 inline std::mt19937_64 seeded_generator() {
   const char *given = std::getenv("ORVALIS_SEED");
   const std::uint64_t seed = given ? std::strtoull(given, nullptr, 0) : std::random_device{}();

@@ -1,4 +1,4 @@
-// Recordings of speech, as samples. A file that is missing or of another kind ends the test.
+// Recordings of speech, as samples. A file that is missing or has another format ends the test.
 #pragma once
 
 #include <algorithm>

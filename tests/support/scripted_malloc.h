@@ -1,11 +1,11 @@
-// How long memory lasts for the library. Needs --wrap=malloc and --wrap=calloc.
+// Decides when the library runs out of memory. Needs --wrap=malloc and --wrap=calloc.
 #pragma once
 
 #include <cstddef>
 
 namespace orvalis::test {
 
-/// In force while it lives.
+/// In effect during its lifetime.
 class ScriptedMalloc {
 public:
   /// The first `granted` calls succeed, then none.

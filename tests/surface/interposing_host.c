@@ -1,6 +1,6 @@
-/* Prints what the library answers over a recording. Built once as it is, and once with functions
- * and tables of its own under names that the library exports too, all of them wrong: the library
- * must not notice, and both programs print the same.
+/* Prints the library's results for a recording. Built once as it is, and once with wrong functions
+ * and tables of its own under names that the library exports too: the library must not notice, and
+ * both programs print the same.
  *   interposing_host <RECORDING    (raw 16-bit PCM) */
 #include "Voice_Engine/MCRAvad/MCRAvad.h"
 #include "jni/orvalis.h"
@@ -11,7 +11,7 @@
 #include <dlfcn.h>
 #include <stdlib.h>
 
-/* Of the library, whatever the host has under that name. */
+/* The library's own, whatever the host has under that name. */
 static void *next(const char *name) {
   void *address = dlsym(RTLD_NEXT, name);
   if (address == NULL) exit(2);

@@ -8,11 +8,11 @@ int main(void) {
   const UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
   UtteranceStream *stream = OpenUtteranceStream(&settings);
   Utterance found;
-  int16_t piece[1000];
+  int16_t chunk[1000];
   int32_t samples;
   if (OrvalisAbiVersion() != ORVALIS_ABI_VERSION) return 1;
-  while ((samples = (int32_t)fread(piece, sizeof piece[0], 1000, stdin)) > 0)
-    if (PushUtteranceAudio(stream, piece, samples) != samples) return 1;
+  while ((samples = (int32_t)fread(chunk, sizeof chunk[0], 1000, stdin)) > 0)
+    if (PushUtteranceAudio(stream, chunk, samples) != samples) return 1;
   FlushUtteranceStream(stream);
   printf("library %s\n", GetVersion());
   while (NextUtterance(stream, &found) == 1)
