@@ -12,7 +12,7 @@ install(FILES ${ORVALIS_PUBLIC_HEADERS} DESTINATION ${header_folder})
 # "copyright" is the name that Debian looks for.
 install(FILES LICENSE DESTINATION ${CMAKE_INSTALL_DATAROOTDIR}/doc/orvalis RENAME copyright)
 
-# The library needs no other package, so its targets are all that a configuration has to tell.
+# The library needs no other package, so its targets are the whole configuration.
 install(EXPORT Orvalis FILE OrvalisConfig.cmake NAMESPACE Orvalis:: DESTINATION ${cmake_folder})
 write_basic_package_version_file(${PROJECT_BINARY_DIR}/OrvalisConfigVersion.cmake
   COMPATIBILITY SameMajorVersion)
@@ -27,7 +27,7 @@ cmake_path(RELATIVE_PATH headers_from_prefix BASE_DIRECTORY ${CMAKE_INSTALL_PREF
 configure_file(cmake/orvalis.pc.in ${PROJECT_BINARY_DIR}/orvalis.pc @ONLY)
 install(FILES ${PROJECT_BINARY_DIR}/orvalis.pc DESTINATION ${pkgconfig_folder})
 
-# A project that takes the sources in is packaged by its own rules.
+# A project that includes the sources is packaged by its own rules.
 if(PROJECT_IS_TOP_LEVEL)
   # Without dpkg-shlibdeps a Debian package would come out without its dependencies.
   find_program(ORVALIS_SHLIBDEPS dpkg-shlibdeps DOC "Finds what a Debian package depends on")
