@@ -58,10 +58,10 @@ void update_minima(VADINFO &vad, bool is_first) {
 bool indicates_speech(Word64 S, Word64 S_min) { return (S_min <= 1 ? S : S / S_min) > 4; }
 
 /// p' = alpha_p p' + (1 - alpha_p) I
-Word32 presence_average(Word32 p_q31, bool indicates_speech, bool is_first) {
+Word32 presence_average(Word32 p_q31, bool I, bool is_first) {
   constexpr Word32 kAlphaP_q31 = 429496729;           // 0.2
   constexpr Word32 kOneMinusAlphaP_q31 = 1717986918;  // 0.8
-  const Word32 present = indicates_speech ? kOneMinusAlphaP_q31 : 0;
+  const Word32 present = I ? kOneMinusAlphaP_q31 : 0;
   return is_first ? present : saturated_sum(mult_q31(p_q31, kAlphaP_q31), present);
 }
 

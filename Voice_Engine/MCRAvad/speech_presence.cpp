@@ -57,8 +57,7 @@ Word32 amplitude_gain_q15(Word32 v_q12, Word32 xi_q12, bool is_first) {
   return saturated_word32(rounded_shift_right(raised, 17) / (xi_q12 + kOne_q12));
 }
 
-// ---- SNR of the surroundings
-// -----------------------------------------------------------------------
+// ---- SNR of the surroundings --------------------------------------------------------------------
 
 /// zeta = beta zeta + (1 - beta) xi
 Word32 averaged_snr_q12(Word32 zeta_q12, Word32 xi_q12) {

@@ -100,7 +100,7 @@ int16_t ns_mac_r(int32_t sum, int16_t a, int16_t b);
 int16_t msu_r(int32_t sum, int16_t a, int16_t b); /* L_msu, rounded */
 int16_t ns_msu_r(int32_t sum, int16_t a, int16_t b);
 
-/* ---- Arithmetic with carry: results wrap, L_sat saturates ---------------------------------- */
+/* ---- Arithmetic with carry: results wrap, L_sat saturates ----------------------------------- */
 
 int32_t L_add_c(int32_t a, int32_t b); /* a + b + Carry */
 int32_t L_ns_add_c(int32_t a, int32_t b);

@@ -63,7 +63,7 @@ inline Word16 mult_r(FlagSet &flags, Word16 a, Word16 b) {
   return sature(flags, (a * b + 0x4000) >> 15);
 }
 
-// --- 16-bit shifts: the overflow flag is only ever set ----------------------------------------
+// --- 16-bit shifts: the overflow flag is only ever set -------------------------------------------
 
 /// x >> n for n >= 0; sign bits fill in.
 constexpr Word16 shift_right(Word16 x, Word32 n) {
@@ -106,7 +106,7 @@ inline Word16 shift_r(FlagSet &flags, Word16 x, Word32 n) {
   return add(flags, shift_right(x, -n), static_cast<Word16>(shift_right(x, -n - 1) & 1));
 }
 
-// --- 32-bit arithmetic: the overflow flag is only ever set ------------------------------------
+// --- 32-bit arithmetic: the overflow flag is only ever set ---------------------------------------
 
 template <class FlagSet>
 inline Word32 L_add(FlagSet &flags, Word32 a, Word32 b) {
@@ -159,8 +159,7 @@ inline Word16 msu_r(FlagSet &flags, Word32 sum, Word16 a, Word16 b) {
   return round_BOP(flags, L_msu(flags, sum, a, b));
 }
 
-// --- Arithmetic with carry: the result wraps, the flags report it
-// ----------------------------------
+// --- Arithmetic with carry: the result wraps, the flags report it --------------------------------
 
 /// a + b + Carry modulo 2^32. Carry out is that of the unsigned sum.
 template <class FlagSet>

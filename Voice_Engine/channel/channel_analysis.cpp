@@ -116,7 +116,7 @@ inline Word16 snr_index(Flags &flags, Word32 energy, Word32 noise) {
   const Word16 noise_shift = norm_l(noise);
   const Word32 quotient =
       L_divide(flags, L_shl(flags, energy, energy_shift - 1), L_shl(flags, noise, noise_shift));
-  // The shifts make the quotient Q(30 + energy_shift - noise_shift); 26 places fewer are Q4.
+  // The quotient is Q(30 + energy_shift - noise_shift): to Q4 it is 26 more than the difference.
   Word32 ratio_q4 = L_shr(flags, quotient, energy_shift + 26 - noise_shift);
   if (ratio_q4 == 0) ratio_q4 = 1;
   const Word32 logarithm = L_add(flags, fnLog10(flags, ratio_q4), kLog10Of2To27);

@@ -1,4 +1,4 @@
-// The kernel of the single-precision transform; what it computes stands in float_fft.h.
+// The kernel of the single-precision transform. For what it computes see float_fft.h.
 #pragma once
 
 #include <array>
