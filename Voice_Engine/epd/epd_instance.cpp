@@ -140,8 +140,9 @@ Word32 EPD_Proc_Frame(EpdInstance *epd, const Word16 *pcm, Word32 numSample, Wor
     Word16 frame[kMaxFrameSamples];
     std::copy_n(unsuppressed, length, frame);
     if (settled && epd->rateMode == 0) s1chns_C(*ns_flags, &epd->suppressor, frame, frame);
+    EpdInstance *handle = epd;  // its address is taken, so that epd can stay in a register
     const Word32 decision =
-        KEPDfunc(*flags, &epd, frame, static_cast<std::uint32_t>(contentType), reasons);
+        KEPDfunc(*flags, &handle, frame, static_cast<std::uint32_t>(contentType), reasons);
     follow_decision(epd, unsuppressed, decision, reasons);
     if (decision != kNoSpeech) result = 1;
   }
