@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <cstring>
 #include <fstream>
 #include <iterator>
 #include <stdexcept>
@@ -14,7 +13,14 @@ namespace orvalis::test {
 
 using Pcm = std::vector<std::int16_t>;
 
-/// Mono 16-bit samples of a WAV file, or of a headerless one of native byte order.
+/// A little-endian number of the file's, whatever this processor's order is.
+inline std::uint32_t little_endian(const char *bytes, int count) {
+  std::uint32_t value = 0;
+  for (int i = count - 1; i >= 0; --i) value = value << 8 | static_cast<std::uint8_t>(bytes[i]);
+  return value;
+}
+
+/// Mono 16-bit samples of a WAV file, or of a headerless one, which is little-endian too.
 inline Pcm load_recording(const std::string &path) {
   std::ifstream file(path, std::ios::binary);
   const std::string bytes{std::istreambuf_iterator<char>(file), {}};
@@ -26,14 +32,13 @@ inline Pcm load_recording(const std::string &path) {
                              bytes.compare(20, 4, std::string("\1\0\1\0", 4)) == 0 &&
                              bytes.compare(32, 8, std::string("\2\0\x10\0data", 8)) == 0;
     if (!is_mono_pcm || bytes.size() < 44) throw std::runtime_error(path + ": not mono 16-bit PCM");
-    std::uint32_t data_bytes = 0;
-    std::memcpy(&data_bytes, &bytes[40], sizeof data_bytes);
     begin = 44;
-    end = std::min(end, begin + data_bytes);
+    end = std::min<std::size_t>(end, begin + little_endian(&bytes[40], 4));
   }
   Pcm samples((end - begin) / 2);
   if (samples.empty()) throw std::runtime_error(path + ": no samples");
-  std::memcpy(samples.data(), &bytes[begin], 2 * samples.size());
+  for (std::size_t i = 0; i < samples.size(); ++i)
+    samples[i] = static_cast<std::int16_t>(little_endian(&bytes[begin + 2 * i], 2));
   return samples;
 }
 
