@@ -90,6 +90,31 @@ def mcra_frame():
             pushed(voice(3200)) + only_analysed + noise(160) + number(160) + pushed(voice(3200)))
 
 
+def functions():
+    values = [0, 1, 2, 1 << 12, 12354, 12355, 32768, 1 << 26, 1409286143, (1 << 31) - 1]
+    values += [-value for value in values] + [-1 << 31]
+    pairs = [number(x) + number(y) for x in values for y in values[::3]]
+    for name, choice, arguments in [
+            ("logarithm", 0, map(number, values)), ("exponential", 1, map(number, values)),
+            ("integral", 3, map(number, values)), ("roots", 5, map(number, values)),
+            ("angles", 4, pairs), ("power", 6, pairs),
+            ("wide", 7, [a + b for a in pairs[::7] for b in pairs[::9]]),
+            ("power_of_two", 2, [number(x) + word(q) + word(31 - q) + bytes([mode])
+                                 for x in values[:9] for q in (-3, 0, 15, 26) for mode in (0, 1)])]:
+        yield name, b"".join(bytes([choice]) + argument for argument in arguments)
+
+
+def queries():
+    pieces = [literal(), literal(1, -2, 3), literal(*[32767, -32768] * 80), noise(1280, 20000),
+              voice(520, 32767), constant(320, -32768)]
+    for name, choices in {"energy": (0,), "spectrum": (1, 11), "fixed_fft": (2, 12, 17, 27),
+                          "float_fft": (3,), "unscaled_fft": (4, 9)}.items():
+        yield name, b"".join(bytes([choice]) + number(160 if choice == 0 else 0) + piece
+                             for choice in choices for piece in pieces)
+    yield "rates", b"".join(bytes([0]) + number(rate) + noise(640)
+                            for rate in (0, 1, 80, -160, (1 << 31) - 1))
+
+
 def ns_frame():
     whole, any_cut, null = bytes([2]), bytes([1]), bytes([0])
     speech = [noise(8000), voice(8000), noise(3200), voice(6400, period=80)]
@@ -228,7 +253,8 @@ def audio_source():
 
 
 corpus = pathlib.Path(__file__).parent / "corpus"
-for target in (enhancement_stream, epd_frame, mcra_frame, ns_frame, utterance_stream, audio_source):
+for target in (audio_source, enhancement_stream, epd_frame, functions, mcra_frame, ns_frame, queries,
+               utterance_stream):
     folder = corpus / target.__name__
     folder.mkdir(parents=True, exist_ok=True)
     for name, content in target():

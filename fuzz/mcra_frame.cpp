@@ -12,7 +12,8 @@ namespace {
 using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
 
-constexpr std::size_t kMaxSamples = 96000;  // a calibration takes 93000
+constexpr std::size_t kMaxSamples = 16000;
+constexpr std::size_t kMaxCalibrated = 96000;  // a calibration takes 93000
 
 void configure(VADINFO &vad, Input &input) {
   vad.historyUpdate = input.number();
@@ -70,7 +71,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   initialVADINFO(&vad);
   configure(*vad, input);
 
-  for (std::size_t pushed = 0; !input.is_empty() && pushed < kMaxSamples;) {
+  // Few sessions are long, so that many are run.
+  const std::size_t max_samples = vad->calibrationEnable == 1 ? kMaxCalibrated : kMaxSamples;
+  for (std::size_t pushed = 0; !input.is_empty() && pushed < max_samples;) {
     switch (input.byte() % 8) {
       case 0:
         reset_MCRA_params(&vad);
