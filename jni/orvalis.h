@@ -157,7 +157,8 @@ typedef struct EpdInstance EpdInstance;
  * pcmDumpEnabled: 1 appends raw 16-bit PCM to two files named after the handle in decimal,
  * "/sdcard/VRpreprocess/<handle>_inputEPD.pcm" (the frames before suppression) and
  * "..._resultEPD.pcm" (for every sample 0, 1000 = speech or 2000 = end of speech). A file that
- * cannot be opened is silently not written. Any other value writes none.
+ * cannot be opened, or is a symbolic link, is silently not written. The samples are in the
+ * processor's own byte order, without a header. Any other value writes none.
  *
  * Returns NULL if memory runs out.
  */
@@ -319,7 +320,7 @@ int32_t FreeMemoryNS(NsInstance *ns);
  *
  * samplingRate: 16000; with any other, audio is left as it is.
  * pcmDumpEnabled: 1 appends raw 16-bit PCM to "/sdcard/<handle>_beforeDRC.pcm" and
- * "..._afterDRC.pcm".
+ * "..._afterDRC.pcm", as InitializeEPD does.
  *
  * Returns a handle, which is a number; -1 if memory runs out.
  */

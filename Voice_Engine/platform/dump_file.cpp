@@ -1,5 +1,8 @@
 #include "Voice_Engine/platform/dump_file.h"
 
+#include <fcntl.h>
+#include <unistd.h>
+
 #include <cstring>
 
 namespace orvalis {
@@ -25,7 +28,13 @@ bool set_dump_root(const char *directory) {
 std::FILE *open_dump(const char *folder, const void *handle, const char *suffix) {
   char path[kPathSize];
   std::snprintf(path, sizeof path, "%s%s%ld%s", root, folder, handle_number(handle), suffix);
-  return std::fopen(path, "ab");
+  // As fopen(path, "ab") does, but never through a link that somebody has put there, and not left
+  // open in a program that the host starts.
+  const int file = open(path, O_WRONLY | O_APPEND | O_CREAT | O_NOFOLLOW | O_CLOEXEC, 0666);
+  if (file < 0) return nullptr;
+  std::FILE *stream = fdopen(file, "ab");
+  if (stream == nullptr) close(file);
+  return stream;
 }
 
 void write_dump(std::FILE *file, const std::int16_t *samples, int count) {

@@ -1,5 +1,6 @@
 // The EPD instance and its frame driver, seen through decisions, log lines, dump files, flags and
 // counters.
+#include <fcntl.h>
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -361,6 +362,16 @@ TEST_F(EpdDriver, LeavesBothDumpFilesBehindEachCallAndNoHandle) {
       process(epd, pcm);
       EXPECT_TRUE(fs::exists(input) && fs::exists(result)) << pcm.size();
       EXPECT_EQ(open_files(), before + 2) << pcm.size();
+    }
+    // Who can write to the folder cannot choose another file, nor does a child process inherit one.
+    fs::remove(input);
+    fs::create_symlink(root.path() / "victim", input);
+    process(epd, kNormal);
+    EXPECT_FALSE(fs::exists(root.path() / "victim"));
+    for (const auto &file : fs::directory_iterator("/proc/self/fd")) {
+      std::error_code closed;
+      if (!fs::read_symlink(file, closed).string().ends_with("EPD.pcm")) continue;
+      EXPECT_EQ(fcntl(std::stoi(file.path().filename()), F_GETFD), FD_CLOEXEC);
     }
   }
   EXPECT_EQ(open_files(), before);
