@@ -104,6 +104,14 @@ def functions():
         yield name, b"".join(bytes([choice]) + argument for argument in arguments)
 
 
+def java_strings():
+    texts = [b"", b"text", b"zero\0inside", b"\xff" * 255]
+    for name, choices in {"to_java": [0], "from_java": [1], "get_bytes": [2, 10],
+                          "new_string": [3, 11]}.items():
+        yield name, b"".join(bytes([choice, failures, len(text)]) + text for text in texts
+                             for choice in choices for failures in [0, 63, 0, 32, 16, 8, 4, 2, 1])
+
+
 def queries():
     pieces = [literal(), literal(1, -2, 3), literal(*[32767, -32768] * 80), noise(1280, 20000),
               voice(520, 32767), constant(320, -32768)]
@@ -253,8 +261,8 @@ def audio_source():
 
 
 corpus = pathlib.Path(__file__).parent / "corpus"
-for target in (audio_source, enhancement_stream, epd_frame, functions, mcra_frame, ns_frame, queries,
-               utterance_stream):
+for target in (audio_source, enhancement_stream, epd_frame, functions, java_strings, mcra_frame, ns_frame,
+               queries, utterance_stream):
     folder = corpus / target.__name__
     folder.mkdir(parents=True, exist_ok=True)
     for name, content in target():
