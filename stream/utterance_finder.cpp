@@ -39,7 +39,7 @@ void UtteranceFinder::process(bool speech, bool is_null, UtteranceQueue &queue) 
 void UtteranceFinder::finish(int64_t input_end, UtteranceQueue &queue) {
   if (running_) {
     open_->open = 1;
-    open_->end = processed_;
+    open_->end = last_segment_end_ = processed_;
   } else {
     settle_refusal();
   }
