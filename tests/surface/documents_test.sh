@@ -23,7 +23,7 @@ program() {
   chmod +x "$work/bin/$1"
 }
 program orvalis <<<"exec '$build/cli/orvalis' \"\$@\""
-program run <<<"[ \$# -gt 0 ] || set -- '$recordings'/librivox/*-0870.wav; exec orvalis epd \"\$@\""
+program run <<<"[ \$# -gt 0 ] || set -- '$recordings'/librivox/*-0890.wav; exec orvalis epd \"\$@\""
 program cc <<<"exec '$(command -v "$CC")' -std=c99 -Wall -pedantic-errors -Werror \"\$@\""
 program pkg-config <<<"echo '$includes -L$build -lOrvalis -Wl,-rpath,$build'"
 program java <<<"exec '${JAVA-}' \"\$@\""
