@@ -10,7 +10,7 @@ int main(int argc, char **argv) {
   benchmark::Initialize(&argc, argv);
   if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 2;
   // Writing lines would cost more than the frames.
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
   orvalis::bench::register_frame_costs();
   orvalis::bench::Table table;
   benchmark::RunSpecifiedBenchmarks(&table);

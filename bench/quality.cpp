@@ -177,7 +177,7 @@ void print_learning() {
 }  // namespace orvalis::bench
 
 int main() {
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
   orvalis::bench::print_noise_and_error();
   std::printf("\n");
   orvalis::bench::print_learning();

@@ -65,7 +65,7 @@ std::string text_of(const Progress &progress) {
 }  // namespace
 
 Console::Console() : shows_progress_(on_terminal()), next_progress_(Clock::now() + kFirstProgress) {
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
 }
 
 Console::~Console() { clear_progress(); }
@@ -98,7 +98,7 @@ void Console::clear_progress() {
 }
 
 void Console::show_engine_log() {
-  SetLogSink(nullptr, nullptr);
+  SetLogSink(LogAllToStandardError, nullptr);
   shows_progress_ = false;
 }
 

@@ -108,7 +108,7 @@ bool is_valid(const EnhancementSettings &settings) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
   Input input(bytes, size);
   const EnhancementSettings settings = read_settings(input);
   if (!is_valid(settings)) {

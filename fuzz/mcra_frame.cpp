@@ -64,7 +64,7 @@ void process(VADINFO *vad, const std::vector<std::int16_t> &audio, std::int32_t 
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
   Input input(bytes, size);
   const auto record = std::make_unique<VADINFO>();
   VADINFO *vad = record.get();

@@ -74,7 +74,7 @@ void level(std::int64_t drc, std::int32_t rate, Audio audio) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
   Input input(bytes, size);
   Suppressor suppressor(input);
   const std::int32_t rate = input.byte() % 8 == 0 ? input.number() : 16000;

@@ -182,7 +182,7 @@ bool is_valid(const UtteranceSettings &settings) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
   Input input(bytes, size);
   const UtteranceSettings settings = read_settings(input);
   if (!is_valid(settings)) {

@@ -156,8 +156,6 @@ void send_line_to_java(int priority, const char *, const char *text, void *) {
   }
 }
 
-void drop_line(int, const char *, const char *, void *) {}
-
 /// Prepares `receiver`, a class with a static method line(int, String), for log lines.
 bool can_send_to(JNIEnv *env, jclass receiver) {
   if (java_receiver.load() != nullptr) return true;
@@ -174,9 +172,9 @@ bool can_send_to(JNIEnv *env, jclass receiver) {
 /// 0: standard error, 1: nowhere, 2: the receiver. Calls must not overlap.
 void JNICALL set_log_destination(JNIEnv *env, jclass receiver, jint destination) {
   if (destination == 0) {
-    SetLogSink(nullptr, nullptr);
+    SetLogSink(LogAllToStandardError, nullptr);
   } else if (destination == 1) {
-    SetLogSink(drop_line, nullptr);
+    SetLogSink(LogNothing, nullptr);
   } else if (can_send_to(env, receiver)) {
     SetLogSink(send_line_to_java, nullptr);
   }

@@ -115,10 +115,18 @@ ORVALIS_EXPORT int32_t getSpectrum(const int16_t *pcm, int32_t *spectrum, int32_
   return orvalis::getFrameSpectrum(*flags, pcm, spectrum, samplingRate == 16000 ? 0 : 1);
 }
 
+ORVALIS_EXPORT void LogAllToStandardError(int priority, const char *tag, const char *text,
+                                          void *user) {
+  orvalis::log_all_to_standard_error(priority, tag, text, user);
+}
+
+ORVALIS_EXPORT void LogNothing(int, const char *, const char *, void *) {}
+
 ORVALIS_EXPORT void SetLogSink(void (*sink)(int priority, const char *tag, const char *text,
                                             void *user),
                                void *user) {
-  orvalis::set_log_sink(sink, user);
+  // The engine's own function, which it knows not to format lines for.
+  orvalis::set_log_sink(sink == LogNothing ? orvalis::log_nothing : sink, user);
 }
 
 ORVALIS_EXPORT int32_t SetDumpRoot(const char *directory) {

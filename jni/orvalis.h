@@ -383,15 +383,23 @@ int32_t getSpectrum(const int16_t *pcm, int32_t *spectrum, int32_t samplingRate)
 
 /*
  * Where log lines go. On Android that is the platform log, and this function changes nothing.
- * Elsewhere every line is handed to `sink` with its priority (3 debug, 4 info, 6 error), the tag
- * "Orvalis", the text without a line end, and `user` as it was given. NULL restores the default,
- * which writes "D/Orvalis: text" to standard error ("I/" and "E/" for the other priorities).
+ * Elsewhere every line is handed to `sink` with its priority (3 debug, 4 info, 5 warning, 6 error),
+ * the tag "Orvalis", the text without a line end, and `user` as it was given. NULL restores the
+ * default, which writes warnings and errors to standard error, as "W/Orvalis: text" and "E/Orvalis:
+ * text", and drops the rest.
  *
  * Set the sink before creating instances. It may be called from several threads at once, and from
  * within frame calls.
  */
 void SetLogSink(void (*sink)(int priority, const char *tag, const char *text, void *user),
                 void *user);
+
+/*
+ * Sinks for SetLogSink. The first writes every line to standard error, debug lines as "D/Orvalis:
+ * text" and information as "I/Orvalis: text". The second drops every line. Both ignore `user`.
+ */
+void LogAllToStandardError(int priority, const char *tag, const char *text, void *user);
+void LogNothing(int priority, const char *tag, const char *text, void *user);
 
 /*
  * Puts a directory in front of the dump files' paths: with "/tmp/run" they are written to

@@ -71,9 +71,7 @@ constexpr EnhancementSettings kDenoise = ENHANCEMENT_SETTINGS_DEFAULT, kStrong =
 
 class Enhanced : public Tool {
 protected:
-  Enhanced() {
-    SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
-  }
+  Enhanced() { SetLogSink(LogNothing, nullptr); }
 
   /// Raw samples through a command.
   Pcm through(const std::string &arguments, const Pcm &input) const {

@@ -158,7 +158,7 @@ TEST_F(Vad, TraceOfEpdHoldsDecisionsAndLevels) {
   const auto lines =
       json_lines(run("epd --trace --no-lead-in --format json --content-type 2 " + kWide).out);
   ASSERT_EQ(lines.size(), pcm.size() / 160);
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
   EpdInstance *epd = InitializeEPD(0, 0);
   for (std::size_t i = 0; i < lines.size(); ++i) {
     const std::int16_t *frame = &pcm[i * 160];

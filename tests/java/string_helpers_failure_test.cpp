@@ -120,7 +120,7 @@ TEST(StringHelpers, TellWhatFailedAndTryAgain) {
 
 TEST(StringHelpers, FirstUseMayBeRaced) {
   constexpr int kThreads = 16;
-  SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
+  SetLogSink(LogNothing, nullptr);
   std::latch start(kThreads);
   std::atomic<int> right = 0;
   std::vector<std::thread> threads;

@@ -121,9 +121,7 @@ Pcm audio(int microphones, unsigned seed = 1) {
 
 class EnhancementStreamTest : public testing::Test {
 protected:
-  EnhancementStreamTest() {
-    SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
-  }
+  EnhancementStreamTest() { SetLogSink(LogNothing, nullptr); }
   ~EnhancementStreamTest() override { SetLogSink(nullptr, nullptr); }
 };
 

@@ -26,9 +26,7 @@ namespace {
 using orvalis::test::Pcm;
 
 class QuietLog : public testing::Environment {
-  void SetUp() override {
-    SetLogSink([](int, const char *, const char *, void *) {}, nullptr);
-  }
+  void SetUp() override { SetLogSink(LogNothing, nullptr); }
 };
 const auto *const quiet_log = testing::AddGlobalTestEnvironment(new QuietLog);
 

@@ -4,8 +4,9 @@ import java.util.logging.Level;
 import java.util.logging.Logger;
 
 /**
- * Where the engine's log lines go: to standard error at first. On Android they always go to the
- * platform's log under the tag "Orvalis", and nothing here changes that.
+ * Where the engine's log lines go: warnings and errors to standard error at first, the rest nowhere.
+ * On Android all of them always go to the platform's log under the tag "Orvalis", and nothing here
+ * changes that.
  *
  * <p>May be changed at any time and from any thread.
  */
@@ -43,7 +44,7 @@ public final class EngineLog {
     SafeLayer.setLogDestination(SafeLayer.LOG_OFF);
   }
 
-  /** Writes lines to standard error. */
+  /** Writes all lines to standard error, debug lines too. */
   public static synchronized void toStandardError() {
     NativeLibrary.load();
     SafeLayer.setLogDestination(SafeLayer.LOG_TO_STANDARD_ERROR);
