@@ -38,11 +38,11 @@ const std::vector<Format> &formats() {
 
 class WholeFile : public AudioOutput {
 public:
-  WholeFile(const OutputTarget &target, int rate_hz, const Overwriting &overwriting)
+  WholeFile(const OutputTarget &target, int rate_hz, const OutputRules &rules)
       : file_(target.name,
               {rate_hz, 1,
                std::ranges::find(formats(), target.format, &Format::name)->sndfile_format},
-              overwriting) {}
+              rules) {}
 
   void write(std::span<const std::int16_t> samples) override { file_.write(samples); }
   void commit() override { file_.commit(); }
@@ -163,9 +163,13 @@ bool is_streamed(const std::string &name) {
 bool can_be_streamed(const std::string &format) { return format == "wav" || format == "raw"; }
 
 std::unique_ptr<AudioOutput> open_audio_output(const OutputTarget &target, int rate_hz,
-                                               const Overwriting &overwriting) {
+                                               const OutputRules &rules) {
+  if (target.name != "-") check_role(rules.protected_files, target.name);
+  struct stat status;
+  if (!rules.may_replace && stat(target.name.c_str(), &status) == 0 && S_ISBLK(status.st_mode))
+    throw AudioError(target.name + ": the file is a disk; --force writes to it");
   if (is_streamed(target.name)) return std::make_unique<Streamed>(target, rate_hz);
-  return std::make_unique<WholeFile>(target, rate_hz, overwriting);
+  return std::make_unique<WholeFile>(target, rate_hz, rules);
 }
 
 }  // namespace orvalis::cli

@@ -41,6 +41,6 @@ public:
 };
 
 std::unique_ptr<AudioOutput> open_audio_output(const OutputTarget &target, int rate_hz,
-                                               const Overwriting &overwriting);
+                                               const OutputRules &rules);
 
 }  // namespace orvalis::cli

@@ -41,7 +41,7 @@ std::string display_name(const std::string &input) {
   return input == "-" ? "standard input" : input;
 }
 
-/// The progress line, cut to the terminal's width and without control characters.
+/// The progress line, cut to the terminal's width.
 std::string text_of(const Progress &progress) {
   std::string text;
   if (progress.length_s.value_or(0) > 0) {
@@ -50,9 +50,7 @@ std::string text_of(const Progress &progress) {
   }
   text += fmt::format("{}  {:.1f} x real time  ", clock_time(progress.processed_s),
                       progress.processed_s / std::max(progress.elapsed_s, 0.001));
-  text += std::filesystem::path(display_name(progress.name)).filename().string();
-  std::ranges::replace_if(
-      text, [](unsigned char c) { return c < 0x20 || c == 0x7f; }, '?');
+  text += printable(std::filesystem::path(display_name(progress.name)).filename());
   if (const std::size_t room = columns(); text.size() > room) {
     // A UTF-8 character takes at least as many bytes as columns, and must not be cut in half.
     std::size_t length = room;
@@ -63,6 +61,23 @@ std::string text_of(const Progress &progress) {
 }
 
 }  // namespace
+
+std::string printable(const std::string &text) {
+  std::string result;
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    const auto c = static_cast<unsigned char>(text[i]);
+    const auto next = static_cast<unsigned char>(i + 1 < text.size() ? text[i + 1] : 0);
+    if (c < 0x20 || c == 0x7f) {
+      result += fmt::format("\\x{:02x}", c);
+    } else if (c == 0xC2 && next >= 0x80 && next < 0xA0) {  // U+0080 to U+009F in UTF-8
+      result += fmt::format("\\x{:02x}", next);
+      ++i;
+    } else {
+      result += text[i];
+    }
+  }
+  return result;
+}
 
 Console::Console() : shows_progress_(on_terminal()), next_progress_(Clock::now() + kFirstProgress) {
   SetLogSink(LogNothing, nullptr);
@@ -78,7 +93,7 @@ void Console::print_line(const std::string &line) {
 
 void Console::print_error(const std::string &message) {
   clear_progress();
-  std::fputs(("orvalis: " + message + "\n").c_str(), stderr);
+  std::fputs(("orvalis: " + printable(message) + "\n").c_str(), stderr);
 }
 
 void Console::print_note(const std::string &input, const std::string &text) {

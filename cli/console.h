@@ -15,6 +15,10 @@ struct Progress {
   double elapsed_s = 0;
 };
 
+/// Text for a reader: control characters, which file names may hold and terminals obey, appear as
+/// \x1b and the like.
+std::string printable(const std::string &text);
+
 /// Used by one thread at a time; jobs print when it is their turn.
 class Console {
 public:
@@ -27,7 +31,7 @@ public:
   /// Writes to standard output and flushes; throws std::system_error if that fails.
   void print_line(const std::string &line);
 
-  /// Writes "orvalis: ..." to standard error; failures are ignored.
+  /// Writes "orvalis: ..." to standard error, made printable; failures are ignored.
   void print_error(const std::string &message);
 
   /// The same about one input, which is named.

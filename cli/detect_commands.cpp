@@ -50,9 +50,9 @@ int run_detection(const CLI::App &command, DetectOptions &options, Console &cons
   check_inputs(options.files);
   check_format(command, options);
   const auto report = make_report(options.format, "--format", options.files.size(), console);
-  const ProtectedFiles inputs(options.files);
+  ProtectedFiles inputs(options.files);
   SplitSettings &split = options.settings.detector.split;
-  split.overwriting.protected_files = &inputs;
+  split.rules.protected_files = &inputs;
   prepare_split(split, options.files);
   prepare_dump(options);
   if (options.log) console.show_engine_log();
@@ -131,7 +131,10 @@ void add_epd_command(CLI::App &app, Run &run) {
       ->check(CLI::IsMember({"0.25", "1", "4"}).description(""))
       ->type_name("G")
       ->default_str("1");
-  epd->add_flag("--force", detector.split.overwriting.allowed, "Replace existing files")
+  epd->add_flag("--force", detector.split.rules.may_replace, "Replace existing files")
+      ->needs(utterances.split);
+  epd->add_flag("--sync", detector.split.rules.sync,
+                "Have files on the disk before they get their names")
       ->needs(utterances.split);
   auto *frames = epd->add_flag_callback(
       "--frames", [&detector] { detector.reported = Reported::kFrames; },

@@ -141,7 +141,7 @@ void enhance(Job &job, const OutputTarget &target, const EnhanceSettings &settin
   AudioSource source(job.input(), settings.audio);
   const int own_rate = source.source_rate_hz();
   const int rate = settings.keep_rate ? own_rate : kEngineRate;
-  const auto output = open_audio_output(target, rate, settings.overwriting);
+  const auto output = open_audio_output(target, rate, settings.rules);
   if (rate != own_rate)
     job.note(fmt::format("written at {} Hz, converted from {} Hz (--keep-rate converts back)", rate,
                          own_rate));

@@ -14,7 +14,7 @@ struct EnhanceSettings {
   bool detect = false;  ///< Report the utterances of the result
   DetectorSettings detector;
   bool keep_rate = false;  ///< Convert the result back to the input's rate
-  Overwriting overwriting;
+  OutputRules rules;
 };
 
 /// Writes the output while the job's input is read. `report` gets the utterances, if wanted; what

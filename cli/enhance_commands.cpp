@@ -1,9 +1,10 @@
 // `orvalis denoise`, `orvalis level` and `orvalis process`: better audio from audio.
-#include <algorithm>
+#include <filesystem>
 #include <limits>
 #include <memory>
 #include <stdexcept>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "cli/commands.h"
@@ -16,18 +17,19 @@ namespace orvalis::cli {
 namespace {
 
 struct EnhanceOptions {
-  std::vector<std::string> files;  ///< Inputs, then the output
+  std::vector<std::string> inputs;  ///< And, until the command runs, the output
   EnhanceSettings settings;
   std::string format;
   std::string report = "table";
   std::size_t jobs = 1;
   bool mix = false;
   bool replace = false;
+  bool sync = false;
   bool not_aligned = false;
 };
 
 /// The settings that several options decide together.
-EnhanceSettings settings_of(const EnhanceOptions &options, const ProtectedFiles &inputs) {
+EnhanceSettings settings_of(const EnhanceOptions &options, ProtectedFiles &inputs) {
   EnhanceSettings settings = options.settings;
   const bool pair = settings.enhancement.microphones == 2;
   settings.audio.wide_only = true;
@@ -40,24 +42,29 @@ EnhanceSettings settings_of(const EnhanceOptions &options, const ProtectedFiles 
             "--mics 2"
           : "average them with --mix, or pick one with --channel N";
   settings.enhancement.aligned = options.not_aligned ? 0 : 1;
-  settings.overwriting = {options.replace, &inputs};
-  settings.detector.split.overwriting = settings.overwriting;
+  settings.rules = {options.replace, options.sync, &inputs};
+  settings.detector.split.rules = settings.rules;
   return settings;
 }
 
-int run_enhancement(const EnhanceOptions &options, Console &console) {
-  std::vector<std::string> inputs = options.files;
-  std::string destination = inputs.back();
+int run_enhancement(EnhanceOptions &options, Console &console) {
+  std::vector<std::string> &inputs = options.inputs;
+  if (inputs.size() < 2) throw CLI::RequiredError("OUTPUT");
+  std::string destination = std::move(inputs.back());
   inputs.pop_back();
   if (destination == "/dev/stdout") destination = "-";  // keeps the report out of the audio
   check_inputs(inputs);
   const auto report = make_report(options.report, "--report", inputs.size(), console);
-  auto targets = plan_outputs(inputs, destination, options.format);
-  const ProtectedFiles protected_files(inputs);
+  auto [targets, folder] =
+      plan_outputs(inputs, destination, options.format, options.settings.detector.split.folder);
+  ProtectedFiles protected_files(inputs);
   const EnhanceSettings settings = settings_of(options, protected_files);
   prepare_split(settings.detector.split, inputs);
+  if (!folder.empty()) make_folder("OUTPUT", folder);
+  if (!is_streamed(targets.front().name))
+    remove_leftovers(std::filesystem::path(targets.front().name).parent_path());
   if (destination == "-") {
-    if (protected_files.contains("-"))
+    if (protected_files.role_of("-") != nullptr)
       throw std::runtime_error("standard output: the file is an input");
     targets.front().standard_output = console.reserve_standard_output();
   }
@@ -137,24 +144,38 @@ void add_suppression_options(CLI::App &command, EnhancementSettings &enhancement
       ->capture_default_str();
 }
 
+/// Shows OUTPUT in the usage line without the brackets of what may be left out.
+class OutputFormatter : public CLI::Formatter {
+public:
+  std::string make_option_usage(const CLI::Option *option) const override {
+    const std::string name = option->get_name();
+    return name == "OUTPUT" ? name : CLI::Formatter::make_option_usage(option);
+  }
+};
+
 /// Adds a command with the options that all of them have.
 CLI::App *add_command(CLI::App &app, const CommandTexts &texts,
                       const std::shared_ptr<EnhanceOptions> &options, Run &run) {
   CLI::App *command = app.add_subcommand(texts.name, texts.summary);
   command->footer(std::string(kInputAndOutput).substr(1) + texts.notes);
   EnhanceSettings &settings = options->settings;
-  command
-      ->add_option("FILE", options->files,
-                   "Inputs, \"-\" for standard input; then the output:\n"
-                   "a file, a folder, or \"-\" for standard output")
+  command->add_option("FILE", options->inputs, "Audio files; \"-\" is standard input")
       ->required()
       ->option_text("REQUIRED")
-      ->expected(2, std::numeric_limits<int>::max())
+      ->expected(1, std::numeric_limits<int>::max())
       ->type_name("");
+  // FILE takes all names, and the last one is moved.
+  command
+      ->add_option("OUTPUT",
+                   "A file, a folder (which is created if necessary),\n"
+                   "or \"-\" for standard output")
+      ->option_text("REQUIRED");
+  command->formatter(std::make_shared<OutputFormatter>());
   command->add_option("--format", options->format, "Format of the output (default: by its name)")
       ->check(CLI::IsMember(output_format_names()).description(""))
       ->type_name("NAME");
   command->add_flag("--force", options->replace, "Replace existing files");
+  command->add_flag("--sync", options->sync, "Have files on the disk before they get their names");
   command->add_flag("--keep-rate", settings.keep_rate, "Convert back to the rate of the input");
   add_jobs_option(*command, options->jobs);
   CLI::Option *channel =

@@ -2,25 +2,15 @@
 
 #include <algorithm>
 #include <atomic>
-#include <csignal>
 #include <exception>
 #include <mutex>
 #include <thread>
 #include <utility>
 
 #include "cli/audio_file.h"
+#include "cli/signals.h"
 
 namespace orvalis::cli {
-namespace {
-
-/// Ctrl-C also ends the program that writes into our pipe: what it wrote last is still processed,
-/// up to the end of the input. A second Ctrl-C ends the tool.
-void survive_one_interrupt() {
-  std::signal(SIGINT, [](int) { std::signal(SIGINT, SIG_DFL); });
-}
-
-}  // namespace
-
 /// Actions of jobs that run at the same time, performed in the order of the jobs.
 class Turns {
 public:

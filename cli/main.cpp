@@ -11,6 +11,7 @@
 #include <system_error>
 
 #include "cli/commands.h"
+#include "cli/signals.h"
 
 namespace {
 
@@ -28,7 +29,8 @@ int parse_and_run(int argc, char **argv, orvalis::cli::Run &run) {
   app.require_subcommand(1);
   app.set_version_flag("--version", version());
   app.failure_message([](const CLI::App *, const CLI::Error &error) {
-    return fmt::format("orvalis: {}\nRun orvalis with --help for more.\n", error.what());
+    return fmt::format("orvalis: {}\nRun orvalis with --help for more.\n",
+                       orvalis::cli::printable(error.what()));
   });
   app.footer(
       "Examples:\n"
@@ -68,6 +70,7 @@ int main(int argc, char **argv) {
   // process.
   std::signal(SIGPIPE, SIG_IGN);
   std::signal(SIGXFSZ, SIG_IGN);
+  orvalis::cli::watch_signals();
   orvalis::cli::Run run;
   try {
     return parse_and_run(argc, argv, run);

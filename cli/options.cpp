@@ -135,6 +135,7 @@ void prepare_split(const SplitSettings &split, const std::vector<std::string> &i
   if (const std::string pair = same_parts(inputs); !pair.empty())
     throw CLI::ValidationError("--split", pair + " would have parts of the same names");
   make_folder("--split", split.folder);
+  remove_leftovers(split.folder);
 }
 
 void make_folder(const std::string &option, const std::string &folder) {

@@ -1,14 +1,10 @@
 #include "cli/output_file.h"
 
 #include <fcntl.h>
-#include <fmt/format.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <atomic>
 #include <cerrno>
-#include <cstdio>
 #include <filesystem>
 #include <optional>
 #include <system_error>
@@ -16,13 +12,20 @@
 namespace orvalis::cli {
 namespace {
 
-/// Of a regular file; other files hold nothing that could be destroyed.
-std::optional<std::pair<dev_t, ino_t>> identity_of(const std::string &name, int standard_stream) {
+using Identity = std::pair<dev_t, ino_t>;
+
+/// Of a regular file or a disk; other files hold nothing that could be destroyed.
+std::optional<Identity> identity_of(const struct stat &status) {
+  if (S_ISBLK(status.st_mode)) return Identity{status.st_rdev, 0};
+  if (!S_ISREG(status.st_mode)) return std::nullopt;
+  return Identity{status.st_dev, status.st_ino};
+}
+
+std::optional<Identity> identity_of(const std::string &name, int standard_stream) {
   struct stat status;
-  if ((name == "-" ? fstat(standard_stream, &status) : stat(name.c_str(), &status)) != 0 ||
-      !S_ISREG(status.st_mode))
+  if ((name == "-" ? fstat(standard_stream, &status) : stat(name.c_str(), &status)) != 0)
     return std::nullopt;
-  return std::pair{status.st_dev, status.st_ino};
+  return identity_of(status);
 }
 
 bool exists(const std::string &path) {
@@ -30,13 +33,15 @@ bool exists(const std::string &path) {
   return std::filesystem::exists(std::filesystem::symlink_status(path, ignored));
 }
 
-/// Renames, but never onto an existing file. Returns 0 or an errno.
-int rename_to_new(const std::string &from, const std::string &to) {
-  if (renameat2(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), RENAME_NOREPLACE) == 0) return 0;
-  if (errno != EINVAL && errno != ENOSYS) return errno;
-  // Some file systems cannot check and rename in one step.
-  if (exists(to)) return EEXIST;
-  return std::rename(from.c_str(), to.c_str()) == 0 ? 0 : errno;
+/// Returns 0 or an errno.
+int sync_folder_of(const std::string &path) {
+  const std::string folder = std::filesystem::path(path).parent_path();
+  const int descriptor =
+      open(folder.empty() ? "." : folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (descriptor < 0) return errno;
+  const int error = fsync(descriptor) == 0 ? 0 : errno;
+  close(descriptor);
+  return error;
 }
 
 /// Whether libsndfile can write a file without samples that can be read again.
@@ -49,62 +54,42 @@ bool can_be_empty(int sndfile_format) {
 
 ProtectedFiles::ProtectedFiles(const std::vector<std::string> &inputs) {
   for (const std::string &name : inputs)
-    if (const auto identity = identity_of(name, STDIN_FILENO)) files_.push_back(*identity);
+    if (const auto identity = identity_of(name, STDIN_FILENO)) roles_[*identity] = "an input";
 }
 
-bool ProtectedFiles::contains(const std::string &output) const {
+const char *ProtectedFiles::role_of(const std::string &output) const {
+  const std::lock_guard lock(mutex_);
+  return locked_role_of(output);
+}
+
+const char *ProtectedFiles::locked_role_of(const std::string &output) const {
   const auto identity = identity_of(output, STDOUT_FILENO);
-  return identity && std::ranges::count(files_, *identity) > 0;
+  const auto known = identity ? roles_.find(*identity) : roles_.end();
+  return known == roles_.end() ? nullptr : known->second;
 }
 
-/// Deleted unless it is renamed.
-class OutputFile::TemporaryFile {
-public:
-  /// In the folder of `path`. Throws AudioError.
-  explicit TemporaryFile(const std::string &path) : bytes_(create(path)) {}
-  ~TemporaryFile() {
-    if (!name_.empty()) unlink(name_.c_str());
-  }
-  TemporaryFile(const TemporaryFile &) = delete;
-  TemporaryFile &operator=(const TemporaryFile &) = delete;
+int ProtectedFiles::rename(TemporaryFile &file, const std::string &path, bool may_replace) {
+  const std::lock_guard lock(mutex_);
+  if (const char *role = locked_role_of(path)) throw AudioError(path + ": the file is " + role);
+  struct stat status;
+  if (fstat(file.descriptor(), &status) != 0) return errno;
+  const int error = file.rename(may_replace);
+  if (error == 0) roles_[{status.st_dev, status.st_ino}] = "another output";
+  return error;
+}
 
-  FileBytes &bytes() { return bytes_; }
-
-  /// Returns 0 or an errno.
-  int rename(const std::string &path, bool may_replace) {
-    const int error = may_replace ? std::rename(name_.c_str(), path.c_str()) == 0 ? 0 : errno
-                                  : rename_to_new(name_, path);
-    if (error == 0) name_.clear();
-    return error;
-  }
-
-private:
-  int create(const std::string &path) {
-    static std::atomic<unsigned> count{0};
-    const std::filesystem::path target(path);
-    int descriptor;
-    do {
-      name_ = target.parent_path() /
-              fmt::format(".{}.{}-{}.part", target.filename().string(), getpid(), count++);
-      descriptor = open(name_.c_str(), O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0666);
-    } while (descriptor < 0 && errno == EEXIST);
-    if (descriptor < 0) throw AudioError(path + ": " + message_of(errno));
-    return descriptor;
-  }
-
-  std::string name_;  // before bytes_, which is made together with it
-  FileBytes bytes_;
-};
+void check_role(const ProtectedFiles *files, const std::string &output) {
+  const char *role = files == nullptr ? nullptr : files->role_of(output);
+  if (role != nullptr) throw AudioError(output + ": the file is " + role);
+}
 
 OutputFile::OutputFile(const std::string &path, const SampleFormat &format,
-                       const Overwriting &overwriting)
-    : path_(path),
-      may_replace_(overwriting.allowed),
-      needs_samples_(!can_be_empty(format.sndfile_format)) {
-  if (overwriting.protected_files != nullptr && overwriting.protected_files->contains(path))
-    throw AudioError(path + ": the file is an input");
-  if (!may_replace_ && exists(path)) fail(EEXIST);
-  temporary_ = std::make_unique<TemporaryFile>(path);
+                       const OutputRules &rules)
+    : path_(path), rules_(rules), needs_samples_(!can_be_empty(format.sndfile_format)) {
+  check_role(rules_.protected_files, path);
+  if (!rules_.may_replace && exists(path)) fail(EEXIST);
+  temporary_.emplace(path);
+  bytes_.emplace(fcntl(temporary_->descriptor(), F_DUPFD_CLOEXEC, 0));
   SF_INFO info{};
   info.samplerate = format.rate_hz;
   info.channels = format.channels;
@@ -113,7 +98,7 @@ OutputFile::OutputFile(const std::string &path, const SampleFormat &format,
     throw AudioError(path + ": such audio does not fit the file's format");
   {
     const auto lock = lock_opening();
-    sndfile_.reset(sf_open_virtual(FileBytes::functions(), SFM_WRITE, &info, &temporary_->bytes()));
+    sndfile_.reset(sf_open_virtual(FileBytes::functions(), SFM_WRITE, &info, &*bytes_));
   }
   check(sndfile_ != nullptr);
   // Without this, samples beyond full scale wrap around.
@@ -129,7 +114,7 @@ void OutputFile::fail(int error) const {
 
 /// Whatever libsndfile returns, the bytes must have been written.
 void OutputFile::check(bool good) const {
-  if (const int error = temporary_->bytes().error()) fail(error);
+  if (const int error = bytes_->error()) fail(error);
   if (!good) throw AudioError(path_ + ": the audio could not be encoded");
 }
 
@@ -150,9 +135,15 @@ void OutputFile::commit() {
   if (needs_samples_) throw AudioError(path_ + ": the format cannot hold audio without a sample");
   // Closing completes the header, and what an encoder still holds.
   const bool closed = sf_close(sndfile_.release()) == 0;
-  temporary_->bytes().close();
+  bytes_->close();
   check(closed);
-  if (const int error = temporary_->rename(path_, may_replace_)) fail(error);
+  if (rules_.sync && fsync(temporary_->descriptor()) != 0) fail(errno);
+  const int error = rules_.protected_files == nullptr
+                        ? temporary_->rename(rules_.may_replace)
+                        : rules_.protected_files->rename(*temporary_, path_, rules_.may_replace);
+  if (error != 0) fail(error);
+  if (rules_.sync)
+    if (const int failed = sync_folder_of(path_)) fail(failed);
 }
 
 }  // namespace orvalis::cli

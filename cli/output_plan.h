@@ -8,10 +8,17 @@
 
 namespace orvalis::cli {
 
-/// A single input goes to `destination`, or into it if that is a folder; several inputs need a
-/// folder. `format` is what the user asks for; "" leaves it to the names. Throws
-/// CLI::ValidationError.
-std::vector<OutputTarget> plan_outputs(const std::vector<std::string> &inputs,
-                                       const std::string &destination, const std::string &format);
+struct OutputPlan {
+  std::vector<OutputTarget> targets;  ///< One for each input
+  std::string folder;                 ///< Holds them all and may have to be created; or ""
+};
+
+/// A single input goes to `destination`, or into it if that is a folder or is written like one,
+/// with
+/// "/" at its end; several inputs go into a folder. `format` is what the user asks for; "" leaves
+/// it to the names. `split_folder` gets the parts of the inputs, unless it is "". Throws
+/// CLI::ValidationError, also if two outputs would be the same file.
+OutputPlan plan_outputs(const std::vector<std::string> &inputs, const std::string &destination,
+                        const std::string &format, const std::string &split_folder);
 
 }  // namespace orvalis::cli

@@ -42,7 +42,7 @@ public:
   void begin_file(const std::string &name, int rate_hz) override {
     FileReport::begin_file(name, rate_hz);
     empty_ = true;
-    if (headings_) print_line(first_ ? name : "\n" + name);
+    if (headings_) print_line(fmt::format("{}{}", first_ ? "" : "\n", printable(name)));
     first_ = false;
   }
 

@@ -2,11 +2,15 @@
 
 #include <fmt/format.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <cctype>
+#include <cerrno>
 #include <deque>
 #include <filesystem>
 #include <map>
+#include <optional>
 #include <utility>
 
 namespace orvalis::cli {
@@ -20,9 +24,12 @@ public:
   Parts(SplitSettings settings, const std::string &input)
       : settings_(std::move(settings)), stem_(stem_of(input)) {}
 
+  std::string name_of(int number) const {
+    return std::filesystem::path(settings_.folder) / fmt::format("{}-{:03}.wav", stem_, number);
+  }
+
   OutputFile open(int number, const SampleFormat &format) const {
-    const auto name = fmt::format("{}-{:03}.wav", stem_, number);
-    return {std::filesystem::path(settings_.folder) / name, format, settings_.overwriting};
+    return {name_of(number), format, settings_.rules};
   }
 
 private:
@@ -112,34 +119,88 @@ private:
   sf_count_t position_ = 0;
 };
 
+/// The last samples of a stream. Up to a minute is kept in memory, what is older in a temporary
+/// file.
+class KeptSamples {
+public:
+  /// The file lies beside `name`.
+  explicit KeptSamples(std::string name) : name_(std::move(name)) {}
+
+  void push(std::span<const std::int16_t> samples) {
+    recent_.insert(recent_.end(), samples.begin(), samples.end());
+    if (recent_.size() < kMostInMemory) return;
+    if (!older_) older_.emplace(name_);
+    const std::vector<std::int16_t> moved(recent_.begin(), recent_.end());
+    const auto bytes = static_cast<ssize_t>(moved.size() * sizeof(std::int16_t));
+    if (const ssize_t written = pwrite(older_->descriptor(), moved.data(),
+                                       static_cast<std::size_t>(bytes), offset_of(first_recent_));
+        written != bytes)
+      throw AudioError(name_ + ": " + message_of(written < 0 ? errno : ENOSPC));
+    first_recent_ += std::ssize(moved);
+    recent_.clear();
+  }
+
+  void forget_before(std::int64_t sample) {
+    const auto count = std::clamp<std::int64_t>(sample - first_recent_, 0, std::ssize(recent_));
+    recent_.erase(recent_.begin(), recent_.begin() + count);
+    first_recent_ += count;
+    if (sample < first_recent_) return;
+    older_.reset();
+    first_older_ = first_recent_;
+  }
+
+  /// Appends the samples from `first` to before `end` to a file.
+  void copy(std::int64_t first, std::int64_t end, OutputFile &file) const {
+    std::vector<std::int16_t> samples;
+    while (first < end) {
+      samples.resize(static_cast<std::size_t>(std::min<std::int64_t>(end - first, 65536)));
+      if (first < first_recent_) {
+        samples.resize(std::min(samples.size(), static_cast<std::size_t>(first_recent_ - first)));
+        const std::size_t bytes = samples.size() * sizeof(std::int16_t);
+        if (pread(older_->descriptor(), samples.data(), bytes, offset_of(first)) !=
+            static_cast<ssize_t>(bytes))
+          throw AudioError(name_ + ": " + message_of(EIO));
+      } else {
+        std::copy_n(recent_.begin() + (first - first_recent_), samples.size(), samples.begin());
+      }
+      file.write(std::span<const short>(samples));
+      first += std::ssize(samples);
+    }
+  }
+
+private:
+  static constexpr std::size_t kMostInMemory = 960000;  ///< A minute at 16 kHz
+
+  off_t offset_of(std::int64_t sample) const {
+    return (sample - first_older_) * static_cast<off_t>(sizeof(std::int16_t));
+  }
+
+  std::string name_;
+  std::optional<TemporaryFile> older_;
+  std::int64_t first_older_ = 0;   ///< Position of the first sample in the file
+  std::int64_t first_recent_ = 0;  ///< And of the first one in memory
+  std::deque<std::int16_t> recent_;
+};
+
 /// Keeps the audio that an utterance may still need.
 class SplitProcessed : public Split {
 public:
-  SplitProcessed(Parts parts, int rate_hz) : parts_(std::move(parts)), rate_hz_(rate_hz) {}
+  SplitProcessed(Parts parts, int rate_hz)
+      : parts_(std::move(parts)), rate_hz_(rate_hz), kept_(parts_.name_of(0)) {}
 
-  void push(std::span<const std::int16_t> samples) override {
-    kept_.insert(kept_.end(), samples.begin(), samples.end());
-  }
-
-  void forget_before(std::int64_t sample) override {
-    const auto count = std::clamp<std::int64_t>(sample - first_, 0, std::ssize(kept_));
-    kept_.erase(kept_.begin(), kept_.begin() + count);
-    first_ += count;
-  }
+  void push(std::span<const std::int16_t> samples) override { kept_.push(samples); }
+  void forget_before(std::int64_t sample) override { kept_.forget_before(sample); }
 
   void write(const Utterance &found) override {
     OutputFile file = parts_.open(found.number, {rate_hz_, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16});
-    const std::vector<short> samples(kept_.begin() + (found.start - first_),
-                                     kept_.begin() + (found.end - first_));
-    file.write(samples);
+    kept_.copy(found.start, found.end, file);
     file.commit();
   }
 
 private:
   Parts parts_;
   int rate_hz_;
-  std::int64_t first_ = 0;  ///< Position of the first sample that is kept
-  std::deque<short> kept_;
+  KeptSamples kept_;
 };
 
 bool can_be_read_again(const std::string &name) {
@@ -156,6 +217,14 @@ std::string same_parts(const std::vector<std::string> &inputs) {
     if (!is_new) return fmt::format("{} and {}", other->second, input);
   }
   return "";
+}
+
+bool is_part_of(const std::string &input, const std::string &name) {
+  const std::string before = stem_of(input) + "-", after = ".wav";
+  if (!name.starts_with(before) || !name.ends_with(after)) return false;
+  if (name.size() < before.size() + 3 + after.size()) return false;
+  return std::ranges::all_of(name.begin() + std::ssize(before), name.end() - std::ssize(after),
+                             [](unsigned char c) { return std::isdigit(c) != 0; });
 }
 
 std::unique_ptr<Split> split_source(const SplitSettings &settings, const std::string &input,

@@ -17,7 +17,7 @@ namespace orvalis::cli {
 
 struct SplitSettings {
   std::string folder;  ///< "" for no files
-  Overwriting overwriting;
+  OutputRules rules;
 };
 
 /// Writes the utterances of one input.
@@ -35,6 +35,9 @@ public:
 
 /// Two inputs whose parts would have the same names, as "a and b"; "" if there are none.
 std::string same_parts(const std::vector<std::string> &inputs);
+
+/// Whether a part of `input` may get that name.
+bool is_part_of(const std::string &input, const std::string &name);
 
 /// Copies the input's own samples, with its rate, channels and sample format, or in floating point
 /// if it is lossily compressed. An input that can be read only once is treated as by
