@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cstdlib>
 #include <new>
+#include <optional>
 #include <utility>
 
 namespace orvalis::cli {
@@ -74,7 +75,7 @@ Detector::Detector(const std::string &input, int rate_hz, const DetectorSettings
     stream.mcra = &settings.mcra;
     stream.hangover_ms = bridging_hangover_ms(settings.min_silence_ms, rate_hz);
   }
-  if (reported_ != Reported::kUtterances) {
+  if (reported_ != Reported::kUtterances || stream.pcm_dump != 0) {
     stream.on_frame = [](const UtteranceFrame *frame, void *detector) {
       static_cast<Detector *>(detector)->note_frame(*frame);
     };
@@ -100,6 +101,8 @@ void Detector::flush() {
 }
 
 void Detector::note_frame(const UtteranceFrame &frame) {
+  if (frame.epd != nullptr && frame.epd->judged != 0) samples_judged_ += frame.samples;
+  if (reported_ == Reported::kUtterances) return;
   Trace trace;
   if (reported_ == Reported::kTrace)
     trace = frame.mcra != nullptr ? trace_of(*frame.mcra) : trace_of(frame, *frame.epd);
@@ -130,15 +133,18 @@ void detect(Job &job, const DetectSettings &settings, Report &report) {
   AudioSource source(job.input(), settings.audio);
   const int rate_hz = source.rate_hz();
   report.begin_file(job.input(), rate_hz);
-  Detector detector(job.input(), rate_hz, settings.detector,
-                    split_source(settings.detector.split, job.input(), settings.audio, rate_hz),
-                    report);
+  std::optional<Detector> detector(
+      std::in_place, job.input(), rate_hz, settings.detector,
+      split_source(settings.detector.split, job.input(), settings.audio, rate_hz), report);
   for (auto chunk = source.read(); !chunk.empty(); chunk = source.read()) {
-    detector.push(chunk);
+    detector->push(chunk);
     job.show_progress(source.seconds_read(), source.length_seconds());
   }
-  detector.flush();
+  detector->flush();
   report.end_file(source.samples_read());
+  const std::int64_t dumped = detector->samples_judged();
+  detector.reset();
+  if (settings.dump != nullptr) settings.dump->finish(job.input(), dumped);
   // Last, so that of a damaged file everything that could be decided is reported.
   source.check_complete();
 }

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "cli/audio_source.h"
+#include "cli/dump.h"
 #include "cli/jobs.h"
 #include "cli/report.h"
 #include "cli/split.h"
@@ -45,6 +46,9 @@ public:
   void push(std::span<const std::int16_t> audio);
   void flush();
 
+  /// Samples of the frames that the detector has judged and dumped.
+  std::int64_t samples_judged() const { return samples_judged_; }
+
 private:
   struct Close {
     void operator()(UtteranceStream *stream) const { CloseUtteranceStream(stream); }
@@ -64,12 +68,14 @@ private:
   Report &report_;
   std::vector<Frame> frames_;  ///< Not reported yet: nothing may be thrown through the library
   std::int64_t frame_count_ = 0;
+  std::int64_t samples_judged_ = 0;
   std::unique_ptr<UtteranceStream, Close> stream_;
 };
 
 struct DetectSettings {
   AudioSettings audio;
   DetectorSettings detector;
+  const Dump *dump = nullptr;  ///< Of the detector's dump files, if it writes them
 };
 
 /// Reports what is found in the job's input while it is read. Throws AudioError, after everything

@@ -2,8 +2,8 @@
 #include <orvalis.h>
 
 #include <algorithm>
-#include <filesystem>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -36,16 +36,6 @@ void check_format(const CLI::App &command, DetectOptions &options) {
                                "the format " + options.format + " holds no trace; use csv or json");
 }
 
-void prepare_dump(DetectOptions &options) {
-  if (options.dump_folder.empty()) return;
-  if (options.files.size() > 1)
-    throw CLI::ValidationError("--dump", "several files are given, but only one can be dumped");
-  if (SetDumpRoot(options.dump_folder.c_str()) != 0)
-    throw CLI::ValidationError("--dump", "the folder's name is too long");
-  make_folder("--dump", std::filesystem::path(options.dump_folder) / "sdcard/VRpreprocess");
-  options.settings.detector.stream.pcm_dump = 1;
-}
-
 int run_detection(const CLI::App &command, DetectOptions &options, Console &console) {
   check_inputs(options.files);
   check_format(command, options);
@@ -54,7 +44,13 @@ int run_detection(const CLI::App &command, DetectOptions &options, Console &cons
   SplitSettings &split = options.settings.detector.split;
   split.rules.protected_files = &inputs;
   prepare_split(split, options.files);
-  prepare_dump(options);
+  std::optional<Dump> dump;
+  if (!options.dump_folder.empty()) {
+    if (options.files.size() > 1)
+      throw CLI::ValidationError("--dump", "several files are given, but only one can be dumped");
+    options.settings.dump = &dump.emplace(options.dump_folder);
+    options.settings.detector.stream.pcm_dump = 1;
+  }
   if (options.log) console.show_engine_log();
 
   return process_files(options.files, options.jobs, console, [&](Job &job) {

@@ -76,8 +76,8 @@ TemporaryFile::TemporaryFile(const std::string &target) : target_(target) {
 bool TemporaryFile::create() {
   static std::atomic<unsigned> count{0};
   const fs::path path(target_);
-  name_ = path.parent_path() / fmt::format(".orvalis-{:016x}-{}-{}.part",
-                                           hash_of(path.filename()), getpid(), count++);
+  name_ = path.parent_path() /
+          fmt::format(".orvalis-{:016x}-{}-{}.part", hash_of(path.filename()), getpid(), count++);
   Unfinished &all = unfinished();
   const std::lock_guard lock(all.mutex);
   // What it replaces may be private, so it becomes readable for others only with its name.
@@ -112,9 +112,8 @@ int TemporaryFile::rename(bool may_replace) {
   struct stat replaced;
   if (may_replace && stat(target_.c_str(), &replaced) == 0 && S_ISREG(replaced.st_mode))
     copy_rights(replaced, descriptor_);
-  const int error = may_replace
-                        ? std::rename(name_.c_str(), target_.c_str()) == 0 ? 0 : errno
-                        : rename_to_new(name_, target_);
+  const int error = may_replace ? std::rename(name_.c_str(), target_.c_str()) == 0 ? 0 : errno
+                                : rename_to_new(name_, target_);
   if (error == 0) {
     all.names.erase(name_);
     name_.clear();

@@ -107,8 +107,61 @@ TEST_F(Outputs, NoFileIsLost) {
   EXPECT_EQ(refused.err,
             "orvalis: " + take + ": " + letter + ": the file exists; --force replaces it\n");
   EXPECT_EQ(read_file(letter), "a letter");
-  EXPECT_EQ(run("denoise --force " + take + " " + letter).status, 0);
+  fs::permissions(letter, fs::perms::owner_read);
+  EXPECT_EQ(run("denoise --force --sync " + take + " " + letter).status, 0);
   EXPECT_EQ(read_audio(letter).info.samplerate, 16000);
+  EXPECT_EQ(fs::status(letter).permissions(), fs::perms::owner_read);
+}
+
+TEST_F(Outputs, OfOneRunAreFilesOfTheirOwn) {
+  const std::string bytes = read_file(kWide), take = write("take.wav", bytes);
+  const std::string in_part = write("take-001.wav", bytes), folder = folder_.path();
+  const std::string new_folder = folder_ / "new", link = folder_ / "link";
+  fs::create_directory(folder_ / "old");
+  fs::create_directory_symlink("old", link);
+  const std::string one = write("old/take.wav", "one file");
+  fs::create_hard_link(one, folder_ / "old/take-001.wav");
+  for (const std::string &arguments :
+       {"--split " + new_folder + " " + take + " " + new_folder + "/take-001.wav",
+        "--split " + new_folder + " " + take + " " + in_part + " " + new_folder,
+        "--split " + link + " " + take + " " + (folder_ / "old/take-1000.wav"),
+        take + " " + in_part + " " + (folder_ / "old")}) {
+    EXPECT_EQ(run("process --force " + arguments).status, 2) << arguments;
+    EXPECT_FALSE(fs::exists(new_folder)) << "before the work begins";
+  }
+  // The longest name that there is, in folders that are created.
+  const std::string longest(251, 'x');
+  EXPECT_EQ(run("denoise " + take + " " + in_part + " " + new_folder + "/a").status, 0);
+  EXPECT_EQ(run("denoise " + take + " " + new_folder + "/b/").status, 0);
+  EXPECT_EQ(run("denoise " + take + " " + new_folder + "/b/" + longest + ".wav").status, 0);
+  EXPECT_EQ(names_in(new_folder + "/a"), (std::vector<std::string>{"take-001.wav", "take.wav"}));
+  EXPECT_EQ(names_in(new_folder + "/b"), (std::vector<std::string>{"take.wav", longest + ".wav"}));
+}
+
+TEST_F(Outputs, InterruptedWorkLeavesNothing) {
+  const std::string out = folder_ / "out", fifo = folder_ / "fifo";
+  fs::create_directory(out);
+  ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+  write("out/.orvalis-letter.part", "not ours");
+  const auto count = [&] { return names_in(out).size(); };
+  for (const std::string signal : {"INT", "TERM", "HUP", "KILL"}) {
+    // A shell lets what it starts in the background ignore INT.
+    ChildProcess child("{ cat " + kWide + "; sleep 1; } >" + fifo + " & env --default-signal=INT " +
+                           command("denoise " + fifo + " " + out + "/a.wav") +
+                           " & sleep 0.4; ls -A " + out + " | wc -l; kill -" + signal +
+                           " $!; wait $!; kill -l $?; wait",
+                       folder_.path());
+    EXPECT_EQ(child.finish(), 0);
+    EXPECT_EQ(child.output(), "2\n" + signal + "\n") << child.errors();
+    EXPECT_EQ(count(), signal == "KILL" ? 2u : 1u) << signal;
+  }
+  EXPECT_EQ(run("denoise " + kWide + " " + out + "/b.wav").status, 0);
+  EXPECT_EQ(names_in(out), (std::vector<std::string>{".orvalis-letter.part", "b.wav"}));
+}
+
+TEST_F(Outputs, ControlCharactersDoNotReachTheTerminal) {
+  const Result refused = run("denoise 'a\x1b[31m\xc2\x9b.wav' b.wav");
+  EXPECT_EQ(refused.err.find("orvalis: a\\x1b[31m\\x9b.wav: "), 0u) << refused.err;
 }
 
 TEST_F(Outputs, NothingHalfWrittenIsLeft) {
@@ -155,7 +208,7 @@ TEST_F(Outputs, NothingHalfWrittenIsLeft) {
 TEST_F(Outputs, WrongUsageEndsWith2) {
   fs::create_directory(folder_ / "d");
   for (const std::string options :
-       {"", "x", "x y", "x y z", "x out.txt", "x - --format flac", "- - d", "a/x.wav b/x.wav d",
+       {"", "x", "x y", "x out.txt", "x - --format flac", "- - d", "a/x.wav b/x.wav d",
         "a/x.mp3 b/x.wav d", "--format mp4 x y.wav", "--level 14 x y.wav", "--mics 3 x y.wav",
         "--mics 2 --mix x y.wav", "--mics 2 --channel 1 x y.wav", "--mics 2 --level 18 x y.wav",
         "--mix --channel 1 x y.wav", "--jobs 0 x y.wav", "--rate 8000 x y.wav"}) {

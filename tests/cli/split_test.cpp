@@ -133,10 +133,9 @@ TEST_F(Split, DumpsHoldInputAndDecisions) {
     const std::string root = folder_ / ("dump" + frames);
     epd(frames + "--dump '" + root + "' " + kWide);
     Pcm input, decided;
-    for (const auto &name : names_in(root + "/sdcard/VRpreprocess")) {
-      const std::string file = root + "/sdcard/VRpreprocess/" + name;
-      (name.ends_with("_inputEPD.pcm") ? input : decided) = load_recording(file);
-    }
+    const std::string name = root + "/sdcard/VRpreprocess/005";
+    input = load_recording(name + "_inputEPD.pcm");
+    decided = load_recording(name + "_resultEPD.pcm");
     Pcm expected = load_recording(kWide);
     expected.resize(expected.size() / 160 * 160);
     EXPECT_EQ(input, expected);
@@ -145,6 +144,12 @@ TEST_F(Split, DumpsHoldInputAndDecisions) {
     for (std::size_t i = 0; i < decided.size(); ++i)
       ASSERT_EQ(decided[i] >= 1000, frames_found[i / 160]["answer"] == 1) << i;
   }
+  ChildProcess full("(ulimit -f 64; " + command("epd --dump " + (folder_ / "full ") + kWide) + ")",
+                    folder_.path());
+  EXPECT_EQ(full.finish(), 1);
+  EXPECT_NE(full.errors().find("005_inputEPD.pcm: the dump is incomplete, 32768 bytes of 112000"),
+            std::string::npos)
+      << full.errors();
 }
 
 }  // namespace
