@@ -260,8 +260,22 @@ def audio_source():
     yield "text", mean + b"no audio at all\n"
 
 
+def output_file():
+    wav16, flac16, raw16, ogg = 0x10002, 0x170002, 0x10040002, 0x200060
+    for name, inputs, destination in [("one", [0], 1), ("folder", [0, 1], 3), ("new", [0], 6),
+                                      ("same", [0, 5], 3), ("link", [0, 2], 7), ("input", [1], 0),
+                                      ("part", [0], 4), ("any", [251], 9)]:
+        for rules in range(4):
+            head = bytes([1, len(inputs) - 1]) + b"".join(
+                bytes([i]) + (b"\x03\x1b\xff." if i > 249 else b"") for i in inputs)
+            head += bytes([destination, rules])
+            yield f"{name}_{rules}", head + b"".join(
+                bytes([rules]) + number(form) + voice(400)
+                for form in (wav16, flac16, raw16, ogg)[rules:])
+
+
 corpus = pathlib.Path(__file__).parent / "corpus"
-for target in (audio_source, enhancement_stream, epd_frame, functions, java_strings, mcra_frame, ns_frame,
+for target in (audio_source, enhancement_stream, epd_frame, functions, java_strings, mcra_frame, ns_frame, output_file,
                queries, utterance_stream):
     folder = corpus / target.__name__
     folder.mkdir(parents=True, exist_ok=True)

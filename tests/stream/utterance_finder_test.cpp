@@ -298,7 +298,8 @@ TEST(UtteranceFinder, LeavesOutWhatHoldsTooLittleSpeech) {
   EXPECT_EQ(spans("50o 14s 60n"), "") << "and what was interrupted as far as it came";
   EXPECT_EQ(spans("50o 15s 60n"), "45-65 ");
   EXPECT_EQ(spans("50o 15s"), "45-65 ");
-  EXPECT_EQ(spans("50o 14s 20n 3s"), "") << "nor does what is dropped at the end move the start back";
+  EXPECT_EQ(spans("50o 14s 20n 3s"), "")
+      << "nor does what is dropped at the end move the start back";
 }
 
 TEST(UtteranceFinder, HandsOutAsSoonAsItIsDecided) {
