@@ -25,7 +25,7 @@ SF_VIRTUAL_IO *FileBytes::functions() {
   static SF_VIRTUAL_IO table{
       [](void *self) { return of(self).length(); },
       [](sf_count_t offset, int whence, void *self) { return of(self).seek(offset, whence); },
-      [](void *to, sf_count_t count, void *self) { return of(self).read(to, count); },
+      nullptr,
       [](const void *from, sf_count_t count, void *self) { return of(self).write(from, count); },
       [](void *self) { return of(self).seek(0, SEEK_CUR); }};
   return &table;
@@ -45,10 +45,6 @@ sf_count_t FileBytes::length() const {
 
 sf_count_t FileBytes::seek(sf_count_t offset, int whence) const {
   return lseek(descriptor_, offset, whence);
-}
-
-sf_count_t FileBytes::read(void *to, sf_count_t count) {
-  return ::read(descriptor_, to, static_cast<std::size_t>(count));
 }
 
 sf_count_t FileBytes::write(const void *from, sf_count_t count) {

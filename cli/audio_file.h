@@ -32,7 +32,7 @@ std::filesystem::path file_name_of(const std::string &input);
 /// The system's text for a value of errno.
 std::string message_of(int error);
 
-/// The bytes of a file that libsndfile works on. Keeps the first error: libsndfile does not report
+/// The bytes of a file that libsndfile writes. Keeps the first error: libsndfile does not report
 /// its reason, and ignores errors while closing.
 class FileBytes {
 public:
@@ -53,7 +53,6 @@ public:
 private:
   sf_count_t length() const;
   sf_count_t seek(sf_count_t offset, int whence) const;
-  sf_count_t read(void *to, sf_count_t count);
   sf_count_t write(const void *from, sf_count_t count);
   void note_error();
 

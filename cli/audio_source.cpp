@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <fmt/format.h>
-#include <poll.h>
 #include <samplerate.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -10,20 +9,13 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstdio>
 #include <iterator>
 #include <numeric>
-#include <sstream>
+
+#include "cli/audio_length.h"
 
 namespace orvalis::cli {
 namespace {
-
-struct stat status_of(const std::string &name) {
-  struct stat status;
-  if ((name == "-" ? fstat(STDIN_FILENO, &status) : stat(name.c_str(), &status)) != 0)
-    throw AudioError(message_of(errno));
-  return status;
-}
 
 /// Whether libsndfile reads a format without seeking. On a pipe the others fail, some of them
 /// silently.
@@ -41,33 +33,11 @@ bool streams(int format) {
   }
 }
 
-/// Opens a pipe and waits until it has something to read.
-int open_pipe(const std::string &name) {
-  const int descriptor = name == "-" ? STDIN_FILENO : open(name.c_str(), O_RDONLY | O_CLOEXEC);
+int open_descriptor(const std::string &name) {
+  const int descriptor = name == "-" ? fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, STDERR_FILENO + 1)
+                                     : open(name.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY);
   if (descriptor < 0) throw AudioError(message_of(errno));
-  pollfd readable{descriptor, POLLIN, 0};
-  while (poll(&readable, 1, -1) < 0 && errno == EINTR) {
-  }
   return descriptor;
-}
-
-/// Whether the file ends before its audio does. libsndfile then shortens the audio to what is
-/// there, and says so only in its log, in lines such as "data : 35052 (should be 19956)".
-bool is_truncated(SNDFILE *file) {
-  std::array<char, 16384> log{};
-  sf_command(file, SFC_GET_LOG_INFO, log.data(), static_cast<int>(log.size()));
-  // Live recorders cannot know the length beforehand and write the largest possible.
-  constexpr long long kOpenLength = 0x7fff0000;
-  std::istringstream lines(log.data());
-  for (std::string line; std::getline(lines, line);) {
-    long long promised, present;
-    for (const char *pattern : {" data : %lld (should be %lld)", " SSND : %lld (should be %lld)",
-                                " Data Size : %lld (should be %lld)"})
-      if (std::sscanf(line.c_str(), pattern, &promised, &present) == 2 && present < promised &&
-          promised < kOpenLength)
-        return true;
-  }
-  return false;
 }
 
 /// The one place that decides what becomes of an input's channels.
@@ -83,34 +53,45 @@ void check_channels(int channels, const AudioSettings &settings) {
 
 }  // namespace
 
+void OpenAudio::check_read() const {
+  if (const int error = bytes->error()) throw AudioError(message_of(error));
+}
+
 OpenAudio open_audio(const std::string &name, const AudioSettings &settings) {
   OpenAudio audio;
-  const struct stat status = status_of(name);
-  audio.piped = !S_ISREG(status.st_mode);
-  if (S_ISDIR(status.st_mode)) throw AudioError(message_of(EISDIR));
-  if (!settings.raw && !audio.piped && status.st_size == 0) throw AudioError("the file is empty");
+  const int descriptor = open_descriptor(name);
+  struct stat status {};
+  audio.piped = fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode);
+  audio.bytes = std::make_unique<InputBytes>(descriptor, audio.piped);
 
+  // Waits for a silent pipe before the lock is taken, so that no other thread has to.
+  std::array<char, 1> first;
+  const bool is_empty = !audio.bytes->read_at(0, first);
+  audio.check_read();
+  if (is_empty) throw AudioError("the input is empty");
   if (settings.raw) {
     audio.info.format = SF_FORMAT_RAW | SF_FORMAT_PCM_16 | SF_ENDIAN_LITTLE;
     audio.info.samplerate = settings.raw_rate_hz;
     audio.info.channels = settings.raw_channels;
+  } else {
+    audio.promised_end = promised_end(*audio.bytes);
   }
-  // Waits for a silent pipe before the lock is taken, so that no other thread has to.
-  const bool by_name = name != "-" && !audio.piped;
-  const int descriptor = by_name ? -1 : audio.piped ? open_pipe(name) : STDIN_FILENO;
+  audio.bytes->rewind();
 
   const auto lock = lock_opening();
-  audio.file.reset(by_name
-                       ? sf_open(name.c_str(), SFM_READ, &audio.info)
-                       : sf_open_fd(descriptor, SFM_READ, &audio.info, descriptor != STDIN_FILENO));
+  audio.file.reset(
+      sf_open_virtual(InputBytes::functions(), SFM_READ, &audio.info, audio.bytes.get()));
+  audio.check_read();
   if (audio.piped && (!audio.file || !streams(audio.info.format)))
     throw AudioError("not WAV, AIFF, AU or Ogg audio, as a pipe must carry (or use --raw)");
   if (!audio.file) throw AudioError(sf_strerror(nullptr));
+  audio.bytes->end_opening();
   return audio;
 }
 
 AudioSource::AudioSource(const std::string &name, const AudioSettings &settings)
     : audio_(open_audio(name, settings)),
+      partial_(settings.partial),
       channel_(settings.channel),
       channels_(settings.channels == Channels::kPair ? 2 : 1) {
   const SF_INFO &info = audio_.info;
@@ -133,7 +114,10 @@ AudioSource::AudioSource(const std::string &name, const AudioSettings &settings)
 std::span<const std::int16_t> AudioSource::read() {
   samples_.clear();
   // The resampler returns nothing until it has half the length of its filter.
-  while (samples_.empty() && !ended_) ended_ = !(untouched_ ? read_untouched() : read_converted());
+  while (samples_.empty() && !ended_) {
+    ended_ = !(untouched_ ? read_untouched() : read_converted());
+    audio_.check_read();
+  }
   samples_read_ += static_cast<std::int64_t>(samples_.size() / channels_);
   return samples_;
 }
@@ -185,12 +169,20 @@ bool AudioSource::read_float() {
   return frames > 0;
 }
 
-void AudioSource::check_complete() const {
-  if (sf_error(audio_.file.get()) != SF_ERR_NO_ERROR)
+bool AudioSource::is_cut_short() const {
+  // The number of frames in a stream is its writer's guess.
+  return (!audio_.piped && frames_read_ < audio_.info.frames) ||
+         (audio_.promised_end && audio_.bytes->ends_before(*audio_.promised_end));
+}
+
+std::string AudioSource::check_complete() const {
+  const bool cut_short = is_cut_short();
+  if (!cut_short && sf_error(audio_.file.get()) != SF_ERR_NO_ERROR)
     throw AudioError(sf_strerror(audio_.file.get()));
-  // The length in a pipe's header is its writer's guess.
-  if (!audio_.piped && (frames_read_ < audio_.info.frames || is_truncated(audio_.file.get())))
-    throw AudioError("cut short: the file holds less audio than its header promises");
+  if (!cut_short) return "";
+  const std::string text = "cut short: there is less audio than the header promises";
+  if (!partial_) throw AudioError(text + "; --partial takes what there is");
+  return text;
 }
 
 }  // namespace orvalis::cli

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "cli/audio_file.h"
+#include "cli/input_bytes.h"
 #include "cli/resampler.h"
 
 namespace orvalis::cli {
@@ -27,13 +28,19 @@ struct AudioSettings {
   Channels channels = Channels::kMean;
   const char *channel_hint = "";  ///< For the error of kRefuse: the ways to decide
   bool wide_only = false;         ///< 8 kHz is converted like other rates
+  bool partial = false;           ///< Input that is cut short is no error
 };
 
 /// An open input and its format.
 struct OpenAudio {
+  std::unique_ptr<InputBytes> bytes;
   Sndfile file;
   SF_INFO info{};
-  bool piped = false;  ///< Can be read only once, and its length is unknown
+  bool piped = false;                        ///< Can be read only once, and its length is unknown
+  std::optional<std::int64_t> promised_end;  ///< In bytes, if the header has chunks
+
+  /// Throws AudioError if the bytes could not be read.
+  void check_read() const;
 };
 
 /// Opens a file, or standard input for "-". Several threads may do so at once. Throws AudioError.
@@ -51,7 +58,7 @@ public:
   int source_rate_hz() const { return audio_.info.samplerate; }
 
   /// The next chunk, of about 10 ms, so that live audio is processed at once. Empty at the end.
-  /// Pairs are interleaved.
+  /// Pairs are interleaved. Throws AudioError if the input cannot be read.
   std::span<const std::int16_t> read();
 
   /// Samples per channel that have been read from the input so far.
@@ -67,16 +74,18 @@ public:
     return static_cast<double>(audio_.info.frames) / audio_.info.samplerate;
   }
 
-  /// After the end: throws AudioError if it was due to a read error, or came before the end that
-  /// the header promises.
-  void check_complete() const;
+  /// After the end: throws AudioError if it was due to an error, or came before the end that the
+  /// header promises. If the settings allow the latter, returns a warning, else "".
+  std::string check_complete() const;
 
 private:
   bool read_untouched();
   bool read_converted();
   bool read_float();
+  bool is_cut_short() const;
 
   OpenAudio audio_;
+  bool partial_;
   bool ended_ = false;
   bool untouched_ = false;  ///< 16-bit samples reach the engine as they are
   int channel_;             ///< The one that is picked, from 1; or 0

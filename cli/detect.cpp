@@ -129,6 +129,10 @@ void Detector::report_new() {
   frames_.clear();
 }
 
+void check_complete(Job &job, const AudioSource &source) {
+  if (const std::string warning = source.check_complete(); !warning.empty()) job.note(warning);
+}
+
 void detect(Job &job, const DetectSettings &settings, Report &report) {
   AudioSource source(job.input(), settings.audio);
   const int rate_hz = source.rate_hz();
@@ -146,7 +150,7 @@ void detect(Job &job, const DetectSettings &settings, Report &report) {
   detector.reset();
   if (settings.dump != nullptr) settings.dump->finish(job.input(), dumped);
   // Last, so that of a damaged file everything that could be decided is reported.
-  source.check_complete();
+  check_complete(job, source);
 }
 
 }  // namespace orvalis::cli

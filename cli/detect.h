@@ -78,6 +78,9 @@ struct DetectSettings {
   const Dump *dump = nullptr;  ///< Of the detector's dump files, if it writes them
 };
 
+/// After the end of the job's input: a warning if it is cut short and may be. Throws AudioError.
+void check_complete(Job &job, const AudioSource &source);
+
 /// Reports what is found in the job's input while it is read. Throws AudioError, after everything
 /// that could be decided has been reported.
 void detect(Job &job, const DetectSettings &settings, Report &report);

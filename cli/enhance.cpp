@@ -154,7 +154,7 @@ void enhance(Job &job, const OutputTarget &target, const EnhanceSettings &settin
   output->write(path.finish(source.source_frames_read()));
   if (settings.detect) report.end_file(source.samples_read());
   // Before the output gets its name: part of an input must not pass for the whole.
-  source.check_complete();
+  check_complete(job, source);
   output->commit();
   if (settings.enhancement.level == 1) note_counts(job, path.counts());
 }

@@ -4,6 +4,7 @@
 #include <atomic>
 #include <exception>
 #include <mutex>
+#include <new>
 #include <thread>
 #include <utility>
 
@@ -120,6 +121,9 @@ int process_files(const std::vector<std::string> &inputs, std::size_t threads, C
       process(job);
     } catch (const AudioError &error) {
       job.note(error.what());
+      job.in_turn([&status] { status = 1; });
+    } catch (const std::bad_alloc &) {
+      job.note("out of memory");
       job.in_turn([&status] { status = 1; });
     } catch (const Turns::Abandoned &) {
       throw;

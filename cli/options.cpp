@@ -45,6 +45,7 @@ CLI::Option *add_audio_options(CLI::App &command, AudioSettings &settings,
       ->type_name("N")
       ->capture_default_str()
       ->needs(raw);
+  command.add_flag("--partial", settings.partial, "Take what there is of input that is cut short");
   return channel;
 }
 

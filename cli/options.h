@@ -22,7 +22,7 @@ CLI::Validator not_empty();
 /// Adds the inputs.
 void add_files_option(CLI::App &command, std::vector<std::string> &files);
 
-/// Adds --channel, --raw, --rate and --channels. Returns the first of them.
+/// Adds --channel, --raw, --rate, --channels and --partial. Returns the first of them.
 CLI::Option *add_audio_options(
     CLI::App &command, AudioSettings &settings,
     const std::string &channel_text = "Channel to process, from 1 (default: the mean)");

@@ -12,6 +12,8 @@
 
 #include "cli/audio_source.h"
 #include "cli/commands.h"
+#include "cli/detect.h"
+#include "cli/jobs.h"
 #include "cli/options.h"
 
 namespace orvalis::cli {
@@ -81,7 +83,7 @@ struct QueryOptions {
 
 /// Calls `process` for each whole block of `length` samples.
 template <class Process>
-void for_each_block(AudioSource &source, std::size_t length, Process process) {
+void for_each_block(Job &job, AudioSource &source, std::size_t length, Process process) {
   std::vector<std::int16_t> block;
   for (auto chunk = source.read(); !chunk.empty(); chunk = source.read()) {
     while (!chunk.empty()) {
@@ -92,17 +94,18 @@ void for_each_block(AudioSource &source, std::size_t length, Process process) {
       process(std::span<const std::int16_t>(block));
       block.clear();
     }
+    job.show_progress(source.seconds_read(), source.length_seconds());
   }
 }
 
-void print_query(const Query &query, const QueryOptions &options, Console &console) {
-  AudioSource source(options.file, options.audio);
+void print_query(const Query &query, const QueryOptions &options, Job &job, Console &console) {
+  AudioSource source(job.input(), options.audio);
   const int rate_hz = source.rate_hz();
   const bool json = options.format == "json";
   if (!json) console.print_line(fmt::format("start,{}", fmt::join(query.columns(rate_hz), ",")));
   std::int64_t number = 0;
   for_each_block(
-      source, static_cast<std::size_t>(rate_hz / query.blocks_per_second),
+      job, source, static_cast<std::size_t>(rate_hz / query.blocks_per_second),
       [&](std::span<const std::int16_t> block) {
         const double start = static_cast<double>(number++) / query.blocks_per_second;
         const auto values = query.values(block, rate_hz);
@@ -116,7 +119,7 @@ void print_query(const Query &query, const QueryOptions &options, Console &conso
               nlohmann::ordered_json{{"start", start}, {query.json_field, values}}.dump());
         }
       });
-  source.check_complete();
+  check_complete(job, source);
 }
 
 void add_query(CLI::App &app, const Query &query, Run &run) {
@@ -132,12 +135,9 @@ void add_query(CLI::App &app, const Query &query, Run &run) {
       ->capture_default_str();
   add_audio_options(*command, options->audio);
   command->callback([options, &query, &run] {
-    try {
-      print_query(query, *options, run.console);
-    } catch (const AudioError &error) {
-      run.console.print_note(options->file, error.what());
-      run.exit_status = 1;
-    }
+    run.exit_status = process_files({options->file}, 1, run.console, [&](Job &job) {
+      print_query(query, *options, job, run.console);
+    });
   });
 }
 

@@ -6,6 +6,7 @@
 #include <array>
 #include <cmath>
 #include <iterator>
+#include <new>
 #include <stdexcept>
 
 namespace orvalis::cli {
@@ -20,7 +21,7 @@ Resampler::Resampler(int from_hz, int to_hz, int channels)
   // Its errors are already 20 dB below a step of 16 bits, at a third of the cost of best quality.
   int error = 0;
   state_.reset(src_new(SRC_SINC_MEDIUM_QUALITY, channels, &error));
-  if (!state_) throw std::runtime_error(src_strerror(error));
+  if (!state_) throw std::bad_alloc();
 }
 
 void Resampler::Deleter::operator()(SRC_STATE_tag *state) const { src_delete(state); }

@@ -106,7 +106,13 @@ private:
       const bool inside = position_ >= first;
       const sf_count_t left = (inside ? end : first) - position_;
       const sf_count_t got = read(source_.file.get(), samples.data(), std::min(left, room));
-      if (got <= 0) return;  // resampling may have rounded the end up
+      if (got <= 0) {
+        source_.check_read();
+        // Resampling may have rounded the end up, by two samples of the engine at most.
+        if ((end - position_) * engine_rate_hz_ <= 2 * source_.info.samplerate + engine_rate_hz_)
+          return;
+        throw AudioError("cut short while it was read");
+      }
       const auto values = static_cast<std::size_t>(got) * channels;
       if (inside) file.write(std::span<const Sample>(samples.data(), values));
       position_ += got;
