@@ -125,7 +125,8 @@ std::optional<std::int64_t> promised_end(InputBytes &input) {
   const bool is_none = promised == 0 && found->outer_end > start;  // but something follows
   const bool has_length = is_none || !is_open(promised, found->length.bytes);
   if (const auto end = input.length()) {
-    const auto present = static_cast<std::uint64_t>(std::max<std::int64_t>(*end, found->start)) - start;
+    const auto present =
+        static_cast<std::uint64_t>(std::max<std::int64_t>(*end, found->start)) - start;
     if (has_length ? promised > present : promised != present)
       found->length.show(input, std::min(present + found->counted_too, found->length.largest()));
   } else if (!has_length && promised == 0) {

@@ -9,6 +9,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <filesystem>
 #include <iterator>
 #include <numeric>
 
@@ -31,6 +32,12 @@ bool streams(int format) {
     default:
       return false;
   }
+}
+
+/// libsndfile knows such files by their names only, which it is not told.
+int headerless_format(const std::string &name) {
+  const auto ending = std::filesystem::path(name).extension();
+  return ending == ".gsm" ? SF_FORMAT_GSM610 : ending == ".vox" ? SF_FORMAT_VOX_ADPCM : 0;
 }
 
 int open_descriptor(const std::string &name) {
@@ -76,12 +83,21 @@ OpenAudio open_audio(const std::string &name, const AudioSettings &settings) {
   } else {
     audio.promised_end = promised_end(*audio.bytes);
   }
-  audio.bytes->rewind();
 
   const auto lock = lock_opening();
-  audio.file.reset(
-      sf_open_virtual(InputBytes::functions(), SFM_READ, &audio.info, audio.bytes.get()));
-  audio.check_read();
+  const auto open = [&audio] {
+    audio.bytes->rewind();
+    audio.file.reset(
+        sf_open_virtual(InputBytes::functions(), SFM_READ, &audio.info, audio.bytes.get()));
+    audio.check_read();
+  };
+  open();
+  if (const int format = headerless_format(name); format != 0 && !audio.file && !audio.piped) {
+    audio.info.samplerate = 8000;
+    audio.info.channels = 1;
+    audio.info.format = SF_FORMAT_RAW | format;
+    open();
+  }
   if (audio.piped && (!audio.file || !streams(audio.info.format)))
     throw AudioError("not WAV, AIFF, AU or Ogg audio, as a pipe must carry (or use --raw)");
   if (!audio.file) throw AudioError(sf_strerror(nullptr));

@@ -7,7 +7,11 @@
 #include <CLI/CLI.hpp>
 #include <cerrno>
 #include <csignal>
+#include <cstdlib>
+#include <exception>
+#include <new>
 #include <string>
+#include <string_view>
 #include <system_error>
 
 #include "cli/commands.h"
@@ -62,6 +66,25 @@ void occupy_standard_streams() {
   if (descriptor >= 0) close(descriptor);
 }
 
+/// Memory may run out where nothing catches it, as in what a library prepares before main.
+struct OutOfMemoryIsAnError {
+  OutOfMemoryIsAnError() {
+    std::set_terminate([] {
+      try {
+        if (const auto exception = std::current_exception()) std::rethrow_exception(exception);
+      } catch (const std::bad_alloc &) {
+        constexpr std::string_view kText = "orvalis: out of memory\n";
+        // There is nobody to tell if this fails.
+        [[maybe_unused]] const auto written = write(STDERR_FILENO, kText.data(), kText.size());
+        _exit(kFailed);
+      } catch (...) {
+      }
+      std::abort();
+    });
+  }
+};
+[[gnu::init_priority(101)]] const OutOfMemoryIsAnError out_of_memory_is_an_error;
+
 }  // namespace
 
 int main(int argc, char **argv) {
@@ -76,6 +99,8 @@ int main(int argc, char **argv) {
     return parse_and_run(argc, argv, run);
   } catch (const std::system_error &error) {
     if (error.code() != std::errc::broken_pipe) run.console.print_error(error.what());
+  } catch (const std::bad_alloc &) {
+    run.console.print_error("out of memory");
   } catch (const std::exception &error) {
     run.console.print_error(error.what());
   }
