@@ -1,15 +1,50 @@
+// Reading audio: its samples, its length, and reads that fail.
 #include "cli/audio_source.h"
 
 #include <gtest/gtest.h>
+#include <unistd.h>
 
+#include <CLI/CLI.hpp>
+#include <cerrno>
 #include <cmath>
+#include <filesystem>
+#include <fstream>
 #include <limits>
+#include <map>
+#include <memory>
 #include <numbers>
 #include <string>
 #include <vector>
 
+#include "cli/commands.h"
 #include "tests/support/audio_file.h"
+#include "tests/support/child_process.h"
+#include "tests/support/recordings.h"
 #include "tests/support/temporary_folder.h"
+
+enum class Fault { kNone, kError, kInterrupted, kShort };
+
+namespace {
+
+struct {
+  Fault fault = Fault::kNone;
+  int at = 0, calls = 0;
+} reads;
+
+}  // namespace
+
+// One read(2) of the tool fails.
+extern "C" ssize_t __real_read(int descriptor, void *to, std::size_t count);
+extern "C" ssize_t __wrap_read(int descriptor, void *to, std::size_t count) {
+  if (++reads.calls == reads.at) {
+    if (reads.fault == Fault::kShort) count = (count + 1) / 2;
+    if (reads.fault <= Fault::kInterrupted && reads.fault != Fault::kNone) {
+      errno = reads.fault == Fault::kError ? EIO : EINTR;
+      return -1;
+    }
+  }
+  return __real_read(descriptor, to, count);
+}
 
 namespace orvalis::cli {
 namespace {
@@ -25,8 +60,181 @@ std::vector<short> read_all(const std::string &path, const AudioSettings &settin
   std::vector<short> samples;
   for (auto chunk = source.read(); !chunk.empty(); chunk = source.read())
     samples.insert(samples.end(), chunk.begin(), chunk.end());
-  source.check_complete();
+  EXPECT_EQ(source.check_complete().empty(), !settings.partial);
   return samples;
+}
+
+/// A pipe that holds up to 64 KB, under the name of a file.
+class Pipe {
+public:
+  explicit Pipe(const std::string &bytes) {
+    EXPECT_EQ(pipe(ends_), 0);
+    EXPECT_EQ(write(ends_[1], bytes.data(), bytes.size()), std::ssize(bytes));
+    close(ends_[1]);
+  }
+  ~Pipe() { close(ends_[0]); }
+  Pipe(const Pipe &) = delete;
+  Pipe &operator=(const Pipe &) = delete;
+
+  std::string path() const { return "/dev/fd/" + std::to_string(ends_[0]); }
+
+private:
+  int ends_[2];
+};
+
+std::string little_endian(std::uint32_t value) {
+  return {static_cast<char>(value), static_cast<char>(value >> 8), static_cast<char>(value >> 16),
+          static_cast<char>(value >> 24)};
+}
+
+std::string chunk(const std::string &name, const std::string &body) {
+  return name + little_endian(static_cast<std::uint32_t>(body.size())) + body +
+         std::string(body.size() % 2, '\0');
+}
+
+/// Reads a file with these bytes, and a pipe if it can carry them: whole, open or cut short.
+class Length {
+public:
+  void expect_whole(const std::string &bytes, std::size_t samples, bool streams = true) const {
+    for (const std::string &path : paths(bytes, streams))
+      EXPECT_EQ(read_all(path).size(), samples) << path;
+  }
+
+  void expect_cut(const std::string &bytes, std::size_t samples, bool streams = true) const {
+    for (const std::string &path : paths(bytes, streams)) {
+      try {
+        read_all(path);
+        ADD_FAILURE() << path;
+      } catch (const AudioError &error) {
+        EXPECT_NE(std::string(error.what()).find("; --partial"), std::string::npos) << error.what();
+      }
+    }
+    for (const std::string &path : paths(bytes, streams))
+      EXPECT_EQ(read_all(path, {.partial = true}).size(), samples) << path;
+  }
+
+  TemporaryFolder folder;
+
+private:
+  std::vector<std::string> paths(const std::string &bytes, bool streams) const {
+    std::ofstream(folder / "file", std::ios::binary) << bytes;
+    pipe_ = std::make_unique<Pipe>(bytes);
+    return streams ? std::vector{folder / "file", pipe_->path()} : std::vector{folder / "file"};
+  }
+
+  mutable std::unique_ptr<Pipe> pipe_;
+};
+
+TEST(AudioSource, HeadersPromiseALength) {
+  const Length length;
+  const std::pair<int, bool> kFormats[] = {{SF_FORMAT_WAV, true},
+                                           {SF_FORMAT_WAV | SF_ENDIAN_BIG, true},
+                                           {SF_FORMAT_AIFF, true},
+                                           {SF_FORMAT_AU, true},
+                                           {SF_FORMAT_AU | SF_ENDIAN_LITTLE, true},
+                                           {SF_FORMAT_CAF, false},
+                                           {SF_FORMAT_RF64, false},
+                                           {SF_FORMAT_W64, false}};
+  for (const auto &[format, streams] : kFormats) {
+    SCOPED_TRACE(testing::Message() << std::hex << format);
+    for (const int samples : {5000, 0}) {
+      write_audio(length.folder / "take", std::vector<short>(static_cast<std::size_t>(samples), 77),
+                  16000, 1, format | SF_FORMAT_PCM_16);
+      const std::string bytes = test::read_file(length.folder / "take");
+      length.expect_whole(bytes, static_cast<std::size_t>(samples), streams);
+      if (samples > 0) length.expect_cut(bytes.substr(0, bytes.size() - 400), 4800, streams);
+    }
+  }
+
+  // Whatever else a file holds.
+  const std::string audio(1000, '\1'),
+      head = "WAVE" + chunk("fmt ", little_endian(0x10001) + little_endian(16000) +
+                                        little_endian(32000) + little_endian(0x100002));
+  const auto wav = [](std::uint32_t size, const std::string &body) {
+    return "RIFF" + little_endian(size) + body;
+  };
+  std::string junk;
+  for (int i = 0; i < 400; ++i) junk += chunk("junk", std::string(21, 'x'));
+  length.expect_whole(wav(90, head + junk + chunk("data", audio)), 500);
+  length.expect_cut(wav(90, head + junk + "data" + little_endian(2000) + audio), 500);
+  length.expect_cut(wav(90, head + "data" + little_endian(3000000000) + audio), 500);
+  const std::string comment = chunk("LIST", "INFO" + chunk("ICMT", " data : 9 (should be 4)\n"));
+  length.expect_whole(wav(90, head + comment + chunk("data", audio)), 500);
+  length.expect_whole(wav(90, head + "data" + little_endian(999) + audio.substr(1)), 499);
+
+  // Lengths of programs that do not know them; a 0 is true if something follows that counts.
+  for (const std::uint32_t open : {0U, 0x7fffffffU, 0x7ffff000U, 0x80000000U, 0xffffffffU})
+    length.expect_whole(wav(open, head + "data" + little_endian(open) + audio), 500);
+  const std::string none = head + chunk("data", "") + comment;
+  length.expect_whole(wav(static_cast<std::uint32_t>(none.size()), none), 0);
+  EXPECT_THROW(read_all(Pipe("").path()), AudioError);
+  EXPECT_THROW(read_all("/dev/null", {.raw = true}), AudioError);
+}
+
+/// What a command line leaves behind.
+struct Outcome {
+  int status;
+  std::string errors;
+  std::map<std::string, std::string> files;
+};
+
+Outcome run_with(Fault fault, int at, const std::string &command, const std::string &out) {
+  std::filesystem::remove_all(out);
+  std::filesystem::create_directory(out);
+  testing::internal::CaptureStdout();
+  testing::internal::CaptureStderr();
+  Run run;
+  CLI::App app;
+  add_detect_commands(app, run);
+  add_enhance_commands(app, run);
+  reads = {fault, at, 0};
+  app.parse(command);
+  reads.fault = Fault::kNone;
+  testing::internal::GetCapturedStdout();
+  Outcome outcome{run.exit_status, testing::internal::GetCapturedStderr(), {}};
+  for (const auto &file : std::filesystem::directory_iterator(out))
+    outcome.files[file.path().filename()] = test::read_file(file.path());
+  return outcome;
+}
+
+TEST(AudioSource, EveryReadMayFail) {
+  const TemporaryFolder folder;
+  // One utterance, and the beginning of another.
+  auto speech = test::load_recording(ORVALIS_SPEECH_8K "/wav/all.wav");
+  speech.resize(28000);
+  const std::string take = folder / "take.wav", out = folder / "out";
+  write_audio(take, speech, 8000, 1, kWav16);
+  const std::string bytes = test::read_file(take);
+  const std::string split = "epd --no-lead-in --split " + out + " ";
+  for (const std::string &before : {std::string("denoise "), std::string("process "), split})
+    for (const bool piped : {false, true}) {
+      SCOPED_TRACE(before + (piped ? "pipe" : "file"));
+      const bool splits = before == split;
+      const auto run = [&](Fault fault, int at) {
+        const Pipe pipe(bytes);
+        const std::string input = piped ? pipe.path() : take;
+        return run_with(fault, at, before + input + (splits ? "" : " " + out + "/a.wav"), out);
+      };
+      const Outcome good = run(Fault::kNone, 0);
+      ASSERT_EQ(good.files.size(), splits ? 2U : 1U) << good.errors;
+      const int count = reads.calls;
+      ASSERT_GT(count, 300);
+      // All that open the input, and some of those alike.
+      for (int at = 1; at <= count; at += at < 24 ? 1 : 17)
+        for (const Fault fault : {Fault::kError, Fault::kInterrupted, Fault::kShort}) {
+          const Outcome bad = run(fault, at);
+          ASSERT_EQ(bad.status, fault == Fault::kError ? 1 : 0) << at;
+          if (fault != Fault::kError) {
+            ASSERT_EQ(bad.files, good.files) << at;
+            continue;
+          }
+          ASSERT_NE(bad.errors.find(": Input/output error\n"), std::string::npos) << bad.errors;
+          // Utterances that had been found are there, as they should be.
+          ASSERT_LT(bad.files.size(), good.files.size()) << at;
+          for (const auto &[name, content] : bad.files)
+            ASSERT_EQ(content, good.files.at(name)) << at;
+        }
+    }
 }
 
 TEST(AudioSource, SixteenBitsArriveUntouched) {

@@ -13,7 +13,7 @@ const std::string kPairs = "denoise --mics 2 --channels 2";
 
 TEST_F(Enhanced, OutputIsTheStreams) {
   const Pcm mono = noisy_speech(), pairs = noisy_pairs();
-  for (const int length : {0, 1, 161, 16001, 40071}) {
+  for (const int length : {1, 161, 16001, 40071}) {
     SCOPED_TRACE(length);
     const Pcm part(mono.begin(), mono.begin() + length);
     const Pcm part_of_pairs(pairs.begin(), pairs.begin() + 2 * length);

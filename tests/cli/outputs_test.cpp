@@ -44,7 +44,7 @@ TEST_F(Outputs, FormatFollowsNameOrOption) {
   const std::string out = folder_ / "out";
   fs::create_directory(out);
   const std::string raw = write("r.raw", bytes_of(Pcm(1000, 99))), odd = write("x.s16", "1234");
-  EXPECT_EQ(run("level --raw " + raw + " " + odd + " - " + out).status, 0);
+  EXPECT_EQ(run("level --raw " + raw + " " + odd + " - " + out, "12").status, 0);
   EXPECT_EQ(run("level --format flac " + kWide + " " + kWideOpen + " " + out).status, 0);
   EXPECT_EQ(names_in(out),
             (std::vector<std::string>{"001.flac", "005.flac", "r.raw", "stdin.wav", "x.wav"}));
@@ -192,7 +192,7 @@ TEST_F(Outputs, NothingHalfWrittenIsLeft) {
   }
   // libsndfile writes these without a header if there is no sample.
   for (const std::string name : {"empty.flac", "empty.ogg", "empty.opus"}) {
-    const Result empty = run("level --raw - " + out + name);
+    const Result empty = run("level --raw - " + out + name, "x");
     EXPECT_EQ(empty.err, "orvalis: standard input: " + out + name +
                              ": the format cannot hold audio without a sample\n");
   }

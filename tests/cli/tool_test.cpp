@@ -86,31 +86,6 @@ TEST_F(Tool, ChunksOnAPipeDoNotMatter) {
   }
 }
 
-TEST_F(Tool, FormatsGiveSimilarUtterances) {
-  const auto expected = epd(kWide);
-  Pcm clipped;
-  std::vector<float> plain, loud;
-  for (const short sample : load_recording(kWide)) {
-    plain.push_back(static_cast<float>(sample) / 32768);
-    loud.push_back(plain.back() * 64);
-    clipped.push_back(static_cast<short>(std::clamp(sample * 64, -32768, 32767)));
-  }
-  for (const int format : {SF_FORMAT_WAV | SF_FORMAT_FLOAT, SF_FORMAT_WAV | SF_FORMAT_PCM_24,
-                           SF_FORMAT_WAV | SF_FORMAT_PCM_U8, SF_FORMAT_FLAC | SF_FORMAT_PCM_16,
-                           SF_FORMAT_OGG | SF_FORMAT_VORBIS}) {
-    const std::string file = folder_ / "take";
-    write_audio(file, plain, 16000, 1, format);
-    const auto found = epd(file);
-    ASSERT_EQ(found.size(), expected.size()) << std::hex << format;
-    EXPECT_NEAR(found[0]["start"], expected[0]["start"], 0.1) << std::hex << format;
-    EXPECT_NEAR(found[0]["end"], expected[0]["end"], 0.3) << std::hex << format;
-  }
-  // Audio beyond full scale clips and does not wrap.
-  write_audio(folder_ / "loud.wav", loud, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_FLOAT);
-  write_audio(folder_ / "clipped.wav", clipped, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
-  EXPECT_EQ(unnamed(folder_ / "loud.wav"), unnamed(folder_ / "clipped.wav"));
-}
-
 TEST_F(Tool, ChannelsAndRatesAreConverted) {
   Pcm stereo, tripled;  // left silent, right with speech; three samples for one
   for (const short sample : load_recording(kWide)) {
@@ -196,7 +171,7 @@ TEST_F(Tool, SilenceAndNoAudioAreNoErrors) {
   write_audio(folder_ / "silence.wav", std::vector<short>(50000), 48000, 1,
               SF_FORMAT_WAV | SF_FORMAT_PCM_16);
   for (const std::string &arguments :
-       {folder_ / "none.wav", folder_ / "silence.wav", std::string("--raw -")}) {
+       {folder_ / "none.wav", folder_ / "silence.wav", "- <" + (folder_ / "none.wav")}) {
     EXPECT_TRUE(epd(arguments).empty());
     EXPECT_EQ(run("epd " + arguments).out, "no utterance\n");
   }
