@@ -232,7 +232,9 @@ def wav(data, code=1, channels=1, rate=16000, bits=16, promised=None):
 def audio_source():
     ramp = b"".join(word(step * 100 % 30000) for step in range(400))
     floats = struct.pack("<8f", 0, 0.5, -1, 1, 7, float("inf"), float("nan"), 1e-30)
-    mean, second, raw, absent = b"\x00", b"\x80", b"\x03", b"\xc0"
+    # How it is read, and pieces of 8 bytes in a pipe.
+    mean, second, raw, absent = b"\x00\x07", b"\x80\x07", b"\x03\x07", b"\xc0\x07"
+    pieces_of_1, cut_in_head, cut_in_audio = b"\x00\x00", b"\x00\x84", b"\x00\xc0"
     yield "wav16", mean + wav(ramp)
     yield "wav8", mean + wav(ramp[:300], rate=8000, bits=8)
     yield "wav24", mean + wav(ramp[:600], bits=24)
@@ -254,7 +256,22 @@ def audio_source():
     aiff += b"SSND" + struct.pack(">3I", len(ramp) + 8, 0, 0) + ramp
     yield "aiff", mean + b"FORM" + struct.pack(">I", len(aiff)) + aiff
     yield "raw", raw + ramp
-    yield "raw_odd", b"\x3f" + ramp[:-1]
+    chunk = lambda name, body: name + struct.pack("<I", len(body)) + body
+    yield "pieces", pieces_of_1 + wav(ramp)
+    yield "cut_in_head", cut_in_head + wav(ramp)
+    yield "cut_in_audio", cut_in_audio + wav(ramp)
+    yield "zero_length", mean + wav(ramp, promised=0)
+    yield "junk", mean + wav(ramp)[:36] + chunk(b"junk", b"x" * 99 + b"\0") * 70 + wav(ramp)[36:]
+    format_16k = wav(b"")[20:36]
+    yield "rf64", mean + b"RF64" + b"\xff" * 4 + b"WAVE" + chunk(b"ds64", struct.pack(
+        "<QQQI", 900, len(ramp), 0, 0)) + chunk(b"fmt ", format_16k) + b"data" + b"\xff" * 4 + ramp
+    guid = bytes.fromhex("f3acd3118cd100c04f8edb8a")
+    yield "w64", mean + b"riff" + bytes.fromhex("2e91cf11a5d628db04c10000") + struct.pack(
+        "<Q", 900) + b"wave" + guid + b"fmt " + guid + struct.pack("<Q", 40) + format_16k + (
+            b"data" + guid + struct.pack("<Q", 24 + len(ramp)) + ramp)
+    yield "caf", mean + b"caff\0\1\0\0" + b"desc" + struct.pack(
+        ">qd4s5I", 32, 16000, b"lpcm", 0, 2, 1, 1, 16) + b"data" + struct.pack(">qI", -1, 0) + ramp
+    yield "raw_odd", b"\x3f\x07" + ramp[:-1]
     yield "empty", mean
     yield "raw_empty", raw
     yield "text", mean + b"no audio at all\n"

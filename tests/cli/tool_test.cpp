@@ -71,44 +71,6 @@ TEST_F(Tool, EveryWayInGivesTheSameUtterances) {
   }
 }
 
-TEST_F(Tool, ChunksOnAPipeDoNotMatter) {
-  const std::string samples = read_file(kWide).substr(kWavHeader);
-  for (const std::size_t chunk : {1, 7, 160, 1000}) {
-    const std::string options = chunk == 7 ? "--lead-in " : "--no-lead-in ";
-    const auto expected = unnamed(options + kWide);
-    ChildProcess child(command("epd --format json --raw - " + options), folder_.path());
-    for (std::size_t at = 0; at < samples.size(); at += 2 * chunk)
-      child.write(samples.substr(at, 2 * chunk));
-    EXPECT_EQ(child.finish(), 0);
-    auto found = json_lines(child.output());
-    for (Json &line : found) line.erase("file");
-    EXPECT_EQ(found, expected) << chunk;
-  }
-}
-
-TEST_F(Tool, ChannelsAndRatesAreConverted) {
-  Pcm stereo, tripled;  // left silent, right with speech; three samples for one
-  for (const short sample : load_recording(kWide)) {
-    stereo.insert(stereo.end(), {0, sample});
-    tripled.insert(tripled.end(), 3, sample);
-  }
-  const std::string file = folder_ / "stereo.flac";
-  write_audio(file, stereo, 16000, 2, SF_FORMAT_FLAC | SF_FORMAT_PCM_24);
-  EXPECT_EQ(unnamed("--channel 2 " + file), unnamed(kWide));
-  EXPECT_EQ(epd(file).size(), epd(kWide).size());
-  EXPECT_TRUE(epd("--channel 1 " + file).empty());
-
-  // At another rate, the times are still those of the audio.
-  write_audio(folder_ / "48.wav", tripled, 48000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
-  const auto found = epd(folder_ / "48.wav"), expected = epd(kWide);
-  ASSERT_EQ(found.size(), expected.size());
-  for (std::size_t i = 0; i < found.size(); ++i) {
-    EXPECT_EQ(found[i]["rate"], 16000);
-    EXPECT_NEAR(found[i]["start"], expected[i]["start"], 0.05);
-    EXPECT_NEAR(found[i]["end"], expected[i]["end"], 0.05);
-  }
-}
-
 TEST_F(Tool, OptionsReachTheDetector) {
   const auto plain = epd(kNarrow);
   EXPECT_GT(epd("--hangover 0 " + kNarrow).size(), plain.size());
