@@ -170,7 +170,7 @@ TEST(AudioSource, EveryReadMayFail) {
     std::filesystem::create_directory(out);
     testing::internal::CaptureStdout();
     testing::internal::CaptureStderr();
-    Run run;
+    cli::Run run;
     CLI::App app;
     add_detect_commands(app, run);
     add_enhance_commands(app, run);
