@@ -87,9 +87,9 @@ std::size_t read_all(const std::string &path, const orvalis::cli::AudioSettings 
       if (samples.empty()) break;
       require(settings.channels != orvalis::cli::Channels::kPair || samples.size() % 2 == 0,
               "pairs come whole");
-      read += samples.size();
+      heard += samples.size();
     }
-    if (read < kMaxSamples) source.check_complete();
+    if (heard < kMaxSamples) source.check_complete();
   } catch (const orvalis::cli::AudioError &) {
     // The tool tells the user and goes on with the next file; anything else would end it.
   }
