@@ -1,5 +1,4 @@
-// The functions of the extended mathematics: errors over their whole range, every bit where the
-// steps are defined, and fixed points.
+// The functions of the extended mathematics: errors over their whole range, and fixed points.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -7,7 +6,6 @@
 #include <numbers>
 
 #include "Math_baseop.h"
-#include "tests/support/fatal.h"
 #include "tests/support/flag_words.h"
 #include "tests/support/random.h"
 
@@ -89,8 +87,6 @@ TEST(Functions, AccuracyOfTwoArguments) {
     if (y != 0) angle.take(ZOLT_L_atan2(y, x) / q22 - std::atan2(y, x));
     const double truth = std::pow(x / q15, y / q31);
     if (x > 0 && x < 1 << 30 && truth < 65535) {
-      const int64_t logarithm = (int64_t{ZOLT_L_log(2u * x)} * y + (1 << 30)) >> 31;
-      ASSERT_EQ(ZOLT_L_pow(x, y), ZOLT_L_exp(static_cast<int32_t>(logarithm)) >> 17);
       const double got = ZOLT_L_pow(x, y) / q15;
       ASSERT_NEAR(got, truth, truth * 0.00065 + 1 / q15) << x << " ^ " << y;
     }
@@ -110,98 +106,6 @@ TEST(Functions, AccuracyOfTwoArguments) {
   }
   angle.expect("atan2", -0.00186, 0.00186);
 }
-
-// ---- Bit for bit ----
-
-TEST(Functions, LogarithmAsDefined) {
-  for (int64_t x = 1; x <= UINT32_MAX; x += 1 + x / 5000) {
-    int norm = -1;  // from 2^31 on; below, what brings x to 2^30..2^31 - 1
-    while ((x << (norm + 1)) < int64_t{1} << 31) ++norm;
-    const int64_t f = (norm < 0 ? x >> 1 : x << norm) / 32768 - 32768;
-    int64_t sum = 0, power = f;
-    for (const int c : {32749, -16106, 9456, -4426, 1040}) {
-      sum += 2 * c * power;
-      power = power * f / 32768;
-    }
-    const auto word = static_cast<uint32_t>(x);
-    ASSERT_EQ(ZOLT_L_log(word), (14 - norm) * 46518272 + (sum >> 5)) << x;
-    ASSERT_EQ(ZOLT_S_log(word), ((14 - norm) * int64_t{93036544} + (sum >> 4)) >> 16) << x;
-  }
-}
-
-TEST(Functions, ExponentialAsDefined) {
-  for (int64_t x = -1409286143; x <= 1409286143; x += 99991) {
-    const int64_t y = (x * 1549082005 + (1 << 29)) >> 30;
-    const int64_t whole = y >> 26, fraction = y & ((1 << 26) - 1);
-    const int64_t fine = std::min<int64_t>((fraction % (1 << 19) + (1 << 12)) >> 13, 63);
-    const uint64_t entries[] = {ZOLT_LPow2PlusFr1[fraction >> 19], ZOLT_LPow2PlusFr2[fine]};
-    const auto v = static_cast<int64_t>((entries[0] * entries[1] + (1 << 29)) >> 30);
-    const int64_t power = whole < 0 ? v * 4 >> -whole : v * 4 << whole;
-    const auto word = static_cast<int32_t>(x);
-    ASSERT_EQ(ZOLT_L_exp(word), power) << x;
-    ASSERT_EQ(x < 0 ? L_exp_mius(word) : L_exp_plus(word), power) << x;
-  }
-}
-
-/// The quotient a / b of the recurrence below: both are positive and b is below 2^40.
-int64_t ratio(int64_t a, int64_t b) {
-  const int64_t divisor = b >> 12;
-  return a / divisor * (1 << 20) + a % divisor * (1 << 20) / divisor;
-}
-
-TEST(Functions, ExponentialIntegralAsDefined) {
-  constexpr int64_t limit = 4194305, one = int64_t{1} << 32;
-  // The selecting polynomial is positive up to 12354.
-  for (int32_t m = 1; m < 90000; m += m < 12400 ? 1 : 50) {
-    const int64_t x = int64_t{m} << 20;
-    int64_t expected = -((ZOLT_L_log(m) + int64_t{186065279}) * 64 + 2479122404), power = x,
-            term = x;
-    for (int k = 2; m <= 12354 && std::abs(term) >= limit; ++k) {
-      expected += term;
-      power = -((power * m) >> 12) / k;
-      term = power / k;
-    }
-    int64_t a1 = one, a2 = 0, b1 = x, b2 = one, even = 0, odd = limit;
-    for (int j = 1; m > 12354 && std::abs(odd - even) >= limit; ++j)
-      for (const bool is_odd : {false, true}) {
-        const int64_t a = (is_odd ? a1 * m >> 12 : a1) + j * a2;
-        const int64_t b = (is_odd ? b1 * m >> 12 : b1) + j * b2;
-        a2 = ratio(a1, b);
-        b2 = ratio(b1, b);
-        a1 = ratio(a, b);
-        b1 = one;
-        (is_odd ? odd : even) = a1;
-        expected = odd * ZOLT_L_exp(-(m << 14)) >> 32;
-      }
-    ASSERT_EQ(ZOLT_expintFix(m), expected) << m;
-    ASSERT_EQ(ZOLT_expintFix(-m), expected) << m;
-  }
-}
-
-TEST(Functions, Polynomial) {
-  std::mt19937_64 random = seeded_generator();
-  int64_t c[9];
-  for (int i = 0; i < 5000; ++i) {
-    for (int64_t &coefficient : c) coefficient = static_cast<int64_t>(random()) >> 30;
-    const int32_t x = static_cast<int>(random() % 16384) - 8192;
-    double value = static_cast<double>(c[0]);
-    for (int n = 1; n <= 9; ++n) {
-      if (n > 1) value = value * x / 4096 + static_cast<double>(c[n - 1]);
-      // Each step rounds to a unit, which the next ones double at most.
-      ASSERT_NEAR(static_cast<double>(ZOLT_POLYVALFix(c, x, n)), value, 256) << x << ", " << n;
-    }
-    ASSERT_EQ(ZOLT_POLYVALFix(c, x, 0), c[0]);
-    ASSERT_EQ(ZOLT_POLYVALFix(c, x, 10), ZOLT_POLYVALFix(c, x, 9));
-  }
-  // A half rounds up; a product saturates; the sum with the coefficient wraps.
-  const int64_t half[9] = {2048}, minus_half[9] = {-2048}, large[9] = {int64_t{1} << 62, 5};
-  EXPECT_EQ(ZOLT_POLYVALFix(half, 1, 2), 1);
-  EXPECT_EQ(ZOLT_POLYVALFix(minus_half, 1, 2), 0);
-  EXPECT_EQ(ZOLT_POLYVALFix(large, 4 * 4096, 2), INT64_MIN + 4);
-  EXPECT_EQ(ZOLT_POLYVALFix(large, -4 * 4096, 2), INT64_MIN + 5);
-}
-
-// ---- Fixed points, symmetry, corners ----
 
 TEST(Functions, FixedPointsOfLogarithmAndPowers) {
   EXPECT_EQ(ZOLT_L_log(0), INT32_MIN);
@@ -273,39 +177,6 @@ TEST(Functions, RootsAreOddAndFlagsStay) {
     ZOLT_L_atan2(x, ZOLT_L_sin(x));
   }
   EXPECT_EQ(read_flags(), flags);
-}
-
-TEST(FunctionsDeathTest, PowerOfTwoOutOfRange) {
-  constexpr char line[] =
-      "Voice_Engine/MCRAvad/Math_baseop:2027 :: pow2 Overflow_ZOLT of too small Qx\n";
-  EXPECT_FATAL(ZOLT_L_pow2_plus(-1, 26, 30, 1), 255, line);
-  EXPECT_FATAL(ZOLT_L_pow2_plus(32768, 0, 30, 0), 255, line);
-  EXPECT_FATAL(ZOLT_L_pow2_plus(1, INT16_MIN, 30, 1), 255, line);
-}
-
-// ---- Tables ----
-
-TEST(Functions, Tables) {
-  for (int i = 0; i < 128; ++i) {
-    EXPECT_EQ(ZOLT_LPow2PlusFr1[i], std::llround(0x1p30 * std::exp2(i / 128.0))) << i;
-    EXPECT_EQ(LPow2PlusFr1[i], ZOLT_LPow2PlusFr1[i]) << i;
-    const double lagging = std::max(i / 2 - 1, 0) / 8192.0;
-    EXPECT_EQ(ZOLT_LPow2PlusFr2[i / 2], std::llround(0x1p30 * std::exp2(lagging))) << i;
-    EXPECT_EQ(LPow2PlusFr2[i / 2], ZOLT_LPow2PlusFr2[i / 2]) << i;
-  }
-  for (int k = 0; k < 19; ++k) {
-    EXPECT_EQ(exp_coef_plus[k], std::llround(0x1p18 * std::exp(std::exp2(k - 15)))) << k;
-    EXPECT_EQ(exp_coef_minus[k], std::llround(0x1p18 * std::exp(-std::exp2(k - 15)))) << k;
-  }
-  for (int i = 0; i < 900; ++i)
-    EXPECT_EQ(ZOLT_atanList[i], std::lround(q11 * std::tan(i * pi / 1800))) << i;
-  EXPECT_EQ(ZOLT_atanList[900], 1171822423);
-  for (int i = 0; i < 403; ++i)
-    EXPECT_EQ(ZOLT_sinList[i], std::llround(q31 * std::sin(i / 256.0))) << i;
-  for (int shift = 1; shift <= 2; ++shift) {
-    EXPECT_EQ(ZOLT_cuberoot_fraction[shift - 1], std::llround(q31 * std::exp2(-shift / 3.0)));
-    EXPECT_EQ(ZOLT_root15_coeffs[shift - 1], std::llround(q31 * std::exp2(-shift * 2 / 3.0)));
-  }
 }
 
 }  // namespace

@@ -3,12 +3,9 @@
 
 #include <algorithm>
 #include <cmath>
-#include <cstddef>
-#include <cstring>
 #include <memory>
 
 #include "Voice_Engine/MCRAvad/frame_decision.h"
-#include "tests/support/log_capture.h"
 
 namespace orvalis::test {
 namespace {
@@ -125,64 +122,6 @@ TEST_F(McraDecision, ScaleFollowsTheStartOrTheMinima) {
   }
 }
 
-/// Energies from frame 80 on: loud at first and louder from the third window on.
-double energy_of_frame(int index) {
-  return 1 + (index % 7) * 0.125 + (index < 30 ? 3 : 0) + (index > 130 ? 4 : 0);
-}
-
-TEST_F(McraDecision, SixWindowsCalibrateAndTheSeventhNeverCloses) {
-  for (const float exponent : {0.84F, 0.5F, 1.0F}) {
-    SCOPED_TRACE(exponent);
-    reset_MCRA_params(&info_);
-    record_.calibrationEnable = record_.calibrationMode = 1;
-    record_.frameIndex = 78;
-    decide({9, 0, 0, 0}, exponent);
-    EXPECT_EQ(record_.calibrationCount, 0) << "calibration begins with frame 80";
-
-    double older = 0, newer = 0, best = 0, peak = 0;
-    const auto threshold = [&](double power) {
-      return 2 * std::exp(power * 2.3 * std::log10(best * 0x1p31 / 90)) / 2147483647.0;
-    };
-    float expected = 0;
-    int phase = 0;
-    for (int count = 1; count <= 520; ++count) {
-      const int index = std::min(count, 215);
-      const int base = 25 * phase, end = base + 90;
-      const double energy = energy_of_frame(count);
-      if (phase < 6) {
-        if (phase == 0 && index <= 45) older += energy;
-        if (phase == 0 ? index > 45 : index >= base + 45) newer += energy;
-        if (index == end) {
-          peak = std::max(phase == 0 ? older : peak, newer);
-          best = std::max(best, older + newer);
-          older = newer;
-          newer = 0;
-          ++phase;
-          expected = static_cast<float>(threshold(exponent));
-        }
-      }
-      if (count == 400) expected = static_cast<float>(threshold(std::min(exponent, 0.84F)));
-      decide({energy, 0, 0, 0}, exponent);
-      ASSERT_EQ(record_.calibrationIndex, index) << count;
-      ASSERT_EQ(record_.calibrationPhase, phase) << count;
-      ASSERT_FLOAT_EQ(record_.energyThreshold, expected) << count;
-      ASSERT_FLOAT_EQ(record_.calibrationOlderSum, static_cast<float>(older)) << count;
-      ASSERT_FLOAT_EQ(record_.calibrationNewerSum, static_cast<float>(newer)) << count;
-      ASSERT_FLOAT_EQ(record_.calibrationPeak, static_cast<float>(peak)) << count;
-      ASSERT_EQ(record_.calibrationDone, count >= 500 ? 1 : 0) << count;
-    }
-    // Phase 6 waits for index 240, which stops at 215.
-    EXPECT_EQ(phase, 6);
-    EXPECT_FLOAT_EQ(record_.calibrationBest, static_cast<float>(best));
-    record_.calibrationIndex = 240;
-    decide(kVoice, exponent);
-    EXPECT_EQ(record_.calibrationPhase, 7);
-    record_.calibrationIndex = 265;
-    decide(kVoice, exponent);
-    EXPECT_EQ(record_.calibrationPhase, 7);
-  }
-}
-
 TEST_F(McraDecision, ThresholdServesTheFrameThatCalibratedIt) {
   reset_MCRA_params(&info_);
   record_.calibrationEnable = record_.calibrationMode = 1;
@@ -197,46 +136,6 @@ TEST_F(McraDecision, ThresholdServesTheFrameThatCalibratedIt) {
   const VADINFO before = record_;
   decide(kVoice, 1);
   EXPECT_EQ(record_.calibrationCount, before.calibrationCount) << "only mode 1 calibrates";
-}
-
-/// A record of which nothing is set.
-std::unique_ptr<VADINFO> untouched() {
-  auto record = std::make_unique<VADINFO>();
-  std::memset(record.get(), 0x5A, sizeof *record);
-  return record;
-}
-
-TEST(McraEntries, SetWhatTheyAreMeantToSet) {
-  const auto record = untouched(), expected = untouched();
-  VADINFO *vad = record.get();
-  initialVADINFO(&vad);
-  std::memset(expected.get(), 0, offsetof(VADINFO, historyUpdate));
-  expected->frameIndex = -1;
-  std::fill_n(expected->minPower, MCRA_BINS, 72340172838076673);
-  std::fill_n(expected->minHistory[0], MCRA_HISTORY * MCRA_BINS, 72340172838076673);
-  expected->energyThreshold = -1;
-  expected->energyMargin = 2;
-  expected->calibrationIndex = expected->calibrationCount = 0;
-  expected->calibrationOlderSum = expected->calibrationNewerSum = expected->calibrationPeak = 0;
-  EXPECT_EQ(std::memcmp(vad, expected.get(), sizeof *vad), 0);
-}
-
-TEST(McraEntries, ResetClearsTheCalibrationAlone) {
-  const auto record = untouched(), expected = untouched();
-  VADINFO *vad = record.get();
-  LogCapture log;
-  reset_MCRA_params(&vad);
-  EXPECT_EQ(log.take(), LogLines{debug_line("TQE: reset MCRA params")});
-  expected->energyMargin = 1;
-  for (const auto field :
-       {&VADINFO::lowThresholdSelect, &VADINFO::calibrationMode, &VADINFO::calibrationDone,
-        &VADINFO::calibrationPhase, &VADINFO::calibrationIndex, &VADINFO::calibrationCount})
-    *expected.*field = 0;
-  for (const auto field :
-       {&VADINFO::energyThreshold, &VADINFO::calibrationBest, &VADINFO::calibrationOlderSum,
-        &VADINFO::calibrationNewerSum, &VADINFO::calibrationPeak})
-    *expected.*field = 0;
-  EXPECT_EQ(std::memcmp(vad, expected.get(), sizeof *vad), 0);
 }
 
 TEST(McraEntries, WindowTheFirstSamplesOfTheCallersFrame) {
