@@ -40,38 +40,6 @@ Pcm frame_of(double (*wave)(int), double level) {
 }
 
 const auto kTone = [](int i) { return std::sin(0.3 * i); };
-const auto kSquare = [](int i) { return i / 7 % 2 == 0 ? 1.0 : -1.0; };
-
-TEST(McraAnalysis, FirstFramePrimesAndSaysNothing) {
-  const Detector vad(false);
-  EXPECT_EQ(vad.process(frame_of(kSquare, 20000)), 0);
-  EXPECT_EQ(vad->frameIndex, 0);
-  EXPECT_EQ(vad->frameSnr, 0);
-  for (int k = 0; k < MCRA_BINS; ++k) {
-    const auto power = static_cast<double>(vad->smoothedPeriodogram[k]);
-    EXPECT_NEAR(static_cast<double>(vad->recursivePower[k]), 0.05 * power, 1 + 1e-8 * power);
-    EXPECT_NEAR(static_cast<double>(vad->noisePower[k]), 0.999 * power, 1 + 1e-8 * power);
-    EXPECT_EQ(vad->prioriSnrAvg[k], 0);
-    EXPECT_EQ(vad->prioriSnr[k], 1);
-    // v is 0 and q 0.95: 18 / (2 + 19).
-    EXPECT_NEAR(vad->speechProb[k] / 0x1p31, 18.0 / 21, 0.003);
-  }
-  EXPECT_EQ(vad->prevFrameEnergy, 0);
-}
-
-TEST(McraAnalysis, NeighboursAreWeightedAroundTheBinAlsoAtTheEdges) {
-  for (const int loud : {0, 1, 3, 60, 125, 127}) {
-    const Detector vad(false);
-    vad->frameIndex = 0;
-    vad->periodogram[loud] = std::int64_t{1} << 40;
-    update_noise(*vad);
-    for (int k = 0; k < MCRA_BINS; ++k) {
-      const int distance = std::abs(k - loud);
-      const double weight = distance > 4 ? 0 : 0.5 + 0.5 * std::cos(M_PI * distance / 4);
-      EXPECT_NEAR(static_cast<double>(vad->smoothedPeriodogram[k]) / 0x1p40, weight, 2e-9) << k;
-    }
-  }
-}
 
 TEST(McraAnalysis, MinimaOfAllTimeFallAndThoseOfTheRingRiseAgain) {
   const Pcm loud = frame_of(kTone, 8000), quiet = frame_of(kTone, 800);

@@ -115,15 +115,6 @@ double ModelPlan::width(std::size_t channel) const {
   return count == 24 ? 14 : count;  // the detector weighs its widest channel but one up
 }
 
-ModelState initial_model(const ModelPlan &plan) {
-  ModelState state;
-  state.overlap.resize(plan.overlap);
-  state.energy.resize(plan.channels());
-  state.noise.resize(plan.channels());
-  state.long_term_q5.resize(plan.channels());
-  return state;
-}
-
 ModelSpectrum model_spectrum(const ModelPlan &plan, ModelState &state, const std::int16_t *frame) {
   ModelSpectrum spectrum{
       .shift = block_shift(frame, plan.frame), .peak = 0, .bins = {}, .power = {}};

@@ -62,8 +62,6 @@ struct ModelFindings {
   double total = 0;
 };
 
-ModelState initial_model(const ModelPlan &plan);
-
 /// Window, transform and channel powers; moves the overlap and the last sample.
 ModelSpectrum model_spectrum(const ModelPlan &plan, ModelState &state, const std::int16_t *frame);
 
