@@ -8,7 +8,7 @@
 #include <cstdlib>
 
 #include "orvalis.h"
-#include "tests/support/log_capture.h"
+#include "tests/support/quiet_log.h"
 #include "tests/support/recordings.h"
 #include "tests/support/scripted_malloc.h"
 
@@ -24,7 +24,7 @@ struct Control {
   int32_t process(Pcm &pcm) const {
     return ProcessDRC(handle, pcm.data(), static_cast<int32_t>(pcm.size()));
   }
-  const LogCapture quiet;
+  const QuietLog quiet;
   const int64_t handle;
 };
 

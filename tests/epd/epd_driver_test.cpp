@@ -10,7 +10,7 @@
 
 #include "Voice_Engine/epd/epd_instance.h"
 #include "orvalis.h"
-#include "tests/support/log_capture.h"
+#include "tests/support/quiet_log.h"
 #include "tests/support/recordings.h"
 #include "tests/support/scripted_malloc.h"
 #include "tests/support/temporary_folder.h"
@@ -26,10 +26,6 @@ struct FreeDetector {
   void operator()(EpdInstance *epd) const { EXPECT_EQ(FreeMemoryEPD(epd), 0); }
 };
 using Detector = std::unique_ptr<EpdInstance, FreeDetector>;
-
-LogLine version_line(Word32 mode) {
-  return debug_line("TQE: libOrvalis.so version 160705 IS127 in EPD Create, EPD MODE : %d", mode);
-}
 
 long number(const EpdInstance *epd) { return reinterpret_cast<std::intptr_t>(epd); }
 
@@ -53,7 +49,7 @@ protected:
     return folder;
   }
 
-  LogCapture log;
+  const QuietLog quiet;
   const TemporaryFolder root;
 };
 
@@ -70,11 +66,8 @@ TEST_F(EpdDriver, RefusesWhatIsNotThere) {
   EXPECT_EQ(ProcessEPDFrame(epd.get(), nullptr, 1), -1);
   EXPECT_EQ(ResetEPDparams(nullptr), -1);
   EXPECT_EQ(setLogging(nullptr, 1), -1);
-  log.take();
   EXPECT_EQ(FreeMemoryEPD(nullptr), -1);
-  EXPECT_EQ(log.take(), LogLines{debug_line("TQE: free EPD memory id : %d", 0)});
   EXPECT_EQ(FreeMemoryEPD(reinterpret_cast<EpdInstance *>(std::intptr_t{-1})), -1);
-  EXPECT_EQ(log.take(), LogLines{debug_line("TQE: free EPD memory id : %d", -1)});
 
   EXPECT_STREQ(GetVersion(), "160705");
   // What is left of 256 bytes beside folder, the longest handle and suffix.
@@ -83,7 +76,6 @@ TEST_F(EpdDriver, RefusesWhatIsNotThere) {
 
   const auto no_memory = ScriptedMalloc::failing();
   EXPECT_EQ(InitializeEPD(21001, 1), nullptr);
-  EXPECT_EQ(log.take(), LogLines{version_line(21001)});
 }
 
 TEST_F(EpdDriver, LeavesBothDumpFilesBehindEachCallAndNoHandle) {
