@@ -2,7 +2,9 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
+#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <memory>
@@ -124,6 +126,37 @@ TEST_F(EpdDriver, DoesWithoutDumpFiles) {
   const fs::path folder = make_dump_folder();
   for (const Word32 dumps : {0, 2, -1}) works(dumps);  // only 1 asks for them
   EXPECT_TRUE(fs::is_empty(folder));
+}
+
+TEST_F(EpdDriver, TakesItsModeApart) {
+  const struct {
+    Word32 mode, sub_mode, rate, gain;
+  } cases[] = {{4, 0, 0, 0},
+               {3, 3, 0, 0},
+               {-3, 0, 0, 0},
+               {9002, 2, 0, 0},
+               {-11001, 0, -1, -1},
+               {21001, 1, 1, 2},
+               {INT32_MAX, 0, 0, 214748},
+               {INT32_MIN, 0, -3, -214748}};
+  for (const auto &[mode, sub_mode, rate, gain] : cases) {
+    const Detector epd(InitializeEPD(mode, 0));
+    EXPECT_EQ(epd->epdMode, sub_mode) << mode;
+    EXPECT_EQ(epd->rateMode, rate) << mode;
+    EXPECT_EQ(epd->inputGainMode, gain) << mode;
+  }
+}
+
+TEST_F(EpdDriver, AudioIsAbnormalFrom120SmallSamples) {
+  for (const std::int16_t level : {-5, -4, 4, 5}) {
+    for (const int small : {119, 120}) {
+      const Detector epd(InitializeEPD(0, 0));
+      Pcm frame = kNormal;
+      std::fill_n(frame.begin(), small, level);
+      process(epd, frame);
+      EXPECT_EQ(epd->abnormalCheckCount, small == 120 && std::abs(level) == 4 ? 0 : 3) << level;
+    }
+  }
 }
 
 TEST_F(EpdDriver, CountersStopAtTheirEnd) {
