@@ -3,6 +3,8 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstdlib>
+#include <utility>
 
 #include "basic_op.h"
 #include "tests/support/flag_words.h"
@@ -73,6 +75,17 @@ TEST(Operators, LongProductsAndQuotientsAreAccurate) {
     L_Extract(divisor, &hi, &lo);
     ASSERT_NEAR(Div_32(dividend, hi, lo), quotient, 48.0) << dividend << " / " << divisor;
   }
+}
+
+// They end with status 0, so only a child shows that they do, and that others do not.
+TEST(ZoltDivisionDeathTest, EndsTheProcessOutOfRangeOnly) {
+  EXPECT_EXIT(ZOLT_div_s(5, 3), testing::ExitedWithCode(0), "");
+  EXPECT_EXIT(ZOLT_div_s(0, 0), testing::ExitedWithCode(0), "");
+  for (const auto &[a, b] : {std::pair{1, 0}, {-1, 0}, {1, -1}, {-1, 1}})
+    EXPECT_EXIT(ZOLT_div_l(a, static_cast<int16_t>(b)), testing::ExitedWithCode(0), "");
+  EXPECT_EXIT(
+      std::_Exit(ZOLT_div_s(0, 3) == 0 && ZOLT_div_s(3, 3) > 0 && ZOLT_div_l(6, 1) == 3 ? 7 : 1),
+      testing::ExitedWithCode(7), "");
 }
 
 TEST(LogExp, Accuracy) {

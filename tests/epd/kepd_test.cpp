@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <cstring>
 #include <memory>
 #include <sstream>
 #include <string>
@@ -128,6 +129,16 @@ TEST_F(NoiseFloor, MeasuresMeanSquares) {
       const double whole = std::floor(sum / samples / 100);
       ASSERT_EQ(getAbsoluteEnergy(frame, rate_mode), static_cast<float>(whole)) << rate_mode;
     }
+  }
+}
+
+TEST_F(NoiseFloor, IsFinalAfterFortyFiveSpeechFrames) {
+  const std::vector<Word16> loud(160, 3000);
+  for (int frame = 0; frame < 45; ++frame) track(true, loud.data());
+  const NoiseFloorState finished = record->noise_floor;
+  for (const bool voiced : {false, true}) {
+    track(voiced, loud.data());
+    EXPECT_EQ(std::memcmp(&record->noise_floor, &finished, sizeof finished), 0);
   }
 }
 
