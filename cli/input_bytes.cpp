@@ -12,7 +12,7 @@ namespace orvalis::cli {
 namespace {
 
 /// Pictures may stand before the audio; nothing sensible is longer.
-constexpr std::int64_t kLongestHead = 64 << 20;
+constexpr std::int64_t kMaxHeadBytes = 64 << 20;
 
 }  // namespace
 
@@ -107,7 +107,7 @@ std::int64_t InputBytes::read_stream(char *to, std::int64_t count) {
 
 /// Reads on from where the descriptor stands: less than `count` at the end, or after an error.
 std::int64_t InputBytes::receive(char *to, std::int64_t count) {
-  if (is_stream_ && opening_) count = std::min(count, kLongestHead - received_);
+  if (is_stream_ && opening_) count = std::min(count, kMaxHeadBytes - received_);
   std::int64_t got = 0;
   while (error_ == 0 && got < count) {
     const ssize_t size = ::read(descriptor_, to + got, static_cast<std::size_t>(count - got));

@@ -134,7 +134,7 @@ public:
 
   void push(std::span<const std::int16_t> samples) {
     recent_.insert(recent_.end(), samples.begin(), samples.end());
-    if (recent_.size() < kMostInMemory) return;
+    if (recent_.size() < kMaxInMemory) return;
     if (!older_) older_.emplace(name_);
     const std::vector<std::int16_t> moved(recent_.begin(), recent_.end());
     const auto bytes = static_cast<ssize_t>(moved.size() * sizeof(std::int16_t));
@@ -175,7 +175,7 @@ public:
   }
 
 private:
-  static constexpr std::size_t kMostInMemory = 960000;  ///< A minute at 16 kHz
+  static constexpr std::size_t kMaxInMemory = 960000;  ///< A minute at 16 kHz
 
   off_t offset_of(std::int64_t sample) const {
     return (sample - first_older_) * static_cast<off_t>(sizeof(std::int16_t));

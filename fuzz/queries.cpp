@@ -78,14 +78,15 @@ void check_spectrum(const Samples &audio, bool is_wide) {
 
 void check_fixed(const Samples &audio, bool is_narrow, bool is_inverse) {
   Samples frame = exactly(audio, is_narrow ? 128 : 256);
-  for (std::int16_t &sample : frame) sample = static_cast<std::int16_t>(sample / 2);  // no overflow
+  // Louder audio may saturate between the stages.
+  for (std::int16_t &sample : frame) sample = static_cast<std::int16_t>(sample * 11585 / 32768);
   const Bins bins = spectrum_of(frame);
   Samples other = frame;
   r_fft_epd(frame.data(), is_inverse ? -1 : 1, is_narrow);
-  if (!is_inverse) require_bins(frame, bins, 6);
+  if (!is_inverse) require_bins(frame, bins, 8);
   if (is_narrow) return;
   r_fft_ns(other.data(), is_inverse ? -1 : 1);
-  if (!is_inverse) require_bins(other, bins, 6);
+  if (!is_inverse) require_bins(other, bins, 8);
 }
 
 void check_float(const Samples &audio) {
@@ -108,10 +109,11 @@ void check_unscaled(const Samples &audio, bool is_long) {
               : Noscale_FFT_256p_Frame_64bit(frame.data(), count, re.data(), im.data());
   require(result == 0, "it answers");
   const Bins bins = spectrum_of(exactly(frame, size));
+  double tolerance = 0.75;  // both parts are rounded
+  for (const std::int16_t sample : frame) tolerance += 5.5e-7 * std::abs(sample);
   for (std::size_t k = 0; k < bins.size(); ++k)
-    require(
-        std::abs(std::complex<double>(re[k], im[k]) - bins[k]) <= 1 + std::abs(bins[0]) * 1e-5 + 60,
-        "a bin is the discrete Fourier transform");
+    require(std::abs(std::complex<double>(re[k], im[k]) - bins[k]) <= tolerance,
+            "a bin is the discrete Fourier transform");
 }
 
 }  // namespace
