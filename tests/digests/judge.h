@@ -25,6 +25,11 @@ namespace orvalis::test {
 class Judge {
 public:
   explicit Judge(const std::string &service) : service_(service) {
+    // A call that ends the process with status 0 would pass for a success.
+    static const int registered = std::atexit([] {
+      if (is_judging) std::_Exit(1);
+    });
+    is_judging = registered == 0;
     if (const char *folder = std::getenv("ORVALIS_WRITE_DIGESTS"))
       written_.open(std::string(folder) + "/" + service + ".txt");
     std::ifstream file(std::string(ORVALIS_DIGESTS "/") + service + ".txt");
@@ -37,6 +42,7 @@ public:
   Judge(const Judge &) = delete;
   Judge &operator=(const Judge &) = delete;
   ~Judge() {
+    is_judging = false;
     if (written_.is_open()) {
       EXPECT_TRUE(written_.flush());
       return;
@@ -44,6 +50,9 @@ public:
     for (const auto &[name, sequence] : expected_)
       ADD_FAILURE() << service_ << ", " << name << ": not run";
   }
+
+  /// Cleared by a child process whose end is itself judged.
+  static inline bool is_judging = false;
 
   /// Folds numbers, or arrays, vectors and strings of them, into the digest of the running call.
   template <class... Values>
