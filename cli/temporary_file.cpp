@@ -12,7 +12,6 @@
 #include <cstdio>
 #include <filesystem>
 #include <mutex>
-#include <regex>
 #include <set>
 #include <system_error>
 
@@ -42,9 +41,14 @@ std::uint64_t hash_of(const std::string &text) {
   return hash;
 }
 
-const std::regex &temporary_name() {
-  static const std::regex pattern("\\.orvalis-[0-9a-f]{16}-[0-9]{1,10}-[0-9]{1,10}\\.part");
-  return pattern;
+constexpr const char *kName = ".orvalis-{:016x}-{}-{}.part";
+
+/// Whether a file's name is of the form above.
+bool is_temporary_name(const std::string &name) {
+  int length = 0;
+  std::sscanf(name.c_str(), ".orvalis-%*16[0-9a-f]-%*10[0-9]-%*10[0-9].part%n", &length);
+  constexpr std::size_t kHash = 9, kAfterHash = kHash + 16;
+  return length == std::ssize(name) && name.find('-', kHash) == kAfterHash;
 }
 
 /// Renames, but never onto an existing file. Returns 0 or an errno.
@@ -76,8 +80,7 @@ TemporaryFile::TemporaryFile(const std::string &target) : target_(target) {
 bool TemporaryFile::create() {
   static std::atomic<unsigned> count{0};
   const fs::path path(target_);
-  name_ = path.parent_path() /
-          fmt::format(".orvalis-{:016x}-{}-{}.part", hash_of(path.filename()), getpid(), count++);
+  name_ = path.parent_path() / fmt::format(kName, hash_of(path.filename()), getpid(), count++);
   Unfinished &all = unfinished();
   const std::lock_guard lock(all.mutex);
   // What it replaces may be private, so it becomes readable for others only with its name.
@@ -131,7 +134,7 @@ void remove_leftovers(const std::string &folder) {
   std::error_code error;
   for (fs::directory_iterator entry(folder.empty() ? "." : folder, error), end;
        !error && entry != end; entry.increment(error)) {
-    if (!std::regex_match(entry->path().filename().string(), temporary_name())) continue;
+    if (!is_temporary_name(entry->path().filename())) continue;
     const int descriptor =
         open(entry->path().c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
     if (descriptor < 0) continue;
