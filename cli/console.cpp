@@ -96,8 +96,12 @@ void Console::print_error(const std::string &message) {
   std::fputs(("orvalis: " + printable(message) + "\n").c_str(), stderr);
 }
 
-void Console::print_note(const std::string &input, const std::string &text) {
+void Console::print_error(const std::string &input, const std::string &text) {
   print_error(display_name(input) + ": " + text);
+}
+
+void Console::print_note(const std::string &input, const std::string &text) {
+  if (shows_notes_) print_error(input, text);
 }
 
 void Console::show_progress(const Progress &progress) {
@@ -111,6 +115,8 @@ void Console::clear_progress() {
   if (progress_is_shown_) std::fputs("\r\x1b[K", stderr);
   progress_is_shown_ = false;
 }
+
+void Console::be_quiet() { shows_notes_ = shows_progress_ = false; }
 
 void Console::show_engine_log() {
   SetLogSink(LogAllToStandardError, nullptr);

@@ -35,11 +35,17 @@ public:
   void print_error(const std::string &message);
 
   /// The same about one input, which is named.
+  void print_error(const std::string &input, const std::string &text);
+
+  /// The same, of what is no error.
   void print_note(const std::string &input, const std::string &text);
 
   /// Rewrites the progress line on standard error if that is a terminal, though not in the first
   /// second, nor more often than a reader can follow. Anything else that is printed clears it.
   void show_progress(const Progress &progress);
+
+  /// Drops notes and progress from now on.
+  void be_quiet();
 
   /// Shows the engine's log lines on standard error, instead of progress.
   void show_engine_log();
@@ -54,6 +60,7 @@ private:
   void clear_progress();
 
   bool shows_progress_;
+  bool shows_notes_ = true;
   bool progress_is_shown_ = false;
   Clock::time_point next_progress_;
 };

@@ -59,11 +59,12 @@ int run_detection(const CLI::App &command, DetectOptions &options, Console &cons
   });
 }
 
-CLI::App *add_command(CLI::App &app, const char *name, const char *summary,
-                      DetectOptions &options) {
+CLI::App *add_command(CLI::App &app, const char *name, const char *summary, DetectOptions &options,
+                      Run &run) {
   CLI::App *command = app.add_subcommand(name, summary);
   add_files_option(*command, options.files);
-  add_report_option(*command, "--format", options.format);
+  add_report_option(*command, "-f,--format", options.format);
+  add_quiet_option(*command, run.console);
   return command;
 }
 
@@ -71,11 +72,6 @@ constexpr const char *kTraceText =
     "Print the decision on each frame and what led to\nit, as csv or json";
 
 constexpr const char *kEpdNotes = R"(Input:
-  Any file that libsndfile reads (WAV, FLAC, Ogg, MP3, AIFF, AU, ...), at any rate.
-  Audio of 16 bits at 8 or 16 kHz is processed as it is. Other rates are resampled to
-  16 kHz, other sample formats rounded to 16 bits; what exceeds full scale clips.
-  Several channels are averaged unless --channel picks one.
-  "-" reads standard input: WAV (or AIFF, AU, Ogg), or with --raw samples alone.
   Each utterance is printed as soon as it is decided. Nothing is decided before the
   first 10 s are there, except with --raw - or --no-lead-in.
 
@@ -97,9 +93,7 @@ Output:
     textgrid  an interval tier for Praat (one file, written at its end)
     rttm      SPEAKER lines for diarisation tools
 
-Exit status:
-  0 all files were processed; 1 a file could not be read or split (the others were
-  processed); 2 wrong usage.
+Input formats, times and exit status: orvalis help input
 
 Examples:
   orvalis epd meeting.wav
@@ -115,7 +109,7 @@ void add_epd_command(CLI::App &app, Run &run) {
   const auto options = std::make_shared<DetectOptions>();
   DetectorSettings &detector = options->settings.detector;
   CLI::App *epd =
-      add_command(app, "epd", "Find the utterances in audio files or live audio", *options);
+      add_command(app, "epd", "Find the utterances in audio files or live audio", *options, run);
   epd->footer(kEpdNotes);
   const UtteranceOptions utterances = add_utterance_options(*epd, detector);
   epd->add_option_function<std::string>(
@@ -124,7 +118,7 @@ void add_epd_command(CLI::App &app, Run &run) {
            detector.stream.input_gain = gain == "0.25" ? 1 : gain == "4" ? 2 : 0;
          },
          "Gain of the input: 0.25, 1 or 4 (wraps beyond 16 bits)")
-      ->check(CLI::IsMember({"0.25", "1", "4"}).description(""))
+      ->check(one_of({"0.25", "1", "4"}))
       ->type_name("G")
       ->default_str("1");
   epd->add_flag("--force", detector.split.rules.may_replace, "Replace existing files")
@@ -163,8 +157,9 @@ that becomes more than 3 dB louder counts as speech from then on. With --history
 rise as well, and words are found in parts, which --min-silence joins.
 
 Output:
-  As for epd. "start" and "end" are the borders of a segment; "began" and "ended" are
-  the times of the detector's first and last decision for speech.
+  As for epd (orvalis help epd). "start" and "end" are the borders of a segment;
+  "began" and "ended" are the times of the detector's first and last decision for
+  speech.
 
 Trace:
   energy, smoothed_energy, minimum_energy and speech_bins are those of a frame and its
@@ -196,7 +191,7 @@ void add_mcra_options(CLI::App &vad, McraSettings &mcra) {
       "--calibrate", [&mcra] { mcra.calibrationMode = mcra.calibrationEnable = 1; },
       "Learn the energy threshold from frames 80 to 294;\nimplies --margin-over-minima");
   vad.add_option("--exponent", mcra.exponent, "Exponent of the learnt threshold")
-      ->check(CLI::Range(0.01, 2.0).description(""))
+      ->check(from_to(0.01, 2.0))
       ->type_name("X")
       ->default_str("0.84");
 }
@@ -207,7 +202,7 @@ void add_vad_command(CLI::App &app, Run &run) {
   detector.stream.detector = UTTERANCE_MCRA;
   detector.stream.min_speech_ms = 100;
   CLI::App *vad =
-      add_command(app, "vad", "Find segments of speech with the MCRA detector", *options);
+      add_command(app, "vad", "Find segments of speech with the MCRA detector", *options, run);
   vad->footer(kVadNotes);
   std::vector<CLI::Option *> times = {
       add_time_option(*vad, "--min-speech", detector.stream.min_speech_ms,

@@ -19,6 +19,7 @@ namespace {
 struct EnhanceOptions {
   std::vector<std::string> inputs;  ///< And, until the command runs, the output
   EnhanceSettings settings;
+  std::string output;  ///< By -o, or ""
   std::string format;
   std::string report = "table";
   std::size_t jobs = 1;
@@ -49,9 +50,12 @@ EnhanceSettings settings_of(const EnhanceOptions &options, ProtectedFiles &input
 
 int run_enhancement(EnhanceOptions &options, Console &console) {
   std::vector<std::string> &inputs = options.inputs;
-  if (inputs.size() < 2) throw CLI::RequiredError("OUTPUT");
-  std::string destination = std::move(inputs.back());
-  inputs.pop_back();
+  std::string destination = options.output;
+  if (destination.empty()) {
+    if (inputs.size() < 2) throw CLI::RequiredError("OUTPUT");
+    destination = std::move(inputs.back());
+    inputs.pop_back();
+  }
   if (destination == "/dev/stdout") destination = "-";  // keeps the report out of the audio
   check_inputs(inputs);
   const auto report = make_report(options.report, "--report", inputs.size(), console);
@@ -75,13 +79,6 @@ int run_enhancement(EnhanceOptions &options, Console &console) {
 }
 
 constexpr const char *kInputAndOutput = R"(
-Input:
-  Any file that libsndfile reads (WAV, FLAC, Ogg, MP3, AIFF, AU, ...), at any rate.
-  Audio of 16 bits at 16 kHz is processed as it is. Other rates are resampled to
-  16 kHz, other sample formats rounded to 16 bits; what exceeds full scale clips.
-  Several channels are refused unless an option says which is meant.
-  "-" reads standard input: WAV (or AIFF, AU, Ogg), or with --raw samples alone.
-
 Output:
   One channel of 16 bits at 16 kHz, or with --keep-rate at the rate of the input, as
   long as the input and not delayed. Its name gives the format: .wav, .flac, .ogg,
@@ -90,9 +87,7 @@ Output:
   output gets the name of its input. "-" writes standard output while input still
   arrives, as WAV of open length or raw.
 
-Exit status:
-  0 all files were processed; 1 a file could not be read or written (the others were
-  processed); 2 wrong usage.
+Input, times and exit status: orvalis help input
 )";
 
 constexpr const char *kDenoiseNotes = R"(
@@ -131,7 +126,7 @@ void add_suppression_options(CLI::App &command, EnhancementSettings &enhancement
   command
       .add_option("--level", enhancement.suppression_db,
                   "Suppression of one microphone in dB: 13 or 18")
-      ->check(CLI::IsMember({13, 18}).description(""))
+      ->check(one_of({"13", "18"}))
       ->type_name("DB")
       ->capture_default_str();
   command
@@ -143,15 +138,6 @@ void add_suppression_options(CLI::App &command, EnhancementSettings &enhancement
       ->type_name("N")
       ->capture_default_str();
 }
-
-/// Shows OUTPUT in the usage line without the brackets of what may be left out.
-class OutputFormatter : public CLI::Formatter {
-public:
-  std::string make_option_usage(const CLI::Option *option) const override {
-    const std::string name = option->get_name();
-    return name == "OUTPUT" ? name : CLI::Formatter::make_option_usage(option);
-  }
-};
 
 /// Adds a command with the options that all of them have.
 CLI::App *add_command(CLI::App &app, const CommandTexts &texts,
@@ -168,16 +154,19 @@ CLI::App *add_command(CLI::App &app, const CommandTexts &texts,
   command
       ->add_option("OUTPUT",
                    "A file, a folder (which is created if necessary),\n"
-                   "or \"-\" for standard output")
+                   "or \"-\" for standard output; or see -o")
       ->option_text("REQUIRED");
-  command->formatter(std::make_shared<OutputFormatter>());
-  command->add_option("--format", options->format, "Format of the output (default: by its name)")
-      ->check(CLI::IsMember(output_format_names()).description(""))
+  command->add_option("-o,--output", options->output, "OUTPUT, given here instead of last")
+      ->check(not_empty())
+      ->type_name("OUTPUT");
+  command->add_option("-f,--format", options->format, "Format of the output (default: by its name)")
+      ->check(one_of(output_format_names()))
       ->type_name("NAME");
   command->add_flag("--force", options->replace, "Replace existing files");
   command->add_flag("--sync", options->sync, "Have files on the disk before they get their names");
   command->add_flag("--keep-rate", settings.keep_rate, "Convert back to the rate of the input");
   add_jobs_option(*command, options->jobs);
+  add_quiet_option(*command, run.console);
   CLI::Option *channel =
       add_audio_options(*command, settings.audio, "Channel to process, from 1, of several");
   command->add_flag("--mix", options->mix, "Process the mean of several channels")

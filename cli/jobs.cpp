@@ -85,6 +85,10 @@ void Job::note(const std::string &text) {
   in_turn([&console = console_, input = input_, text] { console.print_note(input, text); });
 }
 
+void Job::print_error(const std::string &text) {
+  in_turn([&console = console_, input = input_, text] { console.print_error(input, text); });
+}
+
 void Job::show_progress(double processed_s, std::optional<double> length_s) {
   if (!turns_.has_come(number_)) return;
   const std::chrono::duration<double> elapsed = std::chrono::steady_clock::now() - start_;
@@ -120,10 +124,10 @@ int process_files(const std::vector<std::string> &inputs, std::size_t threads, C
     try {
       process(job);
     } catch (const AudioError &error) {
-      job.note(error.what());
+      job.print_error(error.what());
       job.in_turn([&status] { status = 1; });
     } catch (const std::bad_alloc &) {
-      job.note("out of memory");
+      job.print_error("out of memory");
       job.in_turn([&status] { status = 1; });
     } catch (const Turns::Abandoned &) {
       throw;

@@ -31,6 +31,9 @@ public:
   /// Prints in turn, on standard error, something to know about the input.
   void note(const std::string &text);
 
+  /// The same of an error, which is not dropped when notes are.
+  void print_error(const std::string &text);
+
   /// Called after each chunk. `length_s`: of the whole input, if known.
   void show_progress(double processed_s, std::optional<double> length_s);
 

@@ -16,6 +16,7 @@
 
 #include "cli/commands.h"
 #include "cli/signals.h"
+#include "cli/usage.h"
 
 namespace {
 
@@ -32,10 +33,10 @@ int parse_and_run(int argc, char **argv, orvalis::cli::Run &run) {
       "orvalis");
   app.require_subcommand(1);
   app.set_version_flag("--version", version());
-  app.failure_message([](const CLI::App *, const CLI::Error &error) {
-    return fmt::format("orvalis: {}\nRun orvalis with --help for more.\n",
-                       orvalis::cli::printable(error.what()));
+  app.failure_message([&app](const CLI::App *, const CLI::Error &error) {
+    return orvalis::cli::usage_error(app, error);
   });
+  orvalis::cli::set_help_format(app);
   app.footer(
       "Examples:\n"
       "  orvalis epd meeting.wav                 the utterances of a recording\n"
@@ -43,12 +44,14 @@ int parse_and_run(int argc, char **argv, orvalis::cli::Run &run) {
       "  orvalis denoise meeting.wav clean.wav   the recording without its noise\n"
       "  orvalis process meeting.wav out.wav     the recording denoised and levelled\n"
       "  orvalis energy meeting.wav              how loud each 20 ms of it are\n"
-      "  orvalis denoise --help                  the options of the command denoise");
+      "  orvalis help denoise                    the options of the command denoise\n"
+      "  orvalis help input                      what all commands read, and the exit status");
   orvalis::cli::add_detect_commands(app, run);
   orvalis::cli::add_enhance_commands(app, run);
   orvalis::cli::add_query_commands(app, run);
   app.add_subcommand("version", "Print the versions of the tool and of the library")
       ->callback([&run] { run.console.print_line(version()); });
+  orvalis::cli::add_help_command(app, run);
   try {
     app.parse(argc, argv);
   } catch (const CLI::ParseError &error) {

@@ -6,14 +6,83 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <charconv>
+#include <cmath>
 #include <filesystem>
 #include <limits>
+#include <optional>
 #include <stdexcept>
+#include <string_view>
 #include <system_error>
+#include <utility>
 
 namespace orvalis::cli {
+namespace {
 
-CLI::Validator from_to(int min, int max) { return CLI::Range(min, max).description(""); }
+constexpr std::int32_t kMaxTimeMs = 3600 * 1000;
+
+/// Milliseconds of 200ms, 0.2s or 200; none for anything else.
+std::optional<std::int32_t> milliseconds(std::string_view text) {
+  double factor = 1;
+  if (text.ends_with("ms")) {
+    text.remove_suffix(2);
+  } else if (text.ends_with('s')) {
+    text.remove_suffix(1);
+    factor = 1000;
+  }
+  double value = 0;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
+  const double ms = value * factor;
+  if (error != std::errc() || end != text.data() + text.size() || !(ms >= 0 && ms <= kMaxTimeMs))
+    return std::nullopt;
+  const auto whole = static_cast<std::int32_t>(std::lround(ms));
+  if (std::abs(ms - whole) > 1e-6) return std::nullopt;
+  return whole;
+}
+
+/// Puts milliseconds in the place of a time.
+CLI::Validator time() {
+  return {[](std::string &text) {
+            const auto ms = milliseconds(text);
+            if (!ms)
+              return fmt::format(
+                  "\"{}\" is not a time from 0 to {} s in whole milliseconds, such as 200ms, 0.2s "
+                  "or 200",
+                  text, kMaxTimeMs / 1000);
+            text = std::to_string(*ms);
+            return std::string();
+          },
+          ""};
+}
+
+template <class Number>
+CLI::Validator number_from_to(const char *kind, Number min, Number max) {
+  return {[=](const std::string &text) {
+            Number value{};
+            const auto [end, error] =
+                std::from_chars(text.data(), text.data() + text.size(), value);
+            if (error == std::errc() && end == text.data() + text.size() && value >= min &&
+                value <= max)
+              return std::string();
+            return fmt::format("\"{}\" is not a {} from {} to {}", text, kind, min, max);
+          },
+          ""};
+}
+
+}  // namespace
+
+CLI::Validator from_to(int min, int max) { return number_from_to("whole number", min, max); }
+
+CLI::Validator from_to(double min, double max) { return number_from_to("number", min, max); }
+
+CLI::Validator one_of(std::vector<std::string> words) {
+  return {[words = std::move(words)](const std::string &text) {
+            return std::ranges::count(words, text) > 0
+                       ? std::string()
+                       : fmt::format("\"{}\" is none of {}", text, fmt::join(words, ", "));
+          },
+          ""};
+}
 
 CLI::Validator not_empty() {
   return {
@@ -49,8 +118,13 @@ CLI::Option *add_audio_options(CLI::App &command, AudioSettings &settings,
   return channel;
 }
 
+void add_quiet_option(CLI::App &command, Console &console) {
+  command.add_flag_callback(
+      "-q,--quiet", [&console] { console.be_quiet(); }, "Print errors, but no notes or progress");
+}
+
 CLI::Option *add_jobs_option(CLI::App &command, std::size_t &jobs) {
-  return command.add_option("--jobs", jobs, "Number of files to process at once")
+  return command.add_option("-j,--jobs", jobs, "Number of files to process at once")
       ->check(from_to(1, 256))
       ->type_name("N")
       ->capture_default_str();
@@ -60,7 +134,7 @@ void add_report_option(CLI::App &command, const std::string &option, std::string
   std::vector<std::string> names;
   for (const ReportFormat &known : report_formats()) names.push_back(known.name);
   command.add_option(option, format, fmt::format("{}", fmt::join(names, ", ")))
-      ->check(CLI::IsMember(names).description(""))
+      ->check(one_of(names))
       ->type_name("NAME")
       ->capture_default_str();
 }
@@ -68,9 +142,9 @@ void add_report_option(CLI::App &command, const std::string &option, std::string
 CLI::Option *add_time_option(CLI::App &command, const std::string &option, std::int32_t &ms,
                              const std::string &text) {
   return command.add_option(option, ms, text)
-      ->check(from_to(0, 3600 * 1000))
-      ->type_name("MS")
-      ->capture_default_str();
+      ->transform(time())
+      ->type_name("TIME")
+      ->default_str(fmt::format("{}ms", ms));
 }
 
 std::vector<CLI::Option *> add_padding_options(CLI::App &command, UtteranceSettings &settings,

@@ -13,8 +13,12 @@
 
 namespace orvalis::cli {
 
-/// A range, without the note that CLI11 would add to the help.
+/// Refuses numbers out of a range, and what is no number.
 CLI::Validator from_to(int min, int max);
+CLI::Validator from_to(double min, double max);
+
+/// Refuses all but some words.
+CLI::Validator one_of(std::vector<std::string> words);
 
 /// Refuses an empty name.
 CLI::Validator not_empty();
@@ -27,13 +31,16 @@ CLI::Option *add_audio_options(
     CLI::App &command, AudioSettings &settings,
     const std::string &channel_text = "Channel to process, from 1 (default: the mean)");
 
+/// Adds --quiet.
+void add_quiet_option(CLI::App &command, Console &console);
+
 /// Adds --jobs.
 CLI::Option *add_jobs_option(CLI::App &command, std::size_t &jobs);
 
 /// Adds the option of that name that selects a report. `format` holds the default.
 void add_report_option(CLI::App &command, const std::string &option, std::string &format);
 
-/// Adds an option in milliseconds. `ms` holds the default.
+/// Adds an option that takes a time, as 200ms, 0.2s or 200. `ms` holds the default.
 CLI::Option *add_time_option(CLI::App &command, const std::string &option, std::int32_t &ms,
                              const std::string &text);
 

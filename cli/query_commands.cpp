@@ -129,10 +129,11 @@ void add_query(CLI::App &app, const Query &query, Run &run) {
   command->add_option("FILE", options->file, "Audio file; \"-\" is standard input")
       ->required()
       ->type_name("");
-  command->add_option("--format", options->format, "csv, or json (one object per line)")
-      ->check(CLI::IsMember({"csv", "json"}).description(""))
+  command->add_option("-f,--format", options->format, "csv, or json (one object per line)")
+      ->check(one_of({"csv", "json"}))
       ->type_name("NAME")
       ->capture_default_str();
+  add_quiet_option(*command, run.console);
   add_audio_options(*command, options->audio);
   command->callback([options, &query, &run] {
     run.exit_status = process_files({options->file}, 1, run.console, [&](Job &job) {
