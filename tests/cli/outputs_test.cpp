@@ -205,23 +205,5 @@ TEST_F(Outputs, NothingHalfWrittenIsLeft) {
   EXPECT_EQ(read_file(out + "a.raw"), read_file(out + "b.raw"));
 }
 
-TEST_F(Outputs, WrongUsageEndsWith2) {
-  fs::create_directory(folder_ / "d");
-  for (const std::string options :
-       {"", "x", "x y", "x out.txt", "x - --format flac", "- - d", "a/x.wav b/x.wav d",
-        "a/x.mp3 b/x.wav d", "--format mp4 x y.wav", "--level 14 x y.wav", "--mics 3 x y.wav",
-        "--mics 2 --mix x y.wav", "--mics 2 --channel 1 x y.wav", "--mics 2 --level 18 x y.wav",
-        "--mix --channel 1 x y.wav", "--jobs 0 x y.wav", "--rate 8000 x y.wav"}) {
-    ChildProcess child("cd " + folder_.path().string() + "; " + command("denoise " + options),
-                       folder_.path());
-    EXPECT_EQ(child.finish(), 2) << options;
-    EXPECT_EQ(child.errors().find("orvalis: "), 0U) << child.errors();
-  }
-  for (const std::string arguments :
-       {"level --mics 2 x y.wav", "process --report xml x y.wav", "level --report json x y.wav",
-        "process --no-align x y.wav", "process --split '' x y.wav"})
-    EXPECT_EQ(run(arguments).status, 2) << arguments;
-}
-
 }  // namespace
 }  // namespace orvalis::test

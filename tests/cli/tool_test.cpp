@@ -5,6 +5,7 @@
 #include <array>
 #include <sstream>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "tests/cli/tool.h"
@@ -181,44 +182,105 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersProcessed) {
   EXPECT_EQ(run("epd -", "no audio at all").err.find("orvalis: standard input: "), 0U);
 }
 
-TEST_F(Tool, WrongUsageEndsWith2) {
-  for (const std::string arguments : {"",
-                                      "unknown",
-                                      "epd",
-                                      "epd --unknown x",
-                                      "epd --format xml x",
-                                      "epd --gain 2 x",
-                                      "epd --hangover -1 x",
-                                      "epd --pad-after 1.5 x",
-                                      "epd --channel 0 x",
-                                      "epd --rate 16000 x",
-                                      "epd --raw --rate 0 x",
-                                      "epd --raw --rate fast x",
-                                      "epd --raw --channels 0 x",
-                                      "epd --content-type -1 x",
-                                      "epd --frames --hangover 9 x",
-                                      "epd --lead-in --no-lead-in x",
-                                      "epd - -",
-                                      "epd --jobs 0 x",
-                                      "epd --jobs 2 --log x",
-                                      "epd --force x",
-                                      "epd --split '' x",
-                                      "epd --split d --frames x",
-                                      "epd --split d a/x.wav b/x.flac",
-                                      "epd --split d - stdin.wav",
-                                      "epd --dump d x y"}) {
-    const Result result = run(arguments);
-    EXPECT_EQ(result.status, 2) << arguments;
-    EXPECT_EQ(result.out, "") << arguments;
-    EXPECT_EQ(result.err.find("orvalis: "), 0U) << result.err;
+TEST_F(Tool, WrongUsageIsNamedAndEndsWith2) {
+  // A command line, and what its message says.
+  const std::string time = " is not a time from 0 to 3600 s";
+  const std::vector<std::pair<std::string, std::string>> table = {
+      {"", "a command is missing\nRun orvalis --help"},
+      {"eqd x", "unknown command \"eqd\"; did you mean \"epd\"?\nRun orvalis --help"},
+      {"unknown", "unknown command \"unknown\"\n"},
+      {"help dnoise", "unknown command \"dnoise\"; did you mean \"denoise\"?"},
+      {"epd", "FILE is required\nRun orvalis epd --help"},
+      {"epd --hepl", "unknown option \"--hepl\"; did you mean \"--help\"?"},
+      {"energy x y", "unexpected argument \"y\""},
+      {"epd --format xml x", "--format: \"xml\" is none of table, json, csv"},
+      {"epd --gain 2 x", "--gain: \"2\" is none of 0.25, 1, 4"},
+      {"epd --hangover -1 x", "--hangover: \"-1\"" + time},
+      {"epd --hangover 3601s x", "--hangover: \"3601s\"" + time},
+      {"epd --hangover 1m x", "--hangover: \"1m\"" + time},
+      {"epd --hangover s x", "--hangover: \"s\"" + time},
+      {"epd --hangover nan x", "--hangover: \"nan\"" + time},
+      {"epd --pad-after 1.5 x", "--pad-after: \"1.5\"" + time},
+      {"epd --channel 0 x", "--channel: \"0\" is not a whole number from 1 to 1024"},
+      {"epd --rate 16000 x", "--rate requires --raw"},
+      {"epd --raw --rate 0 x", "--rate: \"0\""},
+      {"epd --raw --rate fast x", "--rate: \"fast\""},
+      {"epd --raw --channels 0 x", "--channels: \"0\""},
+      {"epd --content-type -1 x", "--content-type: \"-1\""},
+      {"epd --frames --hangover 9 x", "excludes"},
+      {"epd --lead-in --no-lead-in x", "excludes"},
+      {"epd --trace --frames x", "excludes"},
+      {"epd --trace --format table x", "holds no trace"},
+      {"epd - -", "standard input can be read only once"},
+      {"vad - -", "standard input can be read only once"},
+      {"epd --jobs 0 x", "--jobs: \"0\" is not a whole number from 1 to 256"},
+      {"epd --jobs 2 --log x", "excludes"},
+      {"epd --force x", "--force requires --split"},
+      {"epd --split '' x", "--split: the name is empty"},
+      {"epd --split d --frames x", "excludes"},
+      {"epd --split d a/x.wav b/x.flac", "parts of the same names"},
+      {"epd --split d - stdin.wav", "parts of the same names"},
+      {"epd --dump d x y", "only one can be dumped"},
+      {"vad --trace --format labels x", "holds no trace"},
+      {"vad --trace --pad-after 1 x", "excludes"},
+      {"vad --exponent 0 x", "--exponent: \"0\" is not a number from 0.01 to 2"},
+      {"denoise", "FILE is required"},
+      {"denoise x", "OUTPUT is required\nRun orvalis denoise --help"},
+      {"denoise -o '' x", "--output: the name is empty"},
+      {"denoise x y", ""},
+      {"denoise x out.txt", ""},
+      {"denoise x - --format flac", ""},
+      {"denoise - - d", ""},
+      {"denoise a/x.wav b/x.wav d", ""},
+      {"denoise a/x.mp3 b/x.wav d", ""},
+      {"denoise --format mp4 x y.wav", "--format: \"mp4\" is none of wav"},
+      {"denoise --level 18dB x y.wav", "--level: \"18dB\" is none of 13, 18"},
+      {"denoise --mics 3 x y.wav", "--mics: \"3\""},
+      {"denoise --mics 2 --mix x y.wav", "excludes"},
+      {"denoise --mics 2 --channel 1 x y.wav", "excludes"},
+      {"denoise --mics 2 --level 18 x y.wav", "excludes"},
+      {"denoise --mix --channel 1 x y.wav", "excludes"},
+      {"level --mics 2 x y.wav", "unknown option \"--mics\""},
+      {"level --report json x y.wav", "unknown option \"--report\""},
+      {"process --report xml x y.wav", "--report: \"xml\""},
+      {"process --no-align x y.wav", "unknown option \"--no-align\""},
+      {"process --split '' x y.wav", "--split: the name is empty"}};
+  for (const auto &[arguments, says] : table) {
+    ChildProcess child("cd " + folder_.path().string() + "; mkdir -p a b; " + command(arguments),
+                       folder_.path());
+    EXPECT_EQ(child.finish(), 2) << arguments;
+    EXPECT_EQ(child.output(), "") << arguments;
+    EXPECT_EQ(child.errors().find("orvalis: "), 0U) << child.errors();
+    EXPECT_NE(child.errors().find(says), std::string::npos) << child.errors();
   }
-  EXPECT_FALSE(std::filesystem::exists("d"))
+  EXPECT_FALSE(std::filesystem::exists(folder_ / "d"))
       << "wrong usage is reported before anything is created";
+}
+
+TEST_F(Tool, HelpNamesEveryCommandsOptions) {
   const Result help = run("epd --help");
   EXPECT_EQ(help.status, 0);
-  for (const char *word : {"--hangover", "--raw", "--channel", "arecord", "Exit status"})
+  EXPECT_EQ(run("help epd").out, help.out);
+  EXPECT_EQ(run("help").out, run("--help").out);
+  for (const char *word : {"-f,--format", "--hangover TIME=500ms", "arecord", "help input"})
     EXPECT_NE(help.out.find(word), std::string::npos) << word;
+  EXPECT_EQ(help.out.find("Excludes:"), std::string::npos);
+  EXPECT_NE(run("help input").out.find("Exit status:"), std::string::npos);
   EXPECT_NE(run("version").out.find("library 160705\n"), std::string::npos);
+}
+
+TEST_F(Tool, TimesAndShortOptionsMeanTheSame) {
+  const auto expected = epd("--hangover 200 --pad-after 1000 " + kNarrow);
+  EXPECT_EQ(epd("--hangover 200ms --pad-after 1s " + kNarrow), expected);
+  EXPECT_EQ(run("epd -f json -j 2 --hangover 0.2s --pad-after 1000.0 " + kNarrow).out,
+            run("epd --format json --hangover 200 --pad-after 1000 " + kNarrow).out);
+
+  const Result loud = run("denoise " + kNarrow + " " + (folder_ / "last.wav"));
+  const Result quiet = run("denoise -q -o " + (folder_ / "by_o.wav") + " " + kNarrow);
+  EXPECT_NE(loud.err, "");
+  EXPECT_EQ(quiet.err, "");
+  EXPECT_EQ(read_file(folder_ / "by_o.wav"), read_file(folder_ / "last.wav"));
+  EXPECT_NE(run("epd -q missing.wav").err, "");
 }
 
 TEST_F(Tool, LiveAudioIsReportedBeforeItEnds) {

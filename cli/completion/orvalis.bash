@@ -1,0 +1,15 @@
+# Completion for bash. The tool's own help says which commands and options there are.
+_orvalis() {
+  local word=${COMP_WORDS[COMP_CWORD]} names
+  COMPREPLY=()
+  if ((COMP_CWORD == 1)) || [[ ${COMP_WORDS[1]} == help ]]; then
+    names=$("${COMP_WORDS[0]}" --help 2>/dev/null | sed -n '/^Subcommands:/,/^$/s/^  \([a-z]*\) .*/\1/p')
+    ((COMP_CWORD == 1)) || names+=" input"
+  elif [[ $word == -* ]]; then
+    names=$("${COMP_WORDS[0]}" "${COMP_WORDS[1]}" --help 2>/dev/null |
+      sed -n 's/^  \(-[a-z],\)\{0,1\}\(--[a-z-]*\).*/\2/p')
+  fi
+  # Without names, and after options that take one, files.
+  [[ $names ]] && mapfile -t COMPREPLY < <(compgen -W "$names" -- "$word")
+}
+complete -o bashdefault -o default -F _orvalis orvalis

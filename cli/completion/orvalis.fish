@@ -1,0 +1,13 @@
+# Completion for fish. The tool's own help says which commands and options there are.
+function __orvalis_commands
+    orvalis --help 2>/dev/null | sed -n '/^Subcommands:/,/^$/s/^  \([a-z]*\) .*/\1/p'
+end
+
+function __orvalis_options
+    set -l words (commandline -opc)
+    orvalis $words[2] --help 2>/dev/null | sed -n 's/^  \(-[a-z],\)\{0,1\}\(--[a-z-]*\).*/\2/p'
+end
+
+complete -c orvalis -n 'test (count (commandline -opc)) -eq 1' -f -a '(__orvalis_commands)'
+complete -c orvalis -n '__fish_seen_subcommand_from help' -f -a '(__orvalis_commands; echo input)'
+complete -c orvalis -n 'test (count (commandline -opc)) -gt 1; and string match -q -- "-*" (commandline -ct)' -a '(__orvalis_options)'
