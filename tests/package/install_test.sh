@@ -43,6 +43,16 @@ check_installation() {
   check "$1: the consumer built by CMake" "$answer" "$("$made/consumer" <"$recording")"
   check "$1: the tool" '1 0.360 2.500 2.140' \
     "$("$2/bin/orvalis" epd --raw - <"$recording" | tail -n 1 | xargs)"
+  for file in bash-completion/completions/orvalis zsh/site-functions/_orvalis \
+      fish/vendor_completions.d/orvalis.fish; do
+    [ -s "$2/share/$file" ] || check "$1: $file" present missing
+  done
+  # The completion for bash knows the commands and the options that the tool has.
+  for typed in 'orvalis pro=process' 'orvalis help inp=input' 'orvalis vad --min-si=--min-silence'; do
+    check "$1: completion of ${typed%=*}" "${typed#*=}" "$(PATH=$2/bin:$PATH bash -c '
+      . "$1" && read -ra COMP_WORDS <<<"$2" && COMP_CWORD=$((${#COMP_WORDS[@]} - 1)) && _orvalis
+      echo "${COMPREPLY[*]}"' - "$2/share/bash-completion/completions/orvalis" "${typed%=*}")"
+  done
   [ -d "$build/java" ] || return 0
   for jar in orvalis orvalis-sources orvalis-javadoc orvalis-example; do
     [ -s "$2/share/java/$jar.jar" ] || check "$1: $jar.jar" present missing
@@ -65,7 +75,7 @@ done
 
 # The manual page knows every option of the help.
 commands=$("$work/moved/bin/orvalis" --help | sed -n '/^Subcommands:/,/^$/s/^  \([a-z][a-z]*\).*/\1/p')
-check "the commands" "epd vad denoise level process energy spectrum version" "$(echo $commands)"
+check "the commands" "epd vad denoise level process energy spectrum version help" "$(echo $commands)"
 for command in $commands; do
   options=$("$work/moved/bin/orvalis" "$command" --help | sed -n '/^Options:/,/^$/p' |
     grep -o -e '--[a-z][a-z-]*')
