@@ -12,6 +12,7 @@
 #include <filesystem>
 #include <iterator>
 #include <numeric>
+#include <string_view>
 
 #include "cli/audio_length.h"
 
@@ -32,6 +33,34 @@ bool streams(int format) {
     default:
       return false;
   }
+}
+
+/// For a shell.
+std::string quoted(const std::string &name) {
+  std::string text = "'";
+  for (const char c : name) text += c == '\'' ? "'\\''" : std::string(1, c);
+  return text + "'";
+}
+
+/// Refuses, with the way out, what begins like a format that cannot be read here.
+void check_content(const std::string &name, OpenAudio &audio) {
+  std::array<char, 8> bytes{};
+  audio.bytes->read_at(0, bytes);
+  const std::string_view head(bytes.data(), bytes.size());
+  const char *format = head.substr(4) == "ftyp"               ? "MP4 (or M4A)"
+                       : head.starts_with("\x1A\x45\xDF\xA3") ? "WebM (or Matroska)"
+                                                              : nullptr;
+  if (format != nullptr)
+    throw AudioError(
+        fmt::format("{} is not read here; pipe it in: ffmpeg -i {} -f wav - | orvalis "
+                    "COMMAND -",
+                    format, name == "-" ? "FILE" : quoted(name)));
+  const bool mp3 = head.starts_with("ID3") || (head[0] == '\xFF' && (head[1] & 0xE0) == 0xE0);
+  if (audio.piped && (mp3 || head.starts_with("fLaC")))
+    throw AudioError(
+        fmt::format("{} is not read from a pipe; give the file by its name, or put "
+                    "\"ffmpeg -i - -f wav - |\" before orvalis",
+                    mp3 ? "MP3" : "FLAC"));
 }
 
 /// libsndfile knows such files by their names only, which it is not told.
@@ -80,7 +109,10 @@ OpenAudio open_audio(const std::string &name, const AudioSettings &settings) {
     audio.info.format = SF_FORMAT_RAW | SF_FORMAT_PCM_16 | SF_ENDIAN_LITTLE;
     audio.info.samplerate = settings.raw_rate_hz;
     audio.info.channels = settings.raw_channels;
+    std::array<char, 4> head{};
+    audio.has_header = audio.bytes->read_at(0, head) && std::string_view(head.data(), 4) == "RIFF";
   } else {
+    check_content(name, audio);
     audio.promised_end = promised_end(*audio.bytes);
   }
 
@@ -133,6 +165,10 @@ std::span<const std::int16_t> AudioSource::read() {
   while (samples_.empty() && !ended_) {
     ended_ = !(untouched_ ? read_untouched() : read_converted());
     audio_.check_read();
+  }
+  for (std::size_t i = 0; i < samples_.size(); ++i) {
+    if (samples_[i] != INT16_MIN && samples_[i] != INT16_MAX) continue;
+    if (clipped_++ == 0) first_clipped_ = samples_read_ + static_cast<std::int64_t>(i / channels_);
   }
   samples_read_ += static_cast<std::int64_t>(samples_.size() / channels_);
   return samples_;

@@ -36,6 +36,7 @@ struct OpenAudio {
   std::unique_ptr<InputBytes> bytes;
   Sndfile file;
   SF_INFO info{};
+  bool has_header = false;                   ///< Though it is raw
   bool piped = false;                        ///< Can be read only once, and its length is unknown
   std::optional<std::int64_t> promised_end;  ///< In bytes, if the header has chunks
 
@@ -68,6 +69,13 @@ public:
   std::int64_t samples_read() const { return samples_read_; }
   double seconds_read() const { return static_cast<double>(samples_read_) / rate_hz(); }
 
+  /// Of the samples that read() has returned, those at full scale, and where the first one is.
+  std::int64_t clipped() const { return clipped_; }
+  double first_clipped_s() const { return static_cast<double>(first_clipped_) / rate_hz(); }
+
+  /// Whether raw input begins like a WAV file.
+  bool raw_has_header() const { return audio_.has_header; }
+
   /// Length of the whole input, if known.
   std::optional<double> length_seconds() const {
     if (audio_.piped) return std::nullopt;
@@ -92,6 +100,7 @@ private:
   std::size_t channels_;    ///< Of what read() returns
   sf_count_t frames_read_ = 0;
   std::int64_t samples_read_ = 0;
+  std::int64_t clipped_ = 0, first_clipped_ = 0;
   std::optional<Resampler> resampler_;
   std::vector<float> interleaved_, picked_, resampled_;
   std::vector<std::int16_t> interleaved16_, samples_;

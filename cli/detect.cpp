@@ -1,6 +1,7 @@
 #include "cli/detect.h"
 
 #include <MCRAvad.h>
+#include <fmt/format.h>
 #include <orvalis.h>
 
 #include <algorithm>
@@ -129,6 +130,17 @@ void Detector::report_new() {
   frames_.clear();
 }
 
+void note_opening(Job &job, const AudioSource &source) {
+  if (source.raw_has_header())
+    job.note("begins with a RIFF header, which --raw takes for samples; leave out --raw");
+}
+
+void note_clipping(Job &job, const AudioSource &source) {
+  if (source.clipped() > 0)
+    job.note(fmt::format("samples of the input at full scale: {}, the first at {:.3f} s",
+                         source.clipped(), source.first_clipped_s()));
+}
+
 void check_complete(Job &job, const AudioSource &source) {
   if (const std::string warning = source.check_complete(); !warning.empty()) job.note(warning);
 }
@@ -136,6 +148,7 @@ void check_complete(Job &job, const AudioSource &source) {
 void detect(Job &job, const DetectSettings &settings, Report &report) {
   AudioSource source(job.input(), settings.audio);
   const int rate_hz = source.rate_hz();
+  note_opening(job, source);
   report.begin_file(job.input(), rate_hz);
   std::optional<Detector> detector(
       std::in_place, job.input(), rate_hz, settings.detector,
@@ -149,6 +162,7 @@ void detect(Job &job, const DetectSettings &settings, Report &report) {
   const std::int64_t dumped = detector->samples_judged();
   detector.reset();
   if (settings.dump != nullptr) settings.dump->finish(job.input(), dumped);
+  note_clipping(job, source);
   // Last, so that of a damaged file everything that could be decided is reported.
   check_complete(job, source);
 }

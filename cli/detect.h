@@ -78,6 +78,12 @@ struct DetectSettings {
   const Dump *dump = nullptr;  ///< Of the detector's dump files, if it writes them
 };
 
+/// A warning about raw input that has a header.
+void note_opening(Job &job, const AudioSource &source);
+
+/// After the end of the job's input: how many of its samples are at full scale, if any.
+void note_clipping(Job &job, const AudioSource &source);
+
 /// After the end of the job's input: a warning if it is cut short and may be. Throws AudioError.
 void check_complete(Job &job, const AudioSource &source);
 

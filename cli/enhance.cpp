@@ -2,6 +2,7 @@
 
 #include <fmt/format.h>
 
+#include <cmath>
 #include <cstdint>
 #include <memory>
 #include <new>
@@ -74,7 +75,7 @@ private:
 class SignalPath {
 public:
   SignalPath(const std::string &input, const EnhanceSettings &settings, int rate_hz, Report &report)
-      : enhancer_(settings.enhancement) {
+      : enhancer_(settings.enhancement), gain_(std::pow(10.0, -settings.headroom_db / 20)) {
     if (settings.detect) {
       detector_.emplace(input, kEngineRate, settings.detector,
                         split_processed(settings.detector.split, input, kEngineRate), report);
@@ -86,6 +87,12 @@ public:
   /// The samples that are ready after a chunk of input.
   std::span<const std::int16_t> process(std::span<const std::int16_t> chunk) {
     enhanced_.clear();
+    if (gain_ != 1) {
+      scaled_.clear();
+      for (const std::int16_t sample : chunk)
+        scaled_.push_back(static_cast<std::int16_t>(std::lround(gain_ * sample)));
+      chunk = scaled_;
+    }
     enhancer_.push(chunk, enhanced_);
     if (detector_) detector_->push(enhanced_);
     if (!resampler_) return enhanced_;
@@ -115,23 +122,20 @@ private:
   Enhancer enhancer_;
   std::optional<Detector> detector_;
   std::optional<Resampler16> resampler_;
-  std::vector<std::int16_t> enhanced_, resampled_;
+  double gain_;  ///< At most 1
+  std::vector<std::int16_t> scaled_, enhanced_, resampled_;
 };
 
 double seconds(std::int64_t samples) { return static_cast<double>(samples) / kEngineRate; }
 
 void note_counts(Job &job, const EnhancementCounts &counts) {
-  const auto note_clipped = [&](const EnhancementCount &clipped, const char *where) {
-    if (clipped.count > 0)
-      job.note(fmt::format("samples of the {} at full scale: {}, the first at {:.3f} s", where,
-                           clipped.count, seconds(clipped.first)));
-  };
-  note_clipped(counts.clipped_in, "input");
   if (counts.loud_frames.count > 0)
     job.note(fmt::format("loud for {:.2f} s, first at {:.2f} s",
                          static_cast<double>(counts.loud_frames.count) / 100,
                          seconds(counts.loud_frames.first)));
-  note_clipped(counts.clipped_out, "output");
+  if (counts.clipped_out.count > 0)
+    job.note(fmt::format("samples of the output at full scale: {}, the first at {:.3f} s",
+                         counts.clipped_out.count, seconds(counts.clipped_out.first)));
 }
 
 }  // namespace
@@ -139,12 +143,16 @@ void note_counts(Job &job, const EnhancementCounts &counts) {
 void enhance(Job &job, const OutputTarget &target, const EnhanceSettings &settings,
              Report &report) {
   AudioSource source(job.input(), settings.audio);
+  note_opening(job, source);
   const int own_rate = source.source_rate_hz();
   const int rate = settings.keep_rate ? own_rate : kEngineRate;
   const auto output = open_audio_output(target, rate, settings.rules);
   if (rate != own_rate)
     job.note(fmt::format("written at {} Hz, converted from {} Hz (--keep-rate converts back)", rate,
                          own_rate));
+
+  if (settings.keep_rate && own_rate > kEngineRate)
+    job.note(fmt::format("written at {} Hz, but all above 8 kHz is gone", rate));
 
   SignalPath path(job.input(), settings, rate, report);
   for (auto chunk = source.read(); !chunk.empty(); chunk = source.read()) {
@@ -156,6 +164,7 @@ void enhance(Job &job, const OutputTarget &target, const EnhanceSettings &settin
   // Before the output gets its name: part of an input must not pass for the whole.
   check_complete(job, source);
   output->commit();
+  note_clipping(job, source);
   if (settings.enhancement.level == 1) note_counts(job, path.counts());
 }
 

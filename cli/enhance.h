@@ -13,6 +13,7 @@ struct EnhanceSettings {
   EnhancementSettings enhancement = ENHANCEMENT_SETTINGS_DEFAULT;
   bool detect = false;  ///< Report the utterances of the result
   DetectorSettings detector;
+  double headroom_db = 0;  ///< The input is scaled down by this before anything else
   bool keep_rate = false;  ///< Convert the result back to the input's rate
   OutputRules rules;
 };

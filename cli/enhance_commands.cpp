@@ -1,4 +1,6 @@
 // `orvalis denoise`, `orvalis level` and `orvalis process`: better audio from audio.
+#include <unistd.h>
+
 #include <filesystem>
 #include <limits>
 #include <memory>
@@ -68,6 +70,9 @@ int run_enhancement(EnhanceOptions &options, Console &console) {
   if (!is_streamed(targets.front().name))
     remove_leftovers(std::filesystem::path(targets.front().name).parent_path());
   if (destination == "-") {
+    if (isatty(STDOUT_FILENO) != 0)
+      throw CLI::ValidationError("OUTPUT",
+                                 "audio does not go to a terminal; give a file, or a pipe behind");
     if (protected_files.role_of("-") != nullptr)
       throw std::runtime_error("standard output: the file is an input");
     targets.front().standard_output = console.reserve_standard_output();
@@ -139,6 +144,15 @@ void add_suppression_options(CLI::App &command, EnhancementSettings &enhancement
       ->capture_default_str();
 }
 
+void add_headroom_option(CLI::App &command, double &headroom_db) {
+  command
+      .add_option("--headroom", headroom_db,
+                  "Make the input that much quieter first, so that\nless of it clips")
+      ->check(CLI::Range(0.0, 60.0).description(""))
+      ->type_name("DB")
+      ->capture_default_str();
+}
+
 /// Adds a command with the options that all of them have.
 CLI::App *add_command(CLI::App &app, const CommandTexts &texts,
                       const std::shared_ptr<EnhanceOptions> &options, Run &run) {
@@ -171,6 +185,7 @@ CLI::App *add_command(CLI::App &app, const CommandTexts &texts,
       add_audio_options(*command, settings.audio, "Channel to process, from 1, of several");
   command->add_flag("--mix", options->mix, "Process the mean of several channels")
       ->excludes(channel);
+  if (settings.enhancement.level == 1) add_headroom_option(*command, settings.headroom_db);
   if (settings.enhancement.suppression_db > 0)
     add_suppression_options(*command, settings.enhancement);
   command->callback([options, command, &run] {

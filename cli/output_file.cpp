@@ -1,6 +1,7 @@
 #include "cli/output_file.h"
 
 #include <fcntl.h>
+#include <fmt/format.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -50,6 +51,14 @@ bool can_be_empty(int sndfile_format) {
   return type != SF_FORMAT_FLAC && type != SF_FORMAT_OGG;
 }
 
+std::string unfit(const SampleFormat &format) {
+  if ((format.sndfile_format & SF_FORMAT_SUBMASK) == SF_FORMAT_OPUS)
+    return fmt::format("Opus holds 8000, 12000, 16000, 24000 or 48000 Hz, not {} Hz",
+                       format.rate_hz);
+  return fmt::format("the format cannot hold {} Hz in {} channel{}", format.rate_hz,
+                     format.channels, format.channels == 1 ? "" : "s");
+}
+
 }  // namespace
 
 ProtectedFiles::ProtectedFiles(const std::vector<std::string> &inputs) {
@@ -94,12 +103,12 @@ OutputFile::OutputFile(const std::string &path, const SampleFormat &format,
   info.samplerate = format.rate_hz;
   info.channels = format.channels;
   info.format = format.sndfile_format;
-  if (!sf_format_check(&info))
-    throw AudioError(path + ": such audio does not fit the file's format");
+  if (!sf_format_check(&info)) throw AudioError(path + ": " + unfit(format));
   {
     const auto lock = lock_opening();
     sndfile_.reset(sf_open_virtual(FileBytes::functions(), SFM_WRITE, &info, &*bytes_));
   }
+  if (!sndfile_ && bytes_->error() == 0) throw AudioError(path + ": " + unfit(format));
   check(sndfile_ != nullptr);
   // Without this, samples beyond full scale wrap around.
   sf_command(sndfile_.get(), SFC_SET_CLIPPING, nullptr, SF_TRUE);

@@ -1,4 +1,5 @@
 // The audio that `orvalis denoise`, `level` and `process` write.
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <cmath>
@@ -104,7 +105,8 @@ TEST_F(Enhanced, OutputIsNoLaterThanInput) {
     for (const std::string command : {"denoise", "process"}) {
       const Result kept = run(command + " --force --keep-rate " + input + " " + output);
       EXPECT_EQ(kept.status, 0) << kept.err;
-      EXPECT_EQ(kept.err.find("written at"), std::string::npos);
+      EXPECT_EQ(kept.err.find("converted from"), std::string::npos);
+      EXPECT_EQ(kept.err.find("all above 8 kHz is gone") != std::string::npos, rate_hz > 16000);
       EXPECT_EQ(read_audio(output).info.samplerate, rate_hz);
       EXPECT_EQ(samples_in(output).size(), samples.size());
       EXPECT_EQ(lag_of(samples_in(output), samples), 0) << command << rate_hz;
@@ -128,8 +130,8 @@ TEST_F(Enhanced, JobsChangeNothing) {
   const std::string out = folder_ / "out";
   std::filesystem::create_directory(out);
   for (const std::string jobs : {"1", "4"}) {
-    EXPECT_EQ(run("denoise --force --jobs " + jobs + " " + single + out).err, "");
-    EXPECT_EQ(run("denoise --mics 2 --force --jobs " + jobs + " " + paired + out).err, "");
+    EXPECT_EQ(run("denoise -q --force --jobs " + jobs + " " + single + out).err, "");
+    EXPECT_EQ(run("denoise -q --mics 2 --force --jobs " + jobs + " " + paired + out).err, "");
     EXPECT_EQ(names_in(out).size(), 8u);
     for (const std::string &name : names_in(out))
       EXPECT_EQ(samples_in(out + "/" + name),
@@ -195,6 +197,16 @@ TEST_F(Enhanced, LevelReportsWhatIsLoudOrClipped) {
                             ": loud for 0.50 s, first at 1.00 s\n" + name +
                             clipping_note("output", enhanced(kLevel, samples)));
 
+  // With headroom the input is scaled first; its own samples are counted all the same.
+  Pcm halved;
+  for (const std::int16_t sample : samples)
+    halved.push_back(static_cast<std::int16_t>(std::lround(sample * std::pow(10.0, -0.3))));
+  EXPECT_EQ(through("level --headroom 6", samples), enhanced(kLevel, halved));
+  EXPECT_EQ(through("level --headroom 0", samples), enhanced(kLevel, samples));
+  for (const std::string command : {"denoise ", "epd ", "vad "})
+    EXPECT_EQ(run(command + file + (command == "denoise " ? " -" : "")).err,
+              name + clipping_note("input", samples));
+
   samples.resize(16000);
   EXPECT_EQ(run("level " + wav("quiet.wav", samples) + " " + (folder_ / "out.wav")).err, "");
 }
@@ -226,6 +238,29 @@ TEST_F(Enhanced, ProcessIsDenoiseThenLevelThenEpd) {
     EXPECT_EQ(samples_of(streamed.out), samples_in(folder_ / "plain.wav"));
     EXPECT_EQ(streamed.err, plain.out + plain.err);
   }
+}
+
+TEST_F(Enhanced, FormatsThatDoNotFitAreRefusedWithTheWayOut) {
+  const std::string pipe = "ffmpeg -i - -f wav - |", rest(100, '\0');
+  const auto error_of = [&](const std::string &arguments, const std::string &input = {}) {
+    const Result result = run(arguments, input);
+    EXPECT_NE(result.status, 0) << arguments;
+    return result.err;
+  };
+  const auto has = [](const std::string &text) { return testing::HasSubstr(text); };
+  const std::string mp4 = write("it's.wav", std::string(4, '\0') + "ftypM4A " + rest);
+  EXPECT_THAT(error_of("epd \"" + mp4 + "\""), has("it'\\''s.wav' -f wav - | orvalis"));
+  EXPECT_THAT(error_of("epd -", "\x1A\x45\xDF\xA3" + rest), has("WebM"));
+  for (const std::string head : {"fLaC", "ID3", "\xFF\xFB"})
+    EXPECT_THAT(error_of("epd -", head + rest), has(pipe));
+  const std::string odd = wav("odd.wav", Pcm(4410), 44100);
+  EXPECT_THAT(error_of("denoise --keep-rate " + odd + " " + (folder_ / "odd.opus")),
+              has("Opus holds 8000, 12000, 16000, 24000 or 48000 Hz, not 44100 Hz"));
+  EXPECT_THAT(run("epd --raw " + odd).err, has("RIFF header"));
+  ChildProcess shown("script -qec '" + command("denoise " + kWide + " -") + "' /dev/null",
+                     folder_.path());
+  shown.finish();
+  EXPECT_THAT(shown.output(), has("audio does not go to a terminal"));
 }
 
 }  // namespace

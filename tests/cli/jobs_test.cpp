@@ -107,14 +107,16 @@ TEST_F(Jobs, LongWorkIsShownOnATerminalAndWiped) {
     EXPECT_GT(length, 0) << seen;
     EXPECT_NEAR(percent, seconds / 57.114 * 100, 2.5);
     EXPECT_GT(speed, 0);
-    EXPECT_TRUE(seen.ends_with("all.wav\r\x1b[K")) << seen;
+    // The line is gone before anything else is printed.
+    const std::string wiped = "all.wav\r\x1b[K";
+    EXPECT_TRUE(seen.substr(seen.rfind(wiped)).starts_with(wiped + "orvalis: ")) << seen;
   }
 
   ChildProcess unseen(command(frames) + slow, folder_.path());
   EXPECT_EQ(unseen.finish(), 0);
-  EXPECT_EQ(unseen.errors(), "");
+  EXPECT_EQ(unseen.errors().find("real time"), std::string::npos);
   run("epd " + kWide + " 2>" + terminal.name());
-  EXPECT_EQ(terminal.shown(), "") << "short work needs no line";
+  EXPECT_EQ(terminal.shown().find("real time"), std::string::npos) << "short work needs no line";
 
   // The line is cleared before anything is printed on the same terminal.
   ChildProcess live(command("epd --raw --rate 8000 - >") + terminal.name() + " 2>&1",

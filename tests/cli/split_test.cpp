@@ -97,7 +97,7 @@ TEST_F(Split, FilesThatAreThereAreReplacedOnlyByForce) {
   const std::string parts = folder_ / "parts";
   fs::create_directory(parts);
   const std::string there = write("parts/all-002.wav", "a letter");
-  const Result refused = run("epd --split " + parts + " " + kNarrow + " " + kWide);
+  const Result refused = run("epd -q --split " + parts + " " + kNarrow + " " + kWide);
   EXPECT_EQ(refused.status, 1);
   EXPECT_EQ(refused.err,
             "orvalis: " + kNarrow + ": " + there + ": the file exists; --force replaces it\n");

@@ -48,7 +48,7 @@ protected:
 
   /// The utterances, of a run that must go well and quietly.
   std::vector<Json> epd(const std::string &arguments, const std::string &input = {}) const {
-    const Result result = run("epd --format json " + arguments, input);
+    const Result result = run("epd -q --format json " + arguments, input);
     EXPECT_EQ(result.status, 0) << arguments;
     EXPECT_EQ(result.err, "") << arguments;
     return json_lines(result.out);

@@ -126,7 +126,7 @@ TEST_F(Tool, LogLinesAreShownOnRequestOnly) {
   const Result logged = run("epd --log " + kWide);
   EXPECT_NE(logged.err.find("/Orvalis: "), std::string::npos);
   EXPECT_EQ(logged.out, run("epd " + kWide).out);
-  EXPECT_EQ(run("epd --frames " + kWide).err, "");
+  EXPECT_EQ(run("epd -q --frames " + kWide).err, "");
 }
 
 TEST_F(Tool, SilenceAndNoAudioAreNoErrors) {
@@ -155,7 +155,7 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersProcessed) {
                                         write("cut.flac", flac.substr(0, flac.size() / 2))};
   std::string arguments = kWide;
   for (const std::string &name : bad) arguments += " " + name + " " + kWide;
-  const Result result = run("epd --format json " + arguments);
+  const Result result = run("epd -q --format json " + arguments);
   EXPECT_EQ(result.status, 1);
 
   std::istringstream messages(result.err);

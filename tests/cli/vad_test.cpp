@@ -53,7 +53,7 @@ TEST_F(Vad, TraceHoldsDecisionsAndTheirReasons) {
       SCOPED_TRACE(voice.options + (" " + file));
       const Decisions decisions = decisions_of(voice, pcm);
       const Result result =
-          run(std::string("vad --trace --format json ") + voice.options + " " + file);
+          run(std::string("vad -q --trace --format json ") + voice.options + " " + file);
       EXPECT_EQ(result.err, "");
       const auto lines = json_lines(result.out);
       ASSERT_EQ(lines.size(), decisions.size());
