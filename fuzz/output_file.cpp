@@ -20,8 +20,8 @@ using orvalis::fuzz::require;
 
 /// Few names, so that they meet; now and then any bytes.
 std::string name_of(orvalis::fuzz::Input &input) {
-  static const char *const kNames[] = {"a.wav", "b.flac", "a-001.wav", "c", "c/a.wav", "./a.wav",
-                                       "d/",    "link",   "link/a.wav", "b.raw"};
+  static const char *const kNames[] = {"a.wav",   "b.flac", "a-001.wav", "c",          "c/a.wav",
+                                       "./a.wav", "d/",     "link",      "link/a.wav", "b.raw"};
   const std::uint8_t choice = input.byte();
   if (choice < 250) return kNames[choice % std::size(kNames)];
   std::string name = "x";
