@@ -1,5 +1,4 @@
-// The fixed-point transforms: step by step over the exported operators (result and flags), and
-// against transforms in double precision.
+// The fixed-point transforms against transforms in double precision.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -8,9 +7,7 @@
 #include <numbers>
 #include <vector>
 
-#include "basic_op.h"
 #include "fixed_fft.h"
-#include "tests/support/flag_words.h"
 #include "tests/support/random.h"
 
 namespace orvalis::test {
@@ -18,16 +15,15 @@ namespace {
 
 using Buffer = std::vector<int16_t>;
 
-/// One way to call the transforms, with its tables.
+/// One way to call the transforms.
 struct Family {
   const char *name;
-  Copy copy;
+  bool is_ns;
   int32_t band;
   int size;
-  const int16_t *phs, *ii;
 
   Buffer transform(bool real, Buffer x, int16_t isign) const {
-    if (copy == NS) {
+    if (is_ns) {
       (real ? r_fft_ns : c_fft_ns)(x.data(), isign);
     } else {
       (real ? r_fft_epd : c_fft_epd)(x.data(), isign, band);
@@ -36,72 +32,10 @@ struct Family {
   }
 };
 
-const Family families[] = {{"wide", PLAIN, 0, 256, phs_tbl_WB, ii_table_WB},
-                           {"narrow", PLAIN, 1, 128, phs_tbl_NB, ii_table_NB},
-                           {"narrow by -1", PLAIN, -1, 128, phs_tbl_NB, ii_table_NB},
-                           {"ns", NS, 0, 256, phs_tbl_256, ii_table_256}};
-
-// ---- One operator after another ----
-
-int16_t halved(int32_t a, int32_t b) { return round_BOP(L_shr(L_add(a, b), 1)); }
-
-void complex_steps(const Family &family, Buffer &x, bool forward) {
-  const int size = family.size;
-  for (int i = 0, j = 0; i <= size - 4; i += 2) {
-    if (j > i) std::swap_ranges(&x[i], &x[i] + 2, &x[j]);
-    int k = size / 2;
-    for (; j >= k; k /= 2) j -= k;
-    j += k;
-  }
-  for (int stage = 0; 2 << stage < size; ++stage) {
-    const int jj = 2 << stage;
-    for (int first = 0; first < jj; first += 2) {
-      const int16_t c = family.phs[first * family.ii[stage]];
-      const int16_t s = family.phs[first * family.ii[stage] + 1];
-      for (int k = first; k < size; k += 2 * jj) {
-        int16_t *const near = &x[k], *const far = &x[k + jj];
-        const int32_t re_c = L_mult(far[0], c), im_s = L_mult(far[1], s);
-        const int16_t tr = round_BOP(forward ? L_sub(re_c, im_s) : L_add(re_c, im_s));
-        const int32_t im_c = L_mult(far[1], c), re_s = L_mult(far[0], s);
-        const int16_t ti = round_BOP(forward ? L_add(im_c, re_s) : L_sub(im_c, re_s));
-        const auto scaled = [&](int16_t sum) {
-          return static_cast<int16_t>(forward ? sum >> 1 : sum);
-        };
-        far[0] = scaled(sub(near[0], tr));
-        far[1] = scaled(sub(near[1], ti));
-        near[0] = scaled(add(near[0], tr));
-        near[1] = scaled(add(near[1], ti));
-      }
-    }
-  }
-}
-
-void split_steps(const Family &family, Buffer &x, bool forward) {
-  const int16_t t0 = x[0], t1 = x[1];
-  x[0] = static_cast<int16_t>(add(t0, t1) >> (forward ? 0 : 1));
-  x[1] = static_cast<int16_t>(sub(t0, t1) >> (forward ? 0 : 1));
-  const int16_t *P = family.phs;
-  for (int i = 2; i <= family.size / 2; i += 2) {
-    const int j = family.size - i;
-    const int32_t re = L_deposit_h(add(x[i], x[j]));
-    const int32_t im = L_deposit_h(sub(x[i + 1], x[j + 1])), im_negated = L_negate(im);
-    const int16_t sum = add(x[i + 1], x[j + 1]), difference = sub(x[j], x[i]);
-    const int16_t f2r = forward ? sum : negate(sum);
-    const int16_t f2i = forward ? difference : negate(difference);
-    const auto times = [&](int16_t factor, int at) { return L_mult(factor, P[at]); };
-    if (forward) {
-      x[i] = halved(re, L_sub(times(f2r, i), times(f2i, i + 1)));
-      x[i + 1] = halved(im, L_add(times(f2i, i), times(f2r, i + 1)));
-      x[j] = halved(re, L_add(times(f2r, j), times(f2i, j + 1)));
-      x[j + 1] = halved(im_negated, L_add(L_negate(times(f2i, j)), times(f2r, j + 1)));
-    } else {
-      x[i] = halved(re, L_add(times(f2r, i), times(f2i, i + 1)));
-      x[i + 1] = halved(im, L_sub(times(f2i, i), times(f2r, i + 1)));
-      x[j] = halved(re, L_sub(times(f2r, j), times(f2i, j + 1)));
-      x[j + 1] = halved(im_negated, L_negate(L_add(times(f2i, j), times(f2r, j + 1))));
-    }
-  }
-}
+const Family families[] = {{"wide", false, 0, 256},
+                           {"narrow", false, 1, 128},
+                           {"narrow by -1", false, -1, 128},
+                           {"ns", true, 0, 256}};
 
 Buffer random_buffer(std::mt19937_64 &random, int size, int amplitude) {
   std::uniform_int_distribution<int> sample(-amplitude, amplitude);
@@ -109,51 +43,6 @@ Buffer random_buffer(std::mt19937_64 &random, int size, int amplitude) {
   for (int16_t &value : x) value = static_cast<int16_t>(sample(random));
   return x;
 }
-
-/// Silence, full scale of one sign, of both, and noise of every loudness.
-std::vector<Buffer> signals(std::mt19937_64 &random, int size) {
-  std::vector<Buffer> all{Buffer(size, 0), Buffer(size, INT16_MAX), Buffer(size, INT16_MIN)};
-  for (int period = 1; period < size; period *= 2) {
-    Buffer &square = all.emplace_back(size);
-    for (int i = 0; i < size; ++i) square[i] = i / period % 2 ? INT16_MIN : INT16_MAX;
-    all.push_back(random_buffer(random, size, 1 << (period % 15)));
-    Buffer &pulse = all.emplace_back(size, int16_t{0});
-    pulse[period] = INT16_MIN;
-  }
-  for (int i = 0; i < 60; ++i) {
-    all.push_back(random_buffer(random, size, 32767 >> i % 15));
-    Buffer &clipped = all.emplace_back(random_buffer(random, size, 32767));
-    for (int16_t &x : clipped) x = x < 0 ? INT16_MIN : INT16_MAX;
-  }
-  return all;
-}
-
-TEST(FixedFft, EveryStepAndFlagInOrder) {
-  std::mt19937_64 random = seeded_generator();
-  int flags_raised = 0;
-  for (const Family &family : families)
-    for (const Buffer &input : signals(random, family.size))
-      for (const int16_t isign : {1, 0, -1, 2})
-        for (const bool real : {false, true})
-          for (const int standing : {0, 1}) {
-            const bool forward = isign == 1;
-            write_flags(flags_of(PLAIN, standing, standing));
-            Buffer expected = input;
-            if (real && !forward) split_steps(family, expected, false);
-            complex_steps(family, expected, forward);
-            if (real && forward) split_steps(family, expected, true);
-            const int overflow = Overflow, carry = Carry;
-            flags_raised += overflow;
-
-            write_flags(flags_of(family.copy, standing, standing));
-            SCOPED_TRACE(testing::Message() << family.name << ' ' << isign << ' ' << real);
-            ASSERT_EQ(family.transform(real, input, isign), expected);
-            ASSERT_EQ(read_flags(), flags_of(family.copy, overflow, carry));
-          }
-  EXPECT_GT(flags_raised, 0) << "no signal left the flag raised";
-}
-
-// ---- Against double precision ----
 
 using Spectrum = std::vector<std::complex<double>>;
 

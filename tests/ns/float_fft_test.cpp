@@ -81,16 +81,6 @@ TEST(FloatFft, IsExactOnImpulseAndConstant) {
   EXPECT_EQ(data, expected);
 }
 
-TEST(FloatFft, HasTheTwiddleFactorsOfTheCLibrary) {
-  for (int k = 0; k < 256; ++k) {
-    // Not a constant, or the compiler would round for the C library.
-    const volatile double angle = k * -0.01227184630308513;
-    EXPECT_EQ(twiddles[k].re, std::cos(angle)) << k;
-    EXPECT_EQ(twiddles[k].im, std::sin(angle)) << k;
-  }
-  EXPECT_TRUE(std::signbit(twiddles[0].im));
-}
-
 // ---- Algebra ----
 
 using Elements = std::array<Wide, 4>;  // row by row
