@@ -61,12 +61,13 @@ int run_enhancement(EnhanceOptions &options, Console &console) {
   if (destination == "/dev/stdout") destination = "-";  // keeps the report out of the audio
   check_inputs(inputs);
   const auto report = make_report(options.report, "--report", inputs.size(), console);
-  auto [targets, folder] =
+  OutputPlan plan =
       plan_outputs(inputs, destination, options.format, options.settings.detector.split.folder);
+  std::vector<OutputTarget> &targets = plan.targets;
   ProtectedFiles protected_files(inputs);
   const EnhanceSettings settings = settings_of(options, protected_files);
   prepare_split(settings.detector.split, inputs);
-  if (!folder.empty()) make_folder("OUTPUT", folder);
+  if (!plan.folder.empty()) make_folder("OUTPUT", plan.folder);
   if (!is_streamed(targets.front().name))
     remove_leftovers(std::filesystem::path(targets.front().name).parent_path());
   if (destination == "-") {
