@@ -16,6 +16,7 @@
 namespace orvalis {
 
 inline constexpr int kMaxChannels = 21;
+inline constexpr int kPaddedChannels = 24;  ///< whole vectors of eight
 inline constexpr int kMaxFrameSamples = 160;
 inline constexpr int kMaxOverlap = 48;
 inline constexpr int kMaxTransformSize = 256;
@@ -26,10 +27,11 @@ struct ChannelBins {
   Word16 last;
 };
 
-/// Division of a channel's power by its width: a right shift, or a factor in Q15.
-struct ChannelScale {
-  enum Kind : Word16 { kMultiply = 0, kShift = 1 } kind;
-  Word16 value;
+/// Division of the channels' powers by their widths: by a factor, or by a right shift where the
+/// factor is 0.
+struct ChannelScales {
+  Word32 factor_q15[kPaddedChannels];
+  Word32 shift[kPaddedChannels];
 };
 
 /// Sizes, tables and thresholds of one user of the analysis.
@@ -38,9 +40,9 @@ struct ChannelPlan {
   int frame_samples;
   int overlap;  ///< samples of the previous frame in front of this one
   const ChannelBins *bins;
-  const ChannelScale *scales;
-  const Word16 *window_edge;  ///< rising edge in Q15, `overlap` values
-  Word32 window_flat_q15;     ///< between the edges; 32768 is 1
+  const ChannelScales *scales;
+  const Word16 *window;  ///< in Q15, frame_samples + overlap values
+  bool window_is_flat;   ///< 1 between the edges, where `window` is not read
   const TransformPlan *transform;
   Word32 energy_floor;
   int initial_noise_frames;    ///< frames at the start whose energies become the noise
@@ -92,6 +94,8 @@ struct ChannelFindings {
   Word32 total_energy;
   Word64 unclamped_energy;  ///< sum of the channel energies before their floor
   bool is_noise;            ///< IS-127's update_flag: the frame updates the noise
+
+  bool operator==(const ChannelFindings &) const = default;
 };
 
 // --- Levels --------------------------------------------------------------------------------------
@@ -99,6 +103,9 @@ struct ChannelFindings {
 /// The 10 of 10 log10 in Q10, as IS-127 has it: 10.03, which is 0.3 % more than 10. Turns a log10
 /// in Q26 into dB in Q21, whose high half is Q5.
 inline constexpr Word16 kDecibels = 10270;
+
+/// log10(2^23) in Q26: fnLog10 is relative to 2^31, log10_energy to 2^8.
+inline constexpr Word32 kLog10Of2To23 = 464640964;
 
 /// log10(energy / 256) in Q26.
 Word32 log10_energy(Flags &flags, Word32 energy);
@@ -110,9 +117,6 @@ Word32 sum_energies(Flags &flags, const Word32 *energy, int channels);
 
 // --- The analysis --------------------------------------------------------------------------------
 
-/// In the first frames the noise is the channel energy, but at least 4096.
-void initialise_noise(const ChannelPlan &plan, ChannelState &state);
-
 /// Alpha of the long-term levels, the weight of the past: 0.99 for loud frames, 0.5 for those that
 /// are 20 dB quieter.
 Word16 long_term_alpha_q15(Flags &flags, const ChannelPlan &plan, Word32 total);
@@ -123,12 +127,12 @@ bool decide_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state,
                   const ChannelFindings &found);
 
 /// Normalises a frame of plan.frame_samples, puts the previous frame's overlap in front of it,
-/// pre-emphasises, windows and transforms it to a `spectrum` of plan.transform->size values.
-/// Updates energies, long-term levels and counters and, in the first frames, the noise.
+/// pre-emphasises, windows and transforms it. Updates energies, long-term levels and counters and,
+/// in the first frames, the noise, which then is the channel energy, but at least 4096.
 ChannelFindings analyse_frame(Flags &flags, const ChannelPlan &plan, ChannelState &state,
-                              const Word16 *frame, Word16 *spectrum);
+                              const Word16 *frame);
 
-/// Updates the noise: 0.9 of the past and 0.1 of this frame.
-void track_noise(Flags &flags, const ChannelPlan &plan, ChannelState &state);
+/// Updates the noise: 0.9 of the past and 0.1 of this frame. Leaves the flags as they are.
+void track_noise(const ChannelPlan &plan, ChannelState &state);
 
 }  // namespace orvalis

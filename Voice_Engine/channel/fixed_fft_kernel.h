@@ -7,12 +7,27 @@
 
 namespace orvalis {
 
+/// What a pair of mirrored bins k and N/2 - k multiplies its odd parts with, k = 1..N/4: pairs of
+/// factors in Q15, for the real and the imaginary part of either bin.
+struct SplitFactors {
+  const Word16 *low_re;
+  const Word16 *low_im;
+  const Word16 *high_re;
+  const Word16 *high_im;
+};
+
 /// Size and tables of one transform.
 struct TransformPlan {
   Word32 size;             ///< N, the number of 16-bit values in the buffer
-  Word32 stages;           ///< log2(N / 2)
   const Word16 *twiddles;  ///< N values: cos, -sin in Q15
-  const Word16 *steps;     ///< twiddle step of each stage
+  // The twiddle factors c + j s of the last stages, 8, 16 ... N/4 of them one after the other, as
+  // pairs of -c and s, and of s and c.
+  const Word16 *minus_cos_sin;
+  const Word16 *sin_cos;
+  // The same of the stage with 8, each one eight times, in bit-reversed order.
+  const Word16 *halves_minus_cos_sin;
+  const Word16 *halves_sin_cos;
+  SplitFactors split[2];  ///< of the forward transform, of the inverse
 };
 
 extern const TransformPlan kWideTransform;         ///< of the detector: 256 values

@@ -3,6 +3,7 @@
 
 #include "Voice_Engine/basic_op/constexpr_math.h"
 #include "Voice_Engine/basic_op/hidden_table.h"
+#include "Voice_Engine/basic_op/operators.h"
 #include "Voice_Engine/channel/fixed_fft_kernel.h"
 
 namespace {
@@ -67,12 +68,92 @@ ORVALIS_EXPORT_TABLE(BandPointers, phs_tbl);
 ORVALIS_EXPORT_TABLE(BandPointers, ii_table);
 
 namespace orvalis {
+namespace {
 
-constinit const TransformPlan kWideTransform = {256, 7, orvalis_phs_tbl_WB.data(),
-                                                orvalis_ii_table_WB.data()};
-constinit const TransformPlan kNarrowTransform = {128, 6, orvalis_phs_tbl_NB.data(),
-                                                  orvalis_ii_table_NB.data()};
-constinit const TransformPlan kSuppressionTransform = {256, 7, orvalis_phs_tbl_256.data(),
-                                                       orvalis_ii_table_256.data()};
+/// Twiddle factors in the order and the pairs in which the lanes use them.
+template <std::size_t kSize>
+struct LaneTables {
+  static constexpr std::size_t kBins = kSize / 4;
+
+  struct Split {
+    Table<2 * kBins> low_re, low_im, high_re, high_im;
+  };
+
+  Table<kSize - 16> minus_cos_sin{};
+  Table<kSize - 16> sin_cos{};
+  Table<128> halves_minus_cos_sin{};
+  Table<128> halves_sin_cos{};
+  Split split[2]{};
+
+  explicit constexpr LaneTables(const Table<kSize> &twiddles) {
+    std::size_t at = 0;
+    for (std::size_t factors = 8; factors < kSize / 2; factors *= 2) {
+      for (std::size_t j = 0; j < factors; ++j, at += 2)
+        put_rotation(twiddles, j * kSize / (2 * factors), at, minus_cos_sin, sin_cos);
+    }
+    for (std::size_t lane = 0; lane < 64; ++lane) {
+      const std::size_t vector = lane / 8;
+      const std::size_t j = (vector & 1) * 4 + (vector & 2) + vector / 4;
+      put_rotation(twiddles, j * kSize / 16, 2 * lane, halves_minus_cos_sin, halves_sin_cos);
+    }
+    for (std::size_t k = 1; k <= kBins; ++k) {
+      const Word16 c = twiddles[2 * k];
+      const Word16 s = twiddles[2 * k + 1];
+      const Word16 high_c = twiddles[kSize - 2 * k];
+      const Word16 high_s = twiddles[kSize - 2 * k + 1];
+      // The inverse turns the other way. The middle bin, where a sine may have no negative, is
+      // computed apart.
+      for (Split &to : split) {
+        const bool forward = &to == &split[0];
+        const Word16 turn = forward ? s : negate(s);
+        const Word16 high_turn = forward ? high_s : negate(high_s);
+        put_pair(to.low_re, k - 1, c, negate(turn));
+        put_pair(to.low_im, k - 1, turn, c);
+        put_pair(to.high_re, k - 1, high_c, high_turn);
+        put_pair(to.high_im, k - 1, high_turn, negate(high_c));
+      }
+    }
+  }
+
+private:
+  template <class Pairs>
+  static constexpr void put_pair(Pairs &pairs, std::size_t at, Word16 first, Word16 second) {
+    pairs[2 * at] = first;
+    pairs[2 * at + 1] = second;
+  }
+  template <class Pairs>
+  static constexpr void put_rotation(const Table<kSize> &twiddles, std::size_t factor,
+                                     std::size_t at, Pairs &minus_cos_sin, Pairs &sin_cos) {
+    const Word16 c = twiddles[2 * factor];
+    const Word16 s = twiddles[2 * factor + 1];
+    put_pair(minus_cos_sin, at / 2, negate(c), s);
+    put_pair(sin_cos, at / 2, s, c);
+  }
+};
+
+template <std::size_t kSize>
+constexpr TransformPlan plan_of(const Table<kSize> &twiddles, const LaneTables<kSize> &lanes) {
+  const auto factors = [](const auto &of) {
+    return SplitFactors{of.low_re.data(), of.low_im.data(), of.high_re.data(), of.high_im.data()};
+  };
+  return {kSize,
+          twiddles.data(),
+          lanes.minus_cos_sin.data(),
+          lanes.sin_cos.data(),
+          lanes.halves_minus_cos_sin.data(),
+          lanes.halves_sin_cos.data(),
+          {factors(lanes.split[0]), factors(lanes.split[1])}};
+}
+
+constexpr LaneTables<256> kWideLanes(make_twiddles<256>(kRounded));
+constexpr LaneTables<128> kNarrowLanes(make_twiddles<128>(kRounded));
+constexpr LaneTables<256> kSuppressionLanes(make_twiddles<256>(kTruncated));
+
+}  // namespace
+
+constinit const TransformPlan kWideTransform = plan_of(orvalis_phs_tbl_WB, kWideLanes);
+constinit const TransformPlan kNarrowTransform = plan_of(orvalis_phs_tbl_NB, kNarrowLanes);
+constinit const TransformPlan kSuppressionTransform =
+    plan_of(orvalis_phs_tbl_256, kSuppressionLanes);
 
 }  // namespace orvalis

@@ -7,21 +7,9 @@
 
 namespace orvalis {
 
-/// Whether a frame holds more than 60 zeros in a row. Non-zero samples of magnitude up to 4 are
-/// added to `small_samples`; the scan ends with the 61st zero.
-inline bool is_null_frame(const Word16 *frame, int samples, Word32 &small_samples) {
-  constexpr int kMaxZeros = 60;
-  int zeros = 0;
-  for (int i = 0; i < samples; ++i) {
-    if (frame[i] == 0) {
-      if (++zeros > kMaxZeros) return true;
-    } else {
-      zeros = 0;
-      if (frame[i] >= -4 && frame[i] <= 4) count_up(small_samples);
-    }
-  }
-  return false;
-}
+/// Whether a frame, of a multiple of 16 samples, holds more than 60 zeros in a row. Non-zero
+/// samples of magnitude up to 4 are added to `small_samples`; the scan ends with the 61st zero.
+bool is_null_frame(const Word16 *frame, int samples, Word32 &small_samples);
 
 /// What a driver logs while suppression waits.
 struct SettlingTexts {

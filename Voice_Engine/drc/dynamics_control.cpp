@@ -1,11 +1,9 @@
 #include "Voice_Engine/drc/dynamics_control.h"
 
-#include <algorithm>
 #include <cstdlib>
 #include <iterator>
 #include <numeric>
 
-#include "Voice_Engine/basic_op/double_precision.h"
 #include "Voice_Engine/platform/dump_file.h"
 #include "Voice_Engine/platform/log.h"
 
@@ -13,7 +11,6 @@ namespace orvalis {
 namespace {
 
 constexpr Word32 kRate = 16000;
-constexpr Word16 kLoudMagnitude = 8192;  // a quarter of full scale
 constexpr Word32 kMaxLoudSamples = 100;
 
 /// Gains in Q11 by the peak in 63rds of full scale: 2048 (63 / i)^(2/3), which compresses 3:1, up
@@ -25,27 +22,6 @@ constexpr Word16 kGainCurve[64] = {
     2455, 2422, 2389, 2358, 2327, 2298, 2270, 2242, 2215, 2189, 2164, 2140, 2116, 2093, 2070, 2048};
 
 Word16 frame_length(Word32 samplingRate) { return samplingRate == kRate ? 160 : 80; }
-
-/// The gain for a peak, between two entries of the curve; its high half is Q11.
-Word32 target_gain(Flags &flags, const Word16 *curve, Word16 peak) {
-  const DoubleWord at = L_Extract(flags, L_mult(flags, peak, 63));
-  const Word32 upper = L_mult(flags, at.lo, curve[at.hi + 1]);
-  return L_mac(flags, upper, sub(flags, MAX_16, at.lo), curve[at.hi]);
-}
-
-/// Moves the envelope towards the target sample by sample, and applies it.
-void follow(Flags &flags, DrcInstance &drc, Word32 target, Word16 *frame) {
-  Word32 envelope = drc.gainEnvelope;
-  for (Word16 *sample = frame; sample != frame + drc.frameLength; ++sample) {
-    const Word32 difference = L_sub(flags, target, envelope);
-    const Word16 coefficient = difference < 1 ? drc.fallCoefficient : drc.riseCoefficient;
-    const Word32 step = Mpy_32_16(flags, L_Extract(flags, difference), coefficient);
-    envelope = L_add(flags, envelope, step);
-    const Word16 gain_q11 = mult_r(flags, drc.outputScale, extract_h(envelope));
-    *sample = round_BOP(flags, L_shl(flags, L_mult(flags, *sample, gain_q11), 4));
-  }
-  drc.gainEnvelope = envelope;
-}
 
 }  // namespace
 
@@ -95,11 +71,9 @@ Word32 EnvBasedDynamicsControl(Flags &flags, DrcInstance *drc, Word16 *frame) {
   }
   write_dump(before, frame, drc->frameLength);
 
-  Word16 loud = 0;
-  const Word16 peak = DetectPeakVal(frame, drc->frameLength, &loud);
+  const Word16 loud = level_frame(flags, *drc, frame);
   drc->loudRingIndex = static_cast<Word16>((drc->loudRingIndex + 1) % 10);
   drc->loudRing[drc->loudRingIndex] = loud;
-  follow(flags, *drc, target_gain(flags, drc->gainCurve, peak), frame);
 
   close_dump(before);
   write_dump(after, frame, drc->frameLength);
@@ -107,16 +81,6 @@ Word32 EnvBasedDynamicsControl(Flags &flags, DrcInstance *drc, Word16 *frame) {
   // The newest frame is in the ring and counts once more.
   const Word32 recent = std::accumulate(std::begin(drc->loudRing), std::end(drc->loudRing), loud);
   return recent > kMaxLoudSamples ? 1 : 0;
-}
-
-Word16 DetectPeakVal(const Word16 *samples, Word16 count, Word16 *loud) {
-  Word16 peak = 0;
-  for (Word16 i = 0; i < count; ++i) {
-    const Word16 magnitude = abs_s(samples[i]);
-    peak = std::max(peak, magnitude);
-    if (magnitude > kLoudMagnitude) ++*loud;
-  }
-  return peak;
 }
 
 Word32 freeMemory_DRC(DrcInstance *drc) {

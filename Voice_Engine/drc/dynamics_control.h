@@ -40,8 +40,9 @@ Word32 process_drc(DrcInstance *drc, Word16 *pcm, Word32 count);
 /// rate other than 16000.
 Word32 EnvBasedDynamicsControl(Flags &flags, DrcInstance *drc, Word16 *frame);
 
-/// Largest magnitude, 0 for a count below 1; counts the samples whose magnitude exceeds 8192.
-Word16 DetectPeakVal(const Word16 *samples, Word16 count, Word16 *loud);
+/// Moves the gain with the peak of a frame, and applies it. Returns how many samples of the input
+/// have a magnitude above 8192.
+Word16 level_frame(Flags &flags, DrcInstance &drc, Word16 *frame);
 
 /// Releases an instance. Returns 0, or -1 for a null or an all-ones handle.
 Word32 freeMemory_DRC(DrcInstance *drc);

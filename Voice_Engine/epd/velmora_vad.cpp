@@ -64,13 +64,12 @@ Word32 VelmoraVAD(Flags &flags, VelmoraVadState **state, const Word16 *frame, Wo
   if (vad.vad_frame_cnt != MAX_16) vad.vad_frame_cnt += 1;
 
   ChannelState channels = channels_of(vad, vad.overlap, vad.vad_frame_cnt);
-  Word16 spectrum[kMaxTransformSize];
-  const ChannelFindings found = analyse_frame(flags, plan, channels, frame, spectrum);
+  const ChannelFindings found = analyse_frame(flags, plan, channels, frame);
   vad.tot_enrg = found.unclamped_energy;
   if (vad.vad_frame_cnt <= plan.initial_noise_frames) {
     std::copy_n(vad.ch_enrg, plan.channels, vad.ch_enrg_init);
   }
-  if (found.is_noise) track_noise(flags, plan, channels);
+  if (found.is_noise) track_noise(plan, channels);
   vad.first_frame = 0;
   vad.vad_flag = !found.is_noise && found.total_energy >= kMinVoiceEnergy;
 

@@ -59,9 +59,8 @@ struct Subject {
   /// What the engine's analysis finds in a frame. `s` becomes the state before the noise update.
   ChannelFindings findings(State &s, const Word16 *frame) const {
     Flags flags;
-    Word16 spectrum[kMaxTransformSize];
     ChannelState channels = channels_of(s, s.*overlap, s.*frame_cnt);
-    return analyse_frame(flags, plan, channels, frame, spectrum);
+    return analyse_frame(flags, plan, channels, frame);
   }
 
   struct Step {
