@@ -5,6 +5,8 @@
 #include <limits>
 #include <string_view>
 
+#include "cli/audio_file.h"
+
 namespace orvalis::cli {
 namespace {
 
@@ -85,6 +87,8 @@ std::optional<Found> find_audio_chunk(InputBytes &input, const Layout &layout) {
     const Field length{at + layout.name_bytes, layout.length_bytes, layout.big_endian};
     if (!input.read_at(at, name)) return std::nullopt;
     const auto value = length.read(input);
+    if (!value && input.error() == 0 && text_of(name) == layout.audio)
+      throw AudioError("cut short: the header ends before the audio");
     if (!value) return std::nullopt;
     const std::int64_t start = length.position + layout.length_bytes;
     const auto counted = static_cast<std::uint64_t>(layout.length_has_header ? start - at : 0);

@@ -11,7 +11,7 @@ namespace orvalis::cli {
 /// The position at which the audio ends, by the header of a WAV, RF64, W64, AIFF, CAF or AU file;
 /// none if the header leaves the length open, or of other files. If the audio is open or cut short,
 /// libsndfile is shown the length that is there: it refuses some of these files, and takes an open
-/// length of 0 for no audio.
+/// length of 0 for no audio. Throws AudioError if the input ends where the length should be.
 std::optional<std::int64_t> promised_end(InputBytes &input);
 
 }  // namespace orvalis::cli

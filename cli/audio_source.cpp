@@ -19,20 +19,13 @@
 namespace orvalis::cli {
 namespace {
 
-/// Whether libsndfile reads a format without seeking. On a pipe the others fail, some of them
-/// silently.
-bool streams(int format) {
-  switch (format & SF_FORMAT_TYPEMASK) {
-    case SF_FORMAT_RAW:
-    case SF_FORMAT_WAV:
-    case SF_FORMAT_WAVEX:
-    case SF_FORMAT_AU:
-    case SF_FORMAT_AIFF:
-    case SF_FORMAT_OGG:
-      return true;
-    default:
-      return false;
-  }
+/// Whether libsndfile reads what begins so without seeking. On a pipe the others fail, some of them
+/// silently, and some look for an end that never comes.
+bool streams(std::string_view head) {
+  const auto type = head.substr(8);
+  if (head.starts_with("RIFF") || head.starts_with("RIFX")) return type == "WAVE";
+  if (head.starts_with("FORM")) return type == "AIFF" || type == "AIFC";
+  return head.starts_with(".snd") || head.starts_with("dns.") || head.starts_with("OggS");
 }
 
 /// For a shell.
@@ -44,10 +37,11 @@ std::string quoted(const std::string &name) {
 
 /// Refuses, with the way out, what begins like a format that cannot be read here.
 void check_content(const std::string &name, OpenAudio &audio) {
-  std::array<char, 8> bytes{};
+  std::array<char, 12> bytes{};
   audio.bytes->read_at(0, bytes);
+  audio.check_read();
   const std::string_view head(bytes.data(), bytes.size());
-  const char *format = head.substr(4) == "ftyp"               ? "MP4 (or M4A)"
+  const char *format = head.substr(4, 4) == "ftyp"            ? "MP4 (or M4A)"
                        : head.starts_with("\x1A\x45\xDF\xA3") ? "WebM (or Matroska)"
                                                               : nullptr;
   if (format != nullptr)
@@ -61,6 +55,8 @@ void check_content(const std::string &name, OpenAudio &audio) {
         fmt::format("{} is not read from a pipe; give the file by its name, or put "
                     "\"ffmpeg -i - -f wav - |\" before orvalis",
                     mp3 ? "MP3" : "FLAC"));
+  if (audio.piped && !streams(head))
+    throw AudioError("not WAV, AIFF, AU or Ogg audio, as a pipe must carry (or use --raw)");
 }
 
 /// libsndfile knows such files by their names only, which it is not told.
@@ -130,8 +126,6 @@ OpenAudio open_audio(const std::string &name, const AudioSettings &settings) {
     audio.info.format = SF_FORMAT_RAW | format;
     open();
   }
-  if (audio.piped && (!audio.file || !streams(audio.info.format)))
-    throw AudioError("not WAV, AIFF, AU or Ogg audio, as a pipe must carry (or use --raw)");
   if (!audio.file) throw AudioError(sf_strerror(nullptr));
   audio.bytes->end_opening();
   return audio;

@@ -14,6 +14,9 @@ namespace {
 /// Pictures may stand before the audio; nothing sensible is longer.
 constexpr std::int64_t kMaxHeadBytes = 64 << 20;
 
+/// The length of a stream, as libsndfile sees it.
+constexpr std::int64_t kEndless = std::numeric_limits<std::int64_t>::max();
+
 }  // namespace
 
 InputBytes::InputBytes(int descriptor, bool is_stream)
@@ -28,9 +31,7 @@ SF_VIRTUAL_IO *InputBytes::functions() {
     return *static_cast<InputBytes *>(self);
   };
   static SF_VIRTUAL_IO table{
-      [](void *self) -> sf_count_t {
-        return of(self).length().value_or(std::numeric_limits<sf_count_t>::max());
-      },
+      [](void *self) -> sf_count_t { return of(self).length().value_or(kEndless); },
       [](sf_count_t offset, int whence, void *self) { return of(self).seek(offset, whence); },
       [](void *to, sf_count_t count, void *self) -> sf_count_t {
         return of(self).read(static_cast<char *>(to), count);
@@ -63,7 +64,7 @@ void InputBytes::show(std::int64_t position, std::span<const char> bytes) {
 }
 
 std::int64_t InputBytes::seek(std::int64_t offset, int whence) {
-  const std::int64_t end = length().value_or(std::numeric_limits<std::int64_t>::max());
+  const std::int64_t end = length().value_or(kEndless);
   const std::int64_t base = whence == SEEK_SET ? 0 : whence == SEEK_CUR ? position_ : end;
   std::int64_t position;
   if (__builtin_add_overflow(base, offset, &position) || position < 0) return -1;
@@ -80,6 +81,8 @@ std::int64_t InputBytes::read(char *to, std::int64_t count) {
     got = receive(to, count);
   }
   position_ += got;
+  // libsndfile looks for chunks until it stands at the end, so what finds nothing has to be there.
+  if (is_stream_ && opening_ && got == 0) position_ = kEndless;
   for (std::size_t i = 0; i < shown_size_; ++i) {
     const std::int64_t at = shown_at_ + static_cast<std::int64_t>(i) - from;
     if (at >= 0 && at < got) to[at] = shown_[i];

@@ -271,6 +271,9 @@ def audio_source():
             b"data" + guid + struct.pack("<Q", 24 + len(ramp)) + ramp)
     yield "caf", mean + b"caff\0\1\0\0" + b"desc" + struct.pack(
         ">qd4s5I", 32, 16000, b"lpcm", 0, 2, 1, 1, 16) + b"data" + struct.pack(">qI", -1, 0) + ramp
+    yield "caf_cut_in_head", mean + b"caff\0\1\0\0" + b"desc" + struct.pack(
+        ">qd4s5I", 32, 16000, b"lpcm", 0, 2, 1, 1, 16) + b"data" + bytes(6)
+    yield "wav_cut_in_head", mean + wav(b"")[:36] + b"LIST"
     yield "raw_odd", b"\x3f\x07" + ramp[:-1]
     yield "empty", mean
     yield "raw_empty", raw

@@ -176,10 +176,17 @@ TEST_F(Tool, BadFilesAreNamedAndTheOthersProcessed) {
     EXPECT_TRUE(std::ranges::any_of(found, [&](const Json &one) { return one["file"] == cut; }));
 
   EXPECT_EQ(run("epd --channel 2 " + kWide).status, 1);
-  // On a pipe, a format that needs seeking is an error and not silence.
-  ChildProcess piped("cat " + (folder_ / "whole.caf") + " | " + command("epd -"), folder_.path());
-  EXPECT_EQ(piped.finish(), 1);
-  EXPECT_EQ(run("epd -", "no audio at all").err.find("orvalis: standard input: "), 0U);
+  EXPECT_EQ(run("epd " + write("length.wav", wav.substr(0, 43))).status, 1);
+  // On a pipe, a format that needs seeking is an error and not silence, and no search for chunks
+  // goes on behind the end.
+  for (const std::string &name :
+       {folder_ / "whole.caf", folder_ / "length.wav", write("text", "no audio at all"),
+        write("name.wav", wav.substr(0, 36) + "LIST")}) {
+    ChildProcess piped("cat " + name + " | (ulimit -t 4; " + command("epd -") + ")",
+                       folder_.path());
+    EXPECT_EQ(piped.finish(), 1) << name;
+    EXPECT_EQ(piped.errors().find("orvalis: standard input: "), 0U) << piped.errors();
+  }
 }
 
 TEST_F(Tool, WrongUsageIsNamedAndEndsWith2) {
