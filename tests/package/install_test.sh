@@ -47,8 +47,9 @@ check_installation() {
       fish/vendor_completions.d/orvalis.fish; do
     [ -s "$2/share/$file" ] || check "$1: $file" present missing
   done
-  # The completion for bash knows the commands and the options that the tool has.
-  for typed in 'orvalis pro=process' 'orvalis help inp=input' 'orvalis vad --min-si=--min-silence'; do
+  # The completion for bash knows the commands, options and values that the tool has.
+  for typed in 'orvalis pro=process' 'orvalis help inp=input' 'orvalis vad --min-si=--min-silence' \
+      'orvalis epd --format j=json'; do
     check "$1: completion of ${typed%=*}" "${typed#*=}" "$(PATH=$2/bin:$PATH bash -c '
       . "$1" && read -ra COMP_WORDS <<<"$2" && COMP_CWORD=$((${#COMP_WORDS[@]} - 1)) && _orvalis
       echo "${COMPREPLY[*]}"' - "$2/share/bash-completion/completions/orvalis" "${typed%=*}")"
