@@ -1,75 +1,48 @@
 // `orvalis energy` and `orvalis spectrum` against the library's own functions.
 #include <gtest/gtest.h>
 
-#include <nlohmann/json.hpp>
-#include <sstream>
+#include <array>
 #include <string>
 #include <vector>
 
 #include "jni/orvalis.h"
-#include "tests/support/child_process.h"
+#include "tests/cli/tool.h"
 #include "tests/support/recordings.h"
-#include "tests/support/temporary_folder.h"
 
 namespace orvalis::test {
 namespace {
 
-/// Runs a query in both formats and compares each line with `values(first sample)`.
-template <class Values>
-void expect_answers(const std::string &command, const std::string &name, double step_s,
-                    std::size_t lines, const std::string &field, Values values) {
-  SCOPED_TRACE(command);
-  const TemporaryFolder folder;
-  const auto output = [&](const std::string &format) {
-    ChildProcess child(ORVALIS_TOOL_PATH " " + command + " --format " + format + " " + name,
-                       folder.path());
-    EXPECT_EQ(child.finish(), 0) << child.errors();
-    return std::istringstream(child.output());
-  };
-  auto csv = output("csv"), json = output("json");
-  std::string row, object;
-  std::getline(csv, row);
-  EXPECT_EQ(row.rfind("start,", 0), 0u);
-  for (std::size_t i = 0; i < lines; ++i) {
-    ASSERT_TRUE(std::getline(csv, row) && std::getline(json, object)) << i;
-    const std::vector<std::int32_t> expected = values(i);
-    std::istringstream cells(row);
-    std::string cell;
-    std::getline(cells, cell, ',');
-    ASSERT_NEAR(std::stod(cell), step_s * static_cast<double>(i), 1e-9);
-    for (const std::int32_t value : expected) {
-      ASSERT_TRUE(std::getline(cells, cell, ','));
-      ASSERT_EQ(std::stol(cell), value) << i;
-    }
-    ASSERT_FALSE(std::getline(cells, cell, ',')) << i;
-    const auto fields = nlohmann::json::parse(object);
-    ASSERT_EQ(fields["start"], std::stod(row));
-    if (expected.size() == 1) {
-      ASSERT_EQ(fields[field], expected[0]);
-    } else {
-      ASSERT_EQ(fields[field], expected);
-    }
-  }
-  EXPECT_FALSE(std::getline(csv, row)) << "a remainder is no block";
-}
+using Queries = Tool;
 
-TEST(Queries, AnswerForEveryWholeBlock) {
-  const std::string wide = ORVALIS_SPEECH_16K "/cards/001.wav";
-  const std::string narrow = ORVALIS_SPEECH_8K "/wav/big_dog.wav";
-  const Pcm wide_pcm = load_recording(wide), narrow_pcm = load_recording(narrow);
-  expect_answers("energy", wide, 0.02, wide_pcm.size() / 320, "energy", [&](std::size_t i) {
-    return std::vector{computeEnergy(&wide_pcm[i * 320], 320)};
-  });
-  expect_answers("spectrum", wide, 0.01, wide_pcm.size() / 160, "power", [&](std::size_t i) {
-    std::vector<std::int32_t> bins(128);
-    getSpectrum(&wide_pcm[i * 160], bins.data(), 16000);
-    return bins;
-  });
-  expect_answers("spectrum", narrow, 0.01, narrow_pcm.size() / 80, "power", [&](std::size_t i) {
-    std::vector<std::int32_t> bins(64);
-    getSpectrum(&narrow_pcm[i * 80], bins.data(), 8000);
-    return bins;
-  });
+TEST_F(Queries, AnswerForEveryWholeBlock) {
+  const struct {
+    std::string command, file, field;
+    std::size_t block, bins;
+  } kCases[] = {{"energy", kWideOpen, "energy", 320, 1},
+                {"spectrum", kWideOpen, "power", 160, 128},
+                {"spectrum", kNarrow, "power", 80, 64}};
+  for (const auto &[command, file, field, block, bins] : kCases) {
+    SCOPED_TRACE(command + " " + file);
+    const int rate_hz = file == kNarrow ? 8000 : 16000;
+    const Pcm pcm = load_recording(file);
+    const auto lines = json_lines(run(command + " --format json " + file).out);
+    ASSERT_EQ(lines.size(), pcm.size() / block) << "a remainder is no block";
+    std::string csv = bins == 1 ? "start,energy" : "start";
+    for (std::size_t i = 0; bins > 1 && i < bins; ++i) csv += ",bin" + std::to_string(i);
+    for (std::size_t i = 0; i < lines.size(); ++i) {
+      std::vector<std::int32_t> values(bins);
+      if (bins > 1) getSpectrum(&pcm[i * block], values.data(), rate_hz);
+      if (bins == 1) values = {computeEnergy(&pcm[i * block], static_cast<std::int32_t>(block))};
+      const double start = static_cast<double>(i * block) / rate_hz;
+      ASSERT_EQ(lines[i],
+                (Json{{"start", start}, {field, bins > 1 ? Json(values) : Json(values[0])}}));
+      std::array<char, 20> text;
+      std::snprintf(text.data(), text.size(), "\n%.2f", start);
+      csv += text.data();
+      for (const std::int32_t value : values) (csv += ",") += std::to_string(value);
+    }
+    EXPECT_EQ(run(command + " " + file).out, csv + "\n");
+  }
 }
 
 }  // namespace

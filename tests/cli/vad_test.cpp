@@ -2,13 +2,13 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <array>
+#include <cmath>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "Voice_Engine/MCRAvad/MCRAvad.h"
 #include "jni/orvalis.h"
-#include "stream/utterance_stream.h"
 #include "tests/cli/tool.h"
 #include "tests/support/recordings.h"
 
@@ -78,56 +78,28 @@ TEST_F(Vad, TraceHoldsDecisionsAndTheirReasons) {
       << csv.substr(0, 300);
 }
 
-/// Start, end, began and open of each utterance that the stream finds.
-std::vector<std::array<std::int64_t, 4>> segments_of(const Voice &voice, UtteranceSettings settings,
-                                                     const Pcm &pcm) {
-  const McraSettings mcra = {voice.history, voice.margin,    voice.low,
-                             voice.enable,  voice.calibrate, voice.exponent};
-  settings.detector = UTTERANCE_MCRA;
-  settings.mcra = &mcra;
-  UtteranceStream *stream = OpenUtteranceStream(&settings);
-  std::vector<std::array<std::int64_t, 4>> found;
-  std::size_t done = 0;
-  do {
-    done += static_cast<std::size_t>(PushUtteranceAudio(
-        stream, pcm.data() + done, static_cast<std::int32_t>(pcm.size() - done)));
-    if (done == pcm.size()) FlushUtteranceStream(stream);
-    for (Utterance u; NextUtterance(stream, &u) == 1;)
-      found.push_back({u.start, u.end, u.began, u.open});
-  } while (done < pcm.size());
-  CloseUtteranceStream(stream);
-  return found;
-}
-
-TEST_F(Vad, SegmentsAreTheStreams) {
-  for (const std::string &file : {kWide, kNarrow, kWideOpen}) {
-    const Pcm pcm = load_recording(file);
-    UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
-    settings.rate_hz = file == kNarrow ? 8000 : 16000;
-    for (const Voice &voice : kVoices) {
-      const auto expect = [&](const std::string &options) {
-        const std::string arguments = options + voice.options + " " + file;
-        std::vector<std::array<std::int64_t, 4>> found;
-        for (const Json &line : json_lines(run("vad --format json " + arguments).out)) {
-          found.push_back({line["start_sample"], line["end_sample"], line["began_sample"],
-                           line["open"].get<bool>()});
-        }
-        EXPECT_EQ(found, segments_of(voice, settings, pcm)) << arguments;
-        return found;
-      };
-      settings.hangover_ms = 300;
-      settings.min_speech_ms = 100;
-      settings.pad_before_ms = 150;
-      settings.pad_after_ms = 250;
-      expect("");
-      settings.min_speech_ms = 200;
-      settings.pad_before_ms = settings.pad_after_ms = 0;
-      settings.hangover_ms = settings.rate_hz == 8000 ? 80 : 70;  // frames of 20 and of 10 ms
-      const auto found = expect("--min-speech 200 --min-silence 65 --pad-before 0 --pad-after 0 ");
-      for (std::size_t i = 1; i < found.size(); ++i)
-        EXPECT_GE(found[i][0] - found[i - 1][1], 65 * settings.rate_hz / 1000);
+TEST_F(Vad, SegmentsFollowTheDecisions) {
+  for (const std::string &file : {kWide, kNarrow, kWideOpen})
+    for (const auto &[min_silence, min_speech] : {std::pair{300, 100}, {65, 200}}) {
+      std::string options = "--pad-before 0 --pad-after 0 --history --format json " + file;
+      if (min_silence != 300) options += " --min-silence 65 --min-speech 200";  // else the defaults
+      std::vector<std::pair<int, int>> expected, found;                         // in ms
+      const int frame = file == kNarrow ? 20 : 10;
+      int now = 0;
+      for (const bool speech : decisions_of(kVoices[1], load_recording(file))) {
+        if (speech && (expected.empty() || now - expected.back().second >= min_silence))
+          expected.push_back({now, now});
+        now += frame;
+        if (speech) expected.back().second = now;
+      }
+      std::erase_if(expected, [shortest = min_speech](const auto &span) {
+        return span.second - span.first < shortest;
+      });
+      for (const Json &line : json_lines(run("vad " + options).out))
+        found.push_back({std::lround(line["start"].get<double>() * 1000),
+                         std::lround(line["end"].get<double>() * 1000)});
+      EXPECT_EQ(found, expected) << options;
     }
-  }
 }
 
 TEST_F(Vad, FormatsJobsAndRefusalsAreThoseOfEpd) {
