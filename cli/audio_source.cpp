@@ -9,6 +9,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdlib>
 #include <filesystem>
 #include <iterator>
 #include <numeric>
@@ -18,6 +19,8 @@
 
 namespace orvalis::cli {
 namespace {
+
+constexpr int kClippedRun = 3;
 
 /// Whether libsndfile reads what begins so without seeking. On a pipe the others fail, some of them
 /// silently, and some look for an end that never comes.
@@ -160,12 +163,20 @@ std::span<const std::int16_t> AudioSource::read() {
     ended_ = !(untouched_ ? read_untouched() : read_converted());
     audio_.check_read();
   }
-  for (std::size_t i = 0; i < samples_.size(); ++i) {
-    if (samples_[i] != INT16_MIN && samples_[i] != INT16_MAX) continue;
-    if (clipped_++ == 0) first_clipped_ = samples_read_ + static_cast<std::int64_t>(i / channels_);
-  }
+  count_clipped();
   samples_read_ += static_cast<std::int64_t>(samples_.size() / channels_);
   return samples_;
+}
+
+void AudioSource::count_clipped() {
+  for (std::size_t i = 0; i < samples_.size(); ++i) {
+    std::int64_t &run = at_full_scale_[i % channels_];
+    run = std::abs(samples_[i]) >= INT16_MAX ? run + 1 : 0;
+    if (run < kClippedRun) continue;
+    clipped_ += run == kClippedRun ? kClippedRun : 1;
+    if (clipped_ == kClippedRun)
+      first_clipped_ = samples_read_ + static_cast<std::int64_t>(i / channels_) - kClippedRun + 1;
+  }
 }
 
 /// Reads into samples_, resampled if necessary and rounded; false at the end.

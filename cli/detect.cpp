@@ -137,7 +137,7 @@ void note_opening(Job &job, const AudioSource &source) {
 
 void note_clipping(Job &job, const AudioSource &source) {
   if (source.clipped() > 0)
-    job.note(fmt::format("samples of the input at full scale: {}, the first at {:.3f} s",
+    job.note(fmt::format("clipped samples of the input: {}, the first at {:.3f} s",
                          source.clipped(), source.first_clipped_s()));
 }
 

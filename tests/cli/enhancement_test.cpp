@@ -172,13 +172,13 @@ TEST_F(Enhanced, SeveralChannelsNeedAnOption) {
   }
 }
 
-/// The tool's note on samples at full scale.
-std::string clipping_note(const char *where, const Pcm &samples) {
+/// The tool's note on samples at full scale, of which there are three or more in a row.
+std::string clipping_note(const char *what, const Pcm &samples) {
   const auto clipped = [](std::int16_t sample) { return sample == 32767 || sample == -32768; };
   std::array<char, 100> text;
   std::snprintf(
-      text.data(), text.size(), ": samples of the %s at full scale: %d, the first at %.3f s\n",
-      where, static_cast<int>(std::ranges::count_if(samples, clipped)),
+      text.data(), text.size(), ": %s: %d, the first at %.3f s\n", what,
+      static_cast<int>(std::ranges::count_if(samples, clipped)),
       static_cast<double>(std::ranges::find_if(samples, clipped) - samples.begin()) / 16000);
   return text.data();
 }
@@ -193,9 +193,10 @@ TEST_F(Enhanced, LevelReportsWhatIsLoudOrClipped) {
   ASSERT_EQ(result.out.size(), kWavHeader + 2 * samples.size()) << "audio and nothing else";
   EXPECT_EQ(samples_of(result.out.substr(kWavHeader)), enhanced(kLevel, samples));
   const std::string name = "orvalis: " + file;
-  EXPECT_EQ(result.err, name + clipping_note("input", samples) + name +
-                            ": loud for 0.50 s, first at 1.00 s\n" + name +
-                            clipping_note("output", enhanced(kLevel, samples)));
+  EXPECT_EQ(result.err,
+            name + clipping_note("clipped samples of the input", samples) + name +
+                ": loud for 0.50 s, first at 1.00 s\n" + name +
+                clipping_note("samples of the output at full scale", enhanced(kLevel, samples)));
 
   // With headroom the input is scaled first; its own samples are counted all the same.
   Pcm halved;
@@ -205,7 +206,7 @@ TEST_F(Enhanced, LevelReportsWhatIsLoudOrClipped) {
   EXPECT_EQ(through("level --headroom 0", samples), enhanced(kLevel, samples));
   for (const std::string command : {"denoise ", "epd ", "vad "})
     EXPECT_EQ(run(command + file + (command == "denoise " ? " -" : "")).err,
-              name + clipping_note("input", samples));
+              name + clipping_note("clipped samples of the input", samples));
 
   samples.resize(16000);
   EXPECT_EQ(run("level " + wav("quiet.wav", samples) + " " + (folder_ / "out.wav")).err, "");

@@ -107,9 +107,7 @@ TEST_F(Jobs, LongWorkIsShownOnATerminalAndWiped) {
     EXPECT_GT(length, 0) << seen;
     EXPECT_NEAR(percent, seconds / 57.114 * 100, 2.5);
     EXPECT_GT(speed, 0);
-    // The line is gone before anything else is printed.
-    const std::string wiped = "all.wav\r\x1b[K";
-    EXPECT_TRUE(seen.substr(seen.rfind(wiped)).starts_with(wiped + "orvalis: ")) << seen;
+    EXPECT_TRUE(seen.ends_with("all.wav\r\x1b[K")) << seen;
   }
 
   ChildProcess unseen(command(frames) + slow, folder_.path());
