@@ -76,7 +76,7 @@ Detector::Detector(const std::string &input, int rate_hz, const DetectorSettings
     stream.mcra = &settings.mcra;
     stream.hangover_ms = bridging_hangover_ms(settings.min_silence_ms, rate_hz);
   }
-  if (reported_ != Reported::kUtterances || stream.pcm_dump != 0) {
+  if (is_frames(reported_) || stream.pcm_dump != 0) {
     stream.on_frame = [](const UtteranceFrame *frame, void *detector) {
       static_cast<Detector *>(detector)->note_frame(*frame);
     };
@@ -88,6 +88,7 @@ Detector::Detector(const std::string &input, int rate_hz, const DetectorSettings
 
 void Detector::push(std::span<const std::int16_t> audio) {
   if (split_) split_->push(audio);
+  statistics_.length += std::ssize(audio);
   while (!audio.empty()) {
     const auto count =
         PushUtteranceAudio(stream_.get(), audio.data(), static_cast<std::int32_t>(audio.size()));
@@ -99,11 +100,12 @@ void Detector::push(std::span<const std::int16_t> audio) {
 void Detector::flush() {
   FlushUtteranceStream(stream_.get());
   report_new();
+  if (reported_ == Reported::kSilences) report_silence_before(statistics_.length);
 }
 
 void Detector::note_frame(const UtteranceFrame &frame) {
   if (frame.epd != nullptr && frame.epd->judged != 0) samples_judged_ += frame.samples;
-  if (reported_ == Reported::kUtterances) return;
+  if (!is_frames(reported_)) return;
   Trace trace;
   if (reported_ == Reported::kTrace)
     trace = frame.mcra != nullptr ? trace_of(*frame.mcra) : trace_of(frame, *frame.epd);
@@ -112,10 +114,13 @@ void Detector::note_frame(const UtteranceFrame &frame) {
 
 void Detector::report_new() {
   for (Utterance found; NextUtterance(stream_.get(), &found) == 1;) {
-    if (reported_ != Reported::kUtterances) continue;
     // The file first: it exists once its utterance is reported.
     if (split_) split_->write(found);
-    report_.utterance(found);
+    statistics_.speech += found.end - found.start;
+    ++statistics_.utterances;
+    if (reported_ == Reported::kUtterances) report_.utterance(found);
+    if (reported_ == Reported::kSilences) report_silence_before(found.start);
+    silence_start_ = found.end;
   }
   if (split_) split_->forget_before(EarliestUtteranceStart(stream_.get()));
   for (const Frame &frame : frames_) {
@@ -130,9 +135,15 @@ void Detector::report_new() {
   frames_.clear();
 }
 
-void note_opening(Job &job, const AudioSource &source) {
+void Detector::report_silence_before(std::int64_t position) {
+  if (position > silence_start_) report_.silence({++silence_count_, silence_start_, position});
+}
+
+AudioSource open_source(Job &job, const AudioSettings &settings) {
+  AudioSource source(job.input(), settings);
   if (source.raw_has_header())
     job.note("begins with a RIFF header, which --raw takes for samples; leave out --raw");
+  return source;
 }
 
 void note_clipping(Job &job, const AudioSource &source) {
@@ -146,10 +157,9 @@ void check_complete(Job &job, const AudioSource &source) {
 }
 
 void detect(Job &job, const DetectSettings &settings, Report &report) {
-  AudioSource source(job.input(), settings.audio);
+  AudioSource source = open_source(job, settings.audio);
   const int rate_hz = source.rate_hz();
-  note_opening(job, source);
-  report.begin_file(job.input(), rate_hz);
+  report.begin_file(job.input(), rate_hz, settings.detector.reported);
   std::optional<Detector> detector(
       std::in_place, job.input(), rate_hz, settings.detector,
       split_source(settings.detector.split, job.input(), settings.audio, rate_hz), report);
@@ -158,6 +168,11 @@ void detect(Job &job, const DetectSettings &settings, Report &report) {
     job.show_progress(source.seconds_read(), source.length_seconds());
   }
   detector->flush();
+  if (settings.detector.reported == Reported::kStatistics) {
+    Statistics statistics = detector->statistics();
+    statistics.clipped = source.clipped();
+    report.statistics(statistics);
+  }
   report.end_file(source.samples_read());
   const std::int64_t dumped = detector->samples_judged();
   detector.reset();

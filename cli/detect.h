@@ -17,8 +17,6 @@
 
 namespace orvalis::cli {
 
-enum class Reported { kUtterances, kFrames, kTrace };
-
 /// When the detector learns the noise of a recording before it judges the beginning.
 enum class LeadIn { kNever, kAlways, kNotOfStandardInput };
 
@@ -49,6 +47,9 @@ public:
   /// Samples of the frames that the detector has judged and dumped.
   std::int64_t samples_judged() const { return samples_judged_; }
 
+  /// Of what has been found so far; the clipped samples are for others to count.
+  const Statistics &statistics() const { return statistics_; }
+
 private:
   struct Close {
     void operator()(UtteranceStream *stream) const { CloseUtteranceStream(stream); }
@@ -61,6 +62,7 @@ private:
 
   void note_frame(const UtteranceFrame &frame);
   void report_new();
+  void report_silence_before(std::int64_t position);
 
   int rate_hz_;
   Reported reported_;
@@ -69,6 +71,9 @@ private:
   std::vector<Frame> frames_;  ///< Not reported yet: nothing may be thrown through the library
   std::int64_t frame_count_ = 0;
   std::int64_t samples_judged_ = 0;
+  std::int64_t silence_start_ = 0;
+  std::int32_t silence_count_ = 0;
+  Statistics statistics_;
   std::unique_ptr<UtteranceStream, Close> stream_;
 };
 
@@ -78,10 +83,10 @@ struct DetectSettings {
   const Dump *dump = nullptr;  ///< Of the detector's dump files, if it writes them
 };
 
-/// A warning about raw input that has a header.
-void note_opening(Job &job, const AudioSource &source);
+/// Opens the job's input, with a warning about raw input that has a header. Throws AudioError.
+AudioSource open_source(Job &job, const AudioSettings &settings);
 
-/// After the end of the job's input: how many of its samples are at full scale, if any.
+/// After the end of the job's input: how many of its samples are clipped, if any.
 void note_clipping(Job &job, const AudioSource &source);
 
 /// After the end of the job's input: a warning if it is cut short and may be. Throws AudioError.

@@ -24,16 +24,18 @@ struct DetectOptions {
   std::string dump_folder;
 };
 
-/// Frames and traces need a format that holds them; for a trace that is csv unless one is given.
+/// Refuses a format that does not hold what is reported. A trace is printed as csv unless a format
+/// is given.
 void check_format(const CLI::App &command, DetectOptions &options) {
   const Reported reported = options.settings.detector.reported;
   if (reported == Reported::kTrace && command.count("--format") == 0) options.format = "csv";
   const auto format = std::ranges::find(report_formats(), options.format, &ReportFormat::name);
-  if (reported == Reported::kFrames && !format->frames)
-    throw CLI::ValidationError("--frames", "the format " + options.format + " holds no frames");
-  if (reported == Reported::kTrace && !format->trace)
-    throw CLI::ValidationError("--trace",
-                               "the format " + options.format + " holds no trace; use csv or json");
+  const auto refuse = [&](const char *option, const char *what) {
+    throw CLI::ValidationError(option, "the format " + options.format + " holds no " + what);
+  };
+  if (reported == Reported::kFrames && !format->rows) refuse("--frames", "frames");
+  if (reported == Reported::kStatistics && !format->rows) refuse("--stats", "statistics");
+  if (reported == Reported::kTrace && !format->trace) refuse("--trace", "trace; use csv or json");
 }
 
 int run_detection(const CLI::App &command, DetectOptions &options, Console &console) {
@@ -68,8 +70,28 @@ CLI::App *add_command(CLI::App &app, const char *name, const char *summary, Dete
   return command;
 }
 
-constexpr const char *kTraceText =
-    "Print the decision on each frame and what led to\nit, as csv or json";
+/// Adds an option for each of what may be reported instead of utterances, one at a time.
+/// `of_utterances`: the options that mean nothing if it is frames.
+void add_reported_options(CLI::App &command, Reported &reported, bool frames,
+                          const std::vector<CLI::Option *> &of_utterances) {
+  std::vector<CLI::Option *> added;
+  const auto add = [&](const char *name, Reported what, const char *text) {
+    CLI::Option *option = command.add_flag_callback(
+        name, [&reported, what] { reported = what; }, text);
+    for (CLI::Option *other : added) option->excludes(other);
+    if (is_frames(what))
+      for (CLI::Option *other : of_utterances) option->excludes(other);
+    added.push_back(option);
+  };
+  add("--silences", Reported::kSilences, "Print what lies between the utterances instead");
+  add("--stats", Reported::kStatistics,
+      "Print one line for each file instead: its length,\nspeech, utterances and clipped samples");
+  if (frames)
+    add("--frames", Reported::kFrames,
+        "Print the decision on each frame of 10 ms instead\nof utterances");
+  add("--trace", Reported::kTrace,
+      "Print the decision on each frame and what led to\nit, as csv or json");
+}
 
 constexpr const char *kEpdNotes = R"(Input:
   Each utterance is printed as soon as it is decided. Nothing is decided before the
@@ -102,6 +124,7 @@ Examples:
   orvalis epd --raw --rate 8000 line.raw
   orvalis epd --split clips --pad-before 300 --pad-after 400 meeting.wav
   orvalis epd --jobs 4 --format csv *.flac >all.csv
+  orvalis epd --stats *.flac
   orvalis epd --format labels take.wav >take.txt
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis epd --raw -)";
 
@@ -126,16 +149,7 @@ void add_epd_command(CLI::App &app, Run &run) {
   epd->add_flag("--sync", detector.split.rules.sync,
                 "Have files on the disk before they get their names")
       ->needs(utterances.split);
-  auto *frames = epd->add_flag_callback(
-      "--frames", [&detector] { detector.reported = Reported::kFrames; },
-      "Print the decision on each frame of 10 ms instead\nof utterances");
-  auto *trace = epd->add_flag_callback(
-      "--trace", [&detector] { detector.reported = Reported::kTrace; }, kTraceText);
-  trace->excludes(frames);
-  for (CLI::Option *option : utterances.all) {
-    frames->excludes(option);
-    trace->excludes(option);
-  }
+  add_reported_options(*epd, detector.reported, true, utterances.all);
   auto *jobs = add_jobs_option(*epd, options->jobs);
   epd->add_flag("--log", options->log, "Show the engine's log lines on standard error")
       ->excludes(jobs);
@@ -211,9 +225,7 @@ void add_vad_command(CLI::App &app, Run &run) {
                       "Shortest silence that separates two segments")};
   for (CLI::Option *padding : add_padding_options(*vad, detector.stream, "segment"))
     times.push_back(padding);
-  auto *trace = vad->add_flag_callback(
-      "--trace", [&detector] { detector.reported = Reported::kTrace; }, kTraceText);
-  for (CLI::Option *option : times) trace->excludes(option);
+  add_reported_options(*vad, detector.reported, false, times);
   add_mcra_options(*vad, detector.mcra);
   add_jobs_option(*vad, options->jobs);
   add_audio_options(*vad, options->settings.audio);

@@ -79,7 +79,7 @@ public:
     if (settings.detect) {
       detector_.emplace(input, kEngineRate, settings.detector,
                         split_processed(settings.detector.split, input, kEngineRate), report);
-      report.begin_file(input, kEngineRate);
+      report.begin_file(input, kEngineRate, settings.detector.reported);
     }
     if (rate_hz != kEngineRate) resampler_.emplace(kEngineRate, rate_hz);
   }
@@ -142,8 +142,7 @@ void note_counts(Job &job, const EnhancementCounts &counts) {
 
 void enhance(Job &job, const OutputTarget &target, const EnhanceSettings &settings,
              Report &report) {
-  AudioSource source(job.input(), settings.audio);
-  note_opening(job, source);
+  AudioSource source = open_source(job, settings.audio);
   const int own_rate = source.source_rate_hz();
   const int rate = settings.keep_rate ? own_rate : kEngineRate;
   const auto output = open_audio_output(target, rate, settings.rules);

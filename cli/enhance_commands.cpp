@@ -105,8 +105,8 @@ Examples:
   arecord -q -t raw -f S16_LE -r 16000 -c 1 | orvalis denoise --raw - - | aplay -q)";
 
 constexpr const char *kLevelNotes = R"(
-On standard error it reports for how long the audio was loud, and how many samples of
-input and output are at full scale.
+On standard error it reports for how long the audio was loud, how many samples of the
+input are clipped, and how many of the output are at full scale.
 
 Examples:
   orvalis level meeting.wav level.wav

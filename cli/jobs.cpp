@@ -95,12 +95,16 @@ void Job::show_progress(double processed_s, std::optional<double> length_s) {
   console_.show_progress({input_, processed_s, length_s, elapsed.count()});
 }
 
-void ReportInTurn::begin_file(const std::string &name, int rate_hz) {
-  job_.in_turn([=, &report = report_] { report.begin_file(name, rate_hz); });
+void ReportInTurn::begin_file(const std::string &name, int rate_hz, Reported reported) {
+  job_.in_turn([=, &report = report_] { report.begin_file(name, rate_hz, reported); });
 }
 
 void ReportInTurn::utterance(const Utterance &found) {
   job_.in_turn([=, &report = report_] { report.utterance(found); });
+}
+
+void ReportInTurn::silence(const Silence &found) {
+  job_.in_turn([=, &report = report_] { report.silence(found); });
 }
 
 void ReportInTurn::frame(std::int64_t number, int decision) {
@@ -109,6 +113,10 @@ void ReportInTurn::frame(std::int64_t number, int decision) {
 
 void ReportInTurn::trace(std::int64_t number, double start_s, const Trace &values) {
   job_.in_turn([=, &report = report_] { report.trace(number, start_s, values); });
+}
+
+void ReportInTurn::statistics(const Statistics &values) {
+  job_.in_turn([=, &report = report_] { report.statistics(values); });
 }
 
 void ReportInTurn::end_file(std::int64_t samples) {

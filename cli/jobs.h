@@ -50,10 +50,12 @@ class ReportInTurn : public Report {
 public:
   ReportInTurn(Report &report, Job &job) : report_(report), job_(job) {}
 
-  void begin_file(const std::string &name, int rate_hz) override;
+  void begin_file(const std::string &name, int rate_hz, Reported reported) override;
   void utterance(const Utterance &found) override;
+  void silence(const Silence &found) override;
   void frame(std::int64_t number, int decision) override;
   void trace(std::int64_t number, double start_s, const Trace &values) override;
+  void statistics(const Statistics &values) override;
   void end_file(std::int64_t samples) override;
 
 private:

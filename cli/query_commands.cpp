@@ -99,7 +99,7 @@ void for_each_block(Job &job, AudioSource &source, std::size_t length, Process p
 }
 
 void print_query(const Query &query, const QueryOptions &options, Job &job, Console &console) {
-  AudioSource source(job.input(), options.audio);
+  AudioSource source = open_source(job, options.audio);
   const int rate_hz = source.rate_hz();
   const bool json = options.format == "json";
   if (!json) console.print_line(fmt::format("start,{}", fmt::join(query.columns(rate_hz), ",")));

@@ -12,17 +12,18 @@
 namespace orvalis::cli {
 namespace {
 
-/// What all formats share. By default they hold utterances only.
+/// What all formats share. By default they hold utterances and silences only.
 class FileReport : public Report {
 public:
   explicit FileReport(Console &console) : console_(console) {}
 
-  void begin_file(const std::string &name, int rate_hz) override {
+  void begin_file(const std::string &name, int rate_hz, Reported) override {
     name_ = name;
     rate_hz_ = rate_hz;
   }
   void frame(std::int64_t, int) override {}
   void trace(std::int64_t, double, const Trace &) override {}
+  void statistics(const Statistics &) override {}
   void end_file(std::int64_t) override {}
 
 protected:
@@ -39,19 +40,19 @@ class TableReport : public FileReport {
 public:
   TableReport(Console &console, bool headings) : FileReport(console), headings_(headings) {}
 
-  void begin_file(const std::string &name, int rate_hz) override {
-    FileReport::begin_file(name, rate_hz);
+  void begin_file(const std::string &name, int rate_hz, Reported reported) override {
+    FileReport::begin_file(name, rate_hz, reported);
+    // Statistics are one table, with a row for each file.
+    if (reported == Reported::kStatistics) return;
+    what_ = reported == Reported::kSilences ? "silence" : "utterance";
     empty_ = true;
     if (headings_) print_line(fmt::format("{}{}", first_ ? "" : "\n", printable(name)));
     first_ = false;
   }
 
-  void utterance(const Utterance &found) override {
-    column_names("utterance     start       end  duration");
-    print_line(fmt::format("{:9} {:9.3f} {:9.3f} {:9.3f}{}", found.number, seconds(found.start),
-                           seconds(found.end), seconds(found.end - found.start),
-                           found.open ? "  open" : ""));
-  }
+  void utterance(const Utterance &found) override { print_row(found, found.open ? "  open" : ""); }
+
+  void silence(const Silence &found) override { print_row(found, ""); }
 
   void frame(std::int64_t number, int decision) override {
     column_names("    frame     start    answer");
@@ -59,17 +60,32 @@ public:
         fmt::format("{:9} {:9.2f} {:9}", number, static_cast<double>(number) / 100, decision));
   }
 
+  void statistics(const Statistics &values) override {
+    column_names("   length    speech    share  utterances   clipped  file");
+    print_line(fmt::format("{:9.3f} {:9.3f} {:7.1f}% {:11} {:9}  {}", seconds(values.length),
+                           seconds(values.speech), 100 * values.share(), values.utterances,
+                           values.clipped, printable(name_)));
+  }
+
   void end_file(std::int64_t) override {
-    if (empty_) print_line("no utterance");
+    if (empty_) print_line(std::string("no ") + what_);
   }
 
 private:
-  void column_names(const char *names) {
+  template <class Found>
+  void print_row(const Found &found, const char *mark) {
+    column_names(fmt::format("{:>9}     start       end  duration", what_));
+    print_line(fmt::format("{:9} {:9.3f} {:9.3f} {:9.3f}{}", found.number, seconds(found.start),
+                           seconds(found.end), seconds(found.end - found.start), mark));
+  }
+
+  void column_names(const std::string &names) {
     if (empty_) print_line(names);
     empty_ = false;
   }
 
   bool headings_;
+  const char *what_ = "";
   bool first_ = true;
   bool empty_ = true;
 };
@@ -80,9 +96,7 @@ public:
   using FileReport::FileReport;
 
   void utterance(const Utterance &found) override {
-    print({{"file", name_},
-           {"rate", rate_hz_},
-           {"number", found.number},
+    print({{"number", found.number},
            {"start", seconds(found.start)},
            {"end", seconds(found.end)},
            {"duration", seconds(found.end - found.start)},
@@ -95,20 +109,32 @@ public:
            {"open", found.open != 0}});
   }
 
+  void silence(const Silence &found) override {
+    print({{"silence", found.number},
+           {"start", seconds(found.start)},
+           {"end", seconds(found.end)},
+           {"duration", seconds(found.end - found.start)},
+           {"start_sample", found.start},
+           {"end_sample", found.end}});
+  }
+
+  void statistics(const Statistics &values) override {
+    print({{"length", seconds(values.length)},
+           {"speech", seconds(values.speech)},
+           {"share", values.share()},
+           {"utterances", values.utterances},
+           {"clipped", values.clipped}});
+  }
+
   void frame(std::int64_t number, int decision) override {
-    print({{"file", name_},
-           {"rate", rate_hz_},
-           {"frame", number},
-           {"start", static_cast<double>(number) / 100},
-           {"answer", decision}});
+    print({{"frame", number}, {"start", static_cast<double>(number) / 100}, {"answer", decision}});
   }
 
   void trace(std::int64_t number, double start_s, const Trace &values) override {
-    nlohmann::ordered_json line = {
-        {"file", name_}, {"rate", rate_hz_}, {"frame", number}, {"start", start_s}};
+    nlohmann::ordered_json found = {{"frame", number}, {"start", start_s}};
     for (const TraceValue &traced : values)
-      std::visit([&](auto value) { line[traced.name] = json_number(value); }, traced.value);
-    print(line);
+      std::visit([&](auto value) { found[traced.name] = json_number(value); }, traced.value);
+    print(found);
   }
 
 private:
@@ -119,7 +145,9 @@ private:
     return std::isfinite(value) ? nlohmann::ordered_json::parse(fmt::format("{}", value)) : nullptr;
   }
 
-  void print(const nlohmann::ordered_json &line) {
+  void print(const nlohmann::ordered_json &found) {
+    nlohmann::ordered_json line = {{"file", name_}, {"rate", rate_hz_}};
+    line.update(found);
     // File names are any bytes, and those that are not UTF-8 must not stop the report.
     print_line(line.dump(-1, ' ', false, nlohmann::ordered_json::error_handler_t::replace));
   }
@@ -131,28 +159,36 @@ public:
   using FileReport::FileReport;
 
   void utterance(const Utterance &found) override {
-    header("file,number,start,end,duration,began,ended,open");
-    print_line(fmt::format("{},{},{:.6f},{:.6f},{:.6f},{:.6f},{:.6f},{}", quoted(name_),
-                           found.number, seconds(found.start), seconds(found.end),
-                           seconds(found.end - found.start), seconds(found.began),
-                           seconds(found.ended), found.open));
+    print("number,start,end,duration,began,ended,open",
+          fmt::format("{},{:.6f},{:.6f},{:.6f},{:.6f},{:.6f},{}", found.number,
+                      seconds(found.start), seconds(found.end), seconds(found.end - found.start),
+                      seconds(found.began), seconds(found.ended), found.open));
+  }
+
+  void silence(const Silence &found) override {
+    print("silence,start,end,duration",
+          fmt::format("{},{:.6f},{:.6f},{:.6f}", found.number, seconds(found.start),
+                      seconds(found.end), seconds(found.end - found.start)));
+  }
+
+  void statistics(const Statistics &values) override {
+    print("length,speech,share,utterances,clipped",
+          fmt::format("{:.6f},{:.6f},{:.6f},{},{}", seconds(values.length), seconds(values.speech),
+                      values.share(), values.utterances, values.clipped));
   }
 
   void frame(std::int64_t number, int decision) override {
-    header("file,frame,start,answer");
-    print_line(fmt::format("{},{},{:.2f},{}", quoted(name_), number,
-                           static_cast<double>(number) / 100, decision));
+    print("frame,start,answer",
+          fmt::format("{},{:.2f},{}", number, static_cast<double>(number) / 100, decision));
   }
 
   void trace(std::int64_t number, double start_s, const Trace &values) override {
-    std::string names = "file,frame,start";
-    std::string line = fmt::format("{},{},{:.2f}", quoted(name_), number, start_s);
+    std::string names = "frame,start", fields = fmt::format("{},{:.2f}", number, start_s);
     for (const TraceValue &traced : values) {
       names += std::string(",") + traced.name;
-      std::visit([&](auto value) { line += fmt::format(",{}", value); }, traced.value);
+      std::visit([&](auto value) { fields += fmt::format(",{}", value); }, traced.value);
     }
-    header(names);
-    print_line(line);
+    print(names, fields);
   }
 
 private:
@@ -163,9 +199,10 @@ private:
     return text + '"';
   }
 
-  void header(const std::string &names) {
-    if (!has_header_) print_line(names);
+  void print(const std::string &names, const std::string &fields) {
+    if (!has_header_) print_line("file," + names);
     has_header_ = true;
+    print_line(quoted(name_) + "," + fields);
   }
 
   bool has_header_ = false;
@@ -176,25 +213,35 @@ class LabelsReport : public FileReport {
 public:
   using FileReport::FileReport;
 
-  void utterance(const Utterance &found) override {
-    print_line(fmt::format("{:.6f}\t{:.6f}\tutterance {}", seconds(found.start), seconds(found.end),
+  void utterance(const Utterance &found) override { print_label("utterance", found); }
+  void silence(const Silence &found) override { print_label("silence", found); }
+
+private:
+  template <class Found>
+  void print_label(const char *what, const Found &found) {
+    print_line(fmt::format("{:.6f}\t{:.6f}\t{} {}", seconds(found.start), seconds(found.end), what,
                            found.number));
   }
 };
 
 /// A Praat TextGrid in the long text format: one interval tier, with the text "speech" where there
-/// is an utterance.
+/// is an utterance, or "silence" where there is a silence.
 class TextGridReport : public FileReport {
 public:
   using FileReport::FileReport;
 
-  void utterance(const Utterance &found) override { found_.push_back(found); }
+  void utterance(const Utterance &found) override {
+    found_.push_back({found.start, found.end, "speech"});
+  }
+  void silence(const Silence &found) override {
+    found_.push_back({found.start, found.end, "silence"});
+  }
 
   void end_file(std::int64_t samples) override {
     std::string intervals;
     std::int64_t done = 0;
     int count = 0;
-    // The tier must cover the file without gaps; intervals between utterances have no text.
+    // The tier must cover the file without gaps; the intervals in between have no text.
     const auto add = [&](std::int64_t end, const char *text) {
       if (end <= done) return;
       intervals += fmt::format(
@@ -203,9 +250,9 @@ public:
           ++count, seconds(done), seconds(end), text);
       done = end;
     };
-    for (const Utterance &found : found_) {
+    for (const Interval &found : found_) {
       add(found.start, "");
-      add(found.end, "speech");
+      add(found.end, found.text);
     }
     add(samples, "");
     print_line(fmt::format(
@@ -218,20 +265,31 @@ public:
   }
 
 private:
-  std::vector<Utterance> found_;
+  struct Interval {
+    std::int64_t start, end;
+    const char *text;
+  };
+
+  std::vector<Interval> found_;
 };
 
-/// Rich Transcription Time Marked: a line for each utterance, of a speaker called "speech".
+/// Rich Transcription Time Marked: an utterance has a speaker called "speech"; a silence is no
+/// speech, of a kind that has no name.
 class RttmReport : public FileReport {
 public:
   using FileReport::FileReport;
 
-  void utterance(const Utterance &found) override {
-    print_line(fmt::format("SPEAKER {} 1 {:.3f} {:.3f} <NA> <NA> speech <NA> <NA>", file_id(),
-                           seconds(found.start), seconds(found.end - found.start)));
-  }
+  void utterance(const Utterance &found) override { print_object("SPEAKER", found, "<NA> speech"); }
+  void silence(const Silence &found) override { print_object("NON-SPEECH", found, "other <NA>"); }
 
 private:
+  template <class Found>
+  void print_object(const char *type, const Found &found, const char *subtype_and_name) {
+    print_line(fmt::format("{} {} 1 {:.3f} {:.3f} <NA> {} <NA> <NA>", type, file_id(),
+                           seconds(found.start), seconds(found.end - found.start),
+                           subtype_and_name));
+  }
+
   /// The file's name without folder, ending and white space, as tools match it.
   std::string file_id() const {
     std::string id = file_name_of(name_).stem();

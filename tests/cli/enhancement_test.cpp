@@ -257,7 +257,8 @@ TEST_F(Enhanced, FormatsThatDoNotFitAreRefusedWithTheWayOut) {
   const std::string odd = wav("odd.wav", Pcm(4410), 44100);
   EXPECT_THAT(error_of("denoise --keep-rate " + odd + " " + (folder_ / "odd.opus")),
               has("Opus holds 8000, 12000, 16000, 24000 or 48000 Hz, not 44100 Hz"));
-  EXPECT_THAT(run("epd --raw " + odd).err, has("RIFF header"));
+  for (const std::string command : {"epd", "denoise -o /dev/null", "energy", "spectrum"})
+    EXPECT_THAT(run(command + " --raw " + odd).err, has("RIFF header")) << command;
   ChildProcess shown("script -qec '" + command("denoise " + kWide + " -") + "' /dev/null",
                      folder_.path());
   shown.finish();

@@ -138,6 +138,40 @@ TEST_F(Tool, SilenceAndNoAudioAreNoErrors) {
     EXPECT_TRUE(epd(arguments).empty());
     EXPECT_EQ(run("epd " + arguments).out, "no utterance\n");
   }
+  EXPECT_EQ(run("epd --silences " + (folder_ / "none.wav")).out, "no silence\n");
+}
+
+TEST_F(Tool, StatisticsSumUpTheUtterances) {
+  // Three samples in a row at full scale where the tool reads the next chunk, and at the end.
+  Pcm clipped(16000, 1);
+  for (const int i : {799, 800, 801, 803, 804, 807, 15997, 15998, 15999})
+    clipped[static_cast<std::size_t>(i)] = static_cast<short>(i % 2 == 0 ? -32767 : 32767);
+  write_audio(folder_ / "clipped.wav", clipped, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
+  write_audio<short>(folder_ / "none.wav", {}, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
+  const std::string files =
+      kNarrow + " " + kWideOpen + " " + (folder_ / "clipped.wav") + " " + (folder_ / "none.wav");
+  std::string expected = "   length    speech    share  utterances   clipped  file\n";
+  std::vector<int> all_clipped;
+  for (const Json &line : epd("-j 2 --stats " + files)) {
+    const auto found = epd(line["file"].get<std::string>());
+    double speech = 0;
+    for (const Json &utterance : found) speech += utterance["duration"].get<double>();
+    const double length = line["length"];
+    EXPECT_NEAR(line["speech"], speech, 1e-9);
+    EXPECT_DOUBLE_EQ(line["share"], length > 0 ? speech / length : 0);
+    EXPECT_EQ(line["utterances"], found.size());
+    all_clipped.push_back(line["clipped"]);
+    std::array<char, 200> row;
+    std::snprintf(row.data(), row.size(), "%9.3f %9.3f %7.1f%% %11zu %9d  %s\n", length, speech,
+                  100 * line["share"].get<double>(), found.size(), all_clipped.back(),
+                  line["file"].get<std::string>().c_str());
+    expected += row.data();
+  }
+  EXPECT_EQ(all_clipped, (std::vector{0, 0, 6, 0}));
+  EXPECT_EQ(run("epd -q --stats " + files).out, expected);
+  EXPECT_EQ(run("vad -q --stats --format csv " + (folder_ / "none.wav")).out,
+            "file,length,speech,share,utterances,clipped\n" + (folder_ / "none.wav") +
+                ",0.000000,0.000000,0.000000,0,0\n");
 }
 
 TEST_F(Tool, BadFilesAreNamedAndTheOthersProcessed) {
@@ -215,6 +249,12 @@ TEST_F(Tool, WrongUsageIsNamedAndEndsWith2) {
       {"epd --frames --hangover 9 x", "excludes"},
       {"epd --lead-in --no-lead-in x", "excludes"},
       {"epd --trace --frames x", "excludes"},
+      {"epd --format labels x y", "labels describes one file, but several are given"},
+      {"epd --format textgrid x y", "textgrid describes one file"},
+      {"epd --frames --format rttm x", "the format rttm holds no frames"},
+      {"epd --silences --frames x", "excludes"},
+      {"vad --silences --stats x", "excludes"},
+      {"vad --stats --format labels x", "the format labels holds no statistics"},
       {"epd --trace --format table x", "holds no trace"},
       {"epd - -", "standard input can be read only once"},
       {"epd --jobs 0 x", "--jobs: \"0\" is not a whole number from 1 to 256"},
