@@ -305,6 +305,8 @@ TEST_F(Tool, HelpNamesEveryCommandsOptions) {
   for (const char *word : {"-f,--format", "--hangover TIME=500ms", "arecord", "help input"})
     EXPECT_NE(help.out.find(word), std::string::npos) << word;
   EXPECT_EQ(help.out.find("Excludes:"), std::string::npos);
+  for (const char *standard : {"--min-speech TIME=100ms", "--min-silence TIME=300ms"})
+    EXPECT_NE(run("help vad").out.find(standard), std::string::npos) << standard;
   EXPECT_NE(run("help input").out.find("Exit status:"), std::string::npos);
   EXPECT_NE(run("version").out.find("library 160705\n"), std::string::npos);
 }
