@@ -20,7 +20,9 @@
 namespace orvalis::cli {
 namespace {
 
-constexpr int kClippedRun = 3;
+/// Clipped are at least as many samples at full scale, at most as far apart. Fewer may be the peaks
+/// of sound that fits. Every second one is what resampling leaves of a clipped wave, which rings.
+constexpr int kFewestClipped = 3, kFarthestClipped = 2;
 
 /// Whether libsndfile reads what begins so without seeking. On a pipe the others fail, some of them
 /// silently, and some look for an end that never comes.
@@ -170,12 +172,14 @@ std::span<const std::int16_t> AudioSource::read() {
 
 void AudioSource::count_clipped() {
   for (std::size_t i = 0; i < samples_.size(); ++i) {
-    std::int64_t &run = at_full_scale_[i % channels_];
-    run = std::abs(samples_[i]) >= INT16_MAX ? run + 1 : 0;
-    if (run < kClippedRun) continue;
-    clipped_ += run == kClippedRun ? kClippedRun : 1;
-    if (clipped_ == kClippedRun)
-      first_clipped_ = samples_read_ + static_cast<std::int64_t>(i / channels_) - kClippedRun + 1;
+    if (std::abs(samples_[i]) < INT16_MAX) continue;
+    const std::int64_t at = samples_read_ + static_cast<std::int64_t>(i / channels_);
+    FullScale &run = full_scale_[i % channels_];
+    if (run.count == 0 || at - run.last > kFarthestClipped) run = {at, at, 0};
+    run.last = at;
+    if (++run.count < kFewestClipped) continue;
+    if (clipped_ == 0) first_clipped_ = run.first;
+    clipped_ += run.count == kFewestClipped ? kFewestClipped : 1;
   }
 }
 

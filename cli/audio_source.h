@@ -70,8 +70,8 @@ public:
   std::int64_t samples_read() const { return samples_read_; }
   double seconds_read() const { return static_cast<double>(samples_read_) / rate_hz(); }
 
-  /// Of the samples that read() has returned, those that are clipped, and where the first one is.
-  /// Clipped are three or more in a row at full scale: sound that fits may reach it, but goes on.
+  /// Of the samples that read() has returned, those that are clipped, and where the first one is:
+  /// three or more at full scale, in a row or with single others in between.
   std::int64_t clipped() const { return clipped_; }
   double first_clipped_s() const { return static_cast<double>(first_clipped_) / rate_hz(); }
 
@@ -92,6 +92,11 @@ private:
   bool read_untouched();
   bool read_converted();
   bool read_float();
+  /// Neighbouring samples at full scale.
+  struct FullScale {
+    std::int64_t first, last, count;
+  };
+
   void count_clipped();
   bool is_cut_short() const;
 
@@ -104,7 +109,7 @@ private:
   sf_count_t frames_read_ = 0;
   std::int64_t samples_read_ = 0;
   std::int64_t clipped_ = 0, first_clipped_ = 0;
-  std::array<std::int64_t, 2> at_full_scale_{};  ///< In a row, up to now, of each channel
+  std::array<FullScale, 2> full_scale_{};  ///< The last ones of each channel
   std::optional<Resampler> resampler_;
   std::vector<float> interleaved_, picked_, resampled_;
   std::vector<std::int16_t> interleaved16_, samples_;

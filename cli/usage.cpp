@@ -19,7 +19,8 @@ constexpr const char *kInputTopic = R"(Input of all commands:
   Several channels are averaged unless --channel picks one; denoise, level and process
   refuse them unless --channel, --mix or --mics 2 says which is meant.
   "-" reads standard input: WAV (or AIFF, AU, Ogg), or with --raw samples alone.
-  Three or more samples in a row at full scale count as clipped, which is reported.
+  Three or more samples at full scale, in a row or with single others in between, count
+  as clipped, which is reported.
 
 Times:
   200ms, 0.2s or 200, which is in milliseconds.

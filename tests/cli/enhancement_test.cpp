@@ -172,7 +172,7 @@ TEST_F(Enhanced, SeveralChannelsNeedAnOption) {
   }
 }
 
-/// The tool's note on samples at full scale, of which there are three or more in a row.
+/// The tool's note on samples at full scale, all of which have neighbours.
 std::string clipping_note(const char *what, const Pcm &samples) {
   const auto clipped = [](std::int16_t sample) { return sample == 32767 || sample == -32768; };
   std::array<char, 100> text;

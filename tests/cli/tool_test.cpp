@@ -142,9 +142,9 @@ TEST_F(Tool, SilenceAndNoAudioAreNoErrors) {
 }
 
 TEST_F(Tool, StatisticsSumUpTheUtterances) {
-  // Three samples in a row at full scale where the tool reads the next chunk, and at the end.
+  // Neighbours at full scale where the tool reads the next chunk, and at the end.
   Pcm clipped(16000, 1);
-  for (const int i : {799, 800, 801, 803, 804, 807, 15997, 15998, 15999})
+  for (const int i : {798, 800, 801, 804, 805, 15995, 15997, 15999})
     clipped[static_cast<std::size_t>(i)] = static_cast<short>(i % 2 == 0 ? -32767 : 32767);
   write_audio(folder_ / "clipped.wav", clipped, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
   write_audio<short>(folder_ / "none.wav", {}, 16000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16);
