@@ -5,45 +5,28 @@ import static org.junit.jupiter.api.Assertions.assertEquals;
 import static org.junit.jupiter.api.Assertions.assertFalse;
 import static org.junit.jupiter.api.Assertions.assertTrue;
 
-import java.util.ArrayList;
+import java.io.IOException;
+import java.nio.file.Files;
+import java.nio.file.Path;
 import java.util.Arrays;
 import java.util.Collections;
-import java.util.List;
+import java.util.HashSet;
+import java.util.Set;
 import java.util.concurrent.Callable;
 import java.util.concurrent.ExecutorService;
 import java.util.concurrent.Executors;
 import java.util.concurrent.Future;
 import java.util.concurrent.ThreadLocalRandom;
 import java.util.concurrent.TimeUnit;
-import java.util.concurrent.atomic.AtomicBoolean;
 import java.util.concurrent.atomic.AtomicInteger;
 import java.util.concurrent.atomic.AtomicReferenceArray;
-import java.util.function.Function;
 import org.junit.jupiter.api.BeforeEach;
+import org.junit.jupiter.api.Tag;
 import org.junit.jupiter.api.Test;
 
-/** Calls from several threads and from log handlers. */
+/** Calls from several threads and from log handlers; a million instances. */
 class ThreadsTest {
-  private static final int THREADS = 16;
   private static final int CALLS = Integer.getInteger("calls", 20_000);
-  static final int KINDS = 5;
-
-  /** The calls of an object, which may be of any safe class. */
-  record Target(Function<short[], String> push, Runnable flush, Runnable close) {
-    static Target of(int kind) {
-      if (kind < 2) {
-        EndPointDetector.Method method = EndPointDetector.Method.values()[kind];
-        EndPointDetector epd = EndPointDetector.at(16000).method(method).open();
-        return new Target(pcm -> epd.push(pcm).toString(), epd::flush, epd::close);
-      }
-      if (kind == 2) {
-        DynamicsControl drc = new DynamicsControl();
-        return new Target(pcm -> Arrays.toString(drc.push(pcm)), drc::flush, drc::close);
-      }
-      NoiseSuppressor ns = SafeClassesTest.suppressor(kind - 2);
-      return new Target(pcm -> Arrays.toString(ns.push(pcm)), ns::flush, ns::close);
-    }
-  }
 
   private final AtomicReferenceArray<Target> targets = new AtomicReferenceArray<>(16);
   private final AtomicInteger calls = new AtomicInteger();
@@ -54,26 +37,10 @@ class ThreadsTest {
     EngineLog.off();
   }
 
-  /** All that one thread computes, by the raw methods and by the safe classes. */
-  private static String results(short[] pcm) {
-    StringBuilder text = new StringBuilder(SafeClassesTest.utterances(pcm, List.of(pcm.length)));
-    long epd = Loquent.initializeEPD(0, 0);
-    try (NoiseSuppressor ns = SafeClassesTest.suppressor(1);
-        DynamicsControl drc = new DynamicsControl()) {
-      for (int at = 0; at + 160 <= pcm.length; at += 160) {
-        short[] frame = Arrays.copyOfRange(pcm, at, at + 160);
-        text.append(Loquent.processEPDFrame(epd, frame, 160));
-        text.append(Arrays.hashCode(drc.push(ns.push(frame))));
-      }
-    }
-    Loquent.freeMemoryEPD(epd);
-    return text.toString();
-  }
-
-  /** What each of the threads returns; fails if one does not end. */
-  private static <T> List<T> onThreads(int count, Callable<T> work) throws Exception {
+  /** What threads return; fails if one does not end. */
+  private static <T> Set<T> onThreads(int count, Callable<T> work) throws Exception {
     ExecutorService pool = Executors.newFixedThreadPool(count);
-    List<T> results = new ArrayList<>();
+    Set<T> results = new HashSet<>();
     for (Future<T> one : pool.invokeAll(Collections.nCopies(count, work), 500, TimeUnit.SECONDS)) {
       results.add(one.get());
     }
@@ -81,22 +48,25 @@ class ThreadsTest {
     return results;
   }
 
+  /** All that one thread computes, by the raw methods and by the safe classes. */
+  private static String results() {
+    StringBuilder text = new StringBuilder();
+    for (int kind = 0; kind < Target.KINDS; ++kind) {
+      text.append(Target.of(kind).output(kind == 3 ? Audio.PAIRS : Audio.SENTENCE));
+      System.gc();
+    }
+    long epd = Loquent.initializeEPD(0, 0);
+    for (int at = 0; at + 160 <= Audio.SENTENCE.length; at += 160) {
+      short[] frame = Arrays.copyOfRange(Audio.SENTENCE, at, at + 160);
+      text.append(Loquent.processEPDFrame(epd, frame, 160));
+    }
+    Loquent.freeMemoryEPD(epd);
+    return text.toString();
+  }
+
   @Test
   void resultsAreThoseOfOneThread() throws Exception {
-    AtomicBoolean done = new AtomicBoolean();
-    Thread collector =
-        new Thread(
-            () -> {
-              while (!done.get()) System.gc();
-            });
-    collector.start();
-    for (short[] pcm : new short[][] {Audio.command(), Audio.withGap(Audio.sentence())}) {
-      String alone = results(pcm);
-      assertTrue(alone.startsWith("utterance 1"));
-      assertEquals(Collections.nCopies(THREADS, alone), onThreads(THREADS, () -> results(pcm)));
-    }
-    done.set(true);
-    collector.join();
+    assertEquals(Set.of(results()), onThreads(16, ThreadsTest::results));
   }
 
   /** Makes a call, which may throw; whether it was refused because a log handler made it. */
@@ -115,24 +85,19 @@ class ThreadsTest {
 
   @Test
   void handlersDoNotReachTheObjectWhoseCallTheyRunIn() {
-    short[] pcm = Audio.withGap(Audio.command());
+    short[] pcm = Audio.COMMAND;
     for (int kind : new int[] {0, 2, 3, 4}) { // MCRA logs nothing
-      String expected = Target.of(kind).push.apply(pcm);
+      String expected = Target.of(kind).output(pcm);
       Target target = Target.of(kind);
       refusals.set(0);
-      Runnable use =
-          () -> {
-            assertEquals(expected, target.push.apply(pcm));
-            target.close.run();
-          };
-      Runnable handler =
-          () -> {
-            Target.of(kind).close.run(); // lines of these would lead here without end
-            handle(target.close);
-            handle(target.flush);
-            handle(() -> target.push.apply(pcm));
-          };
-      int lines = LoquentTest.linesOf(use, handler).size();
+      Runnable handler = () -> {
+        Target.of(kind).close().run(); // lines of these would lead here without end
+        handle(target.close());
+        handle(target.flush()::get);
+        handle(() -> target.push().push(pcm, 0, 160));
+      };
+      int lines =
+          LoquentTest.linesOf(() -> assertEquals(expected, target.output(pcm)), handler).size();
       assertTrue(lines > 0);
       assertEquals(3 * lines, refusals.get());
     }
@@ -144,28 +109,42 @@ class ThreadsTest {
     Target target = targets.get(at);
     calls.incrementAndGet();
     switch (random.nextInt(8)) {
-      case 0 -> target.close.run();
-      case 1 -> target.flush.run();
-      case 2, 3 -> targets.set(at, Target.of(random.nextInt(KINDS))); // the old one is not closed
-      default -> target.push.apply(new short[2 * random.nextInt(4000)]);
+      case 0 -> target.close().run();
+      case 1 -> target.flush().get();
+      case 2, 3 -> targets.set(at, Target.of(random.nextInt(Target.KINDS))); // the old one is open
+      default -> target.push().push(new short[8000], 0, 2 * random.nextInt(4000));
     }
   }
 
   /** Nothing crashes or hangs; only handlers are refused, other threads wait. */
   @Test
   void handlersAndThreadsCallAtRandom() {
-    for (int i = 0; i < targets.length(); ++i) targets.set(i, Target.of(i % KINDS));
-    Callable<Boolean> work =
-        () -> {
-          while (calls.get() < CALLS) assertFalse(isRefused(this::callAtRandom));
-          return true;
-        };
-    Runnable handler =
-        () -> {
-          if (ThreadLocalRandom.current().nextInt(1000) == 0) System.gc();
-          for (int i = ThreadLocalRandom.current().nextInt(4); i > 0; --i) handle(this::callAtRandom);
-        };
+    for (int i = 0; i < targets.length(); ++i) targets.set(i, Target.of(i % Target.KINDS));
+    Callable<Boolean> work = () -> {
+      while (calls.get() < CALLS) assertFalse(isRefused(this::callAtRandom));
+      return true;
+    };
+    Runnable handler = () -> {
+      if (ThreadLocalRandom.current().nextInt(1000) == 0) System.gc();
+      for (int i = ThreadLocalRandom.current().nextInt(4); i > 0; --i) handle(this::callAtRandom);
+    };
     LoquentTest.linesOf(() -> assertDoesNotThrow(() -> onThreads(8, work)), handler);
     assertTrue(refusals.get() > CALLS / 1000, refusals + " refusals");
+  }
+
+  private static long residentKb(int cycles) throws IOException {
+    for (int i = 0; i < cycles; ++i) Target.of(i % Target.KINDS).close().run();
+    System.gc();
+    String status = Files.readString(Path.of("/proc/self/status"));
+    return Long.parseLong(status.replaceAll("(?s).*VmRSS:\\s*(\\d+).*", "$1"));
+  }
+
+  /** A million instances leave the process as large as it was. */
+  @Test
+  @Tag("memory")
+  void aMillionCyclesKeepItFlat() throws IOException {
+    long before = residentKb(200_000);
+    long growth = residentKb(1_000_000) - before;
+    assertTrue(growth < 1024, "grown by " + growth + " kB");
   }
 }
