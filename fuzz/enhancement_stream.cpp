@@ -12,7 +12,7 @@ namespace {
 
 using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
-using Samples = std::vector<std::int16_t>;
+using orvalis::fuzz::Samples;
 
 constexpr std::size_t kMaxSamples = 24000;
 constexpr std::int16_t kGuard = 12345;
@@ -96,25 +96,15 @@ EnhancementSettings read_settings(Input &input) {
   return {1 + choice / 2 % 2, kSuppressions[choice / 4 % 3], choice % 2, choice / 12 % 2};
 }
 
-bool is_valid(const EnhancementSettings &settings) {
-  const auto is_one_of = [](std::int32_t value, std::initializer_list<std::int32_t> values) {
-    return std::find(values.begin(), values.end(), value) != values.end();
-  };
-  return is_one_of(settings.microphones, {1, 2}) &&
-         is_one_of(settings.suppression_db, {0, 13, settings.microphones == 1 ? 18 : 0}) &&
-         is_one_of(settings.level, {0, 1}) && is_one_of(settings.aligned, {0, 1});
-}
-
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
   SetLogSink(LogNothing, nullptr);
   Input input(bytes, size);
   const EnhancementSettings settings = read_settings(input);
-  if (!is_valid(settings)) {
-    require(OpenEnhancementStream(&settings) == nullptr, "settings out of range are refused");
-    return 0;
-  }
+  EnhancementStream *stream = OpenEnhancementStream(&settings);
+  if (stream == nullptr) return 0;
+  CloseEnhancementStream(stream);
 
   Enhancer chunked(settings), whole(settings);
   Samples pushed;

@@ -1,131 +1,115 @@
-// The extended mathematics: any arguments, against the laws that the functions approximate.
+// The extended mathematics, queries and transforms: any arguments the manual allows, in buffers of
+// exactly their size. What they compute is for the tests; here they only must not go astray.
 #include <algorithm>
 #include <cmath>
-#include <numeric>
 
 #include "Math_baseop.h"
+#include "fixed_fft.h"
+#include "float_fft.h"
 #include "fuzz/input.h"
+#include "jni/orvalis.h"
+#include "noscale_fft_512p.h"
 
 namespace {
 
 using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
-
-bool is_near(double value, double expected, double tolerance) {
-  return std::abs(value - expected) <= tolerance;
-}
+using orvalis::fuzz::Samples;
 
 std::int64_t wide(Input &input) {
   const auto high = static_cast<std::uint64_t>(input.number());
   return static_cast<std::int64_t>(high << 32 | static_cast<std::uint32_t>(input.number()));
 }
 
-void check_logarithm(std::uint32_t x) {
-  if (x == 0) {
-    require(ZOLT_L_log(0) == INT32_MIN && ZOLT_S_log(0) == INT16_MIN, "ln 0 is the least value");
-    return;
+void compute(std::uint8_t choice, Input &input) {
+  const std::int32_t x = input.number(), y = input.number();
+  switch (choice % 4) {
+    case 0:
+      ZOLT_L_log(static_cast<std::uint32_t>(x));
+      ZOLT_S_log(static_cast<std::uint32_t>(x));
+      require(ZOLT_L_exp(x) == (x < 0 ? L_exp_mius(x) : L_exp_plus(x)), "e^x is one of its halves");
+      ZOLT_expintFix(x);
+      break;
+    case 1: {
+      const std::int16_t q = input.word(), out_q = input.word();
+      // A shift or an exponent out of range ends the process.
+      if (q > -32 && x >= 0 && std::ldexp(x, -q) < 32768)
+        ZOLT_L_pow2_plus(x, q, out_q, input.byte());
+      ZOLT_L_pow(x, y);
+      break;
+    }
+    case 2:
+      ZOLT_L_sin(x);
+      ZOLT_L_cos(x);
+      ZOLT_L_cuberoot(x);
+      if (x >= 0) ZOLT_L_atan(x), ZOLT_L_root15(x);
+      if (y != 0) ZOLT_L_atan2(y, x);
+      break;
+    default: {
+      const std::int64_t a = wide(input), b = wide(input);
+      require(ZOLT_L64_abs(a) >= 0, "no absolute value is negative");
+      if (a >= 0) ZOLT_L64_sqrt_Q0(a);
+      if (b != 0) ZOLT_L64_div(a, b);
+      ZOLT_L64_mult(a, b);
+      ZOLT_LL_mult_64a32(a, x);
+      if (x != 0 && x != INT32_MIN && y != INT32_MIN) ZOLT_get_gcd(y, x);
+      std::int64_t coefficients[9];
+      for (int i = 0; i < 9; ++i) coefficients[i] = a >> i;
+      ZOLT_POLYVALFix(coefficients, x, 9);
+    }
   }
-  require(is_near(std::ldexp(ZOLT_L_log(x), -26), std::log(std::ldexp(x, -16)), 0.0005), "ln");
-  require(is_near(std::ldexp(ZOLT_S_log(x), -11), std::log(std::ldexp(x, -16)), 0.001), "short ln");
 }
 
-void check_exponential(std::int32_t x) {
-  const double power =
-      std::ldexp(std::exp(std::clamp(std::ldexp(x, -26), -21.0, 21.0)), 32) * (x > -1409286144);
-  const auto is_power = [&](std::int64_t got) {
-    return is_near(static_cast<double>(got), power, power * 0.0002 + 1);
+void query(std::uint8_t choice, Input &input) {
+  const std::int32_t rate_hz = 100 * (input.number() % 1000);
+  Samples audio = input.audio();
+  const auto count = static_cast<std::int32_t>(audio.size());
+  const auto exactly = [&](std::size_t size) {
+    audio.resize(size);
+    return Samples(audio.begin(), audio.end());
   };
-  require(is_power(ZOLT_L_exp(x)), "e^x");
-  require(is_power(L_exp_plus(x)) && is_power(L_exp_mius(x)), "either half is right everywhere");
-}
-
-void check_power_of_two(std::int32_t x, std::int16_t q, std::int16_t out_q, std::uint16_t mode) {
-  x = std::max(x, 0);
-  const double exponent = std::ldexp(x, -q);
-  if (exponent >= 32768 || q <= -32) return;  // ends the process
-  const double power = std::exp2(exponent + out_q);
-  const std::int32_t got = ZOLT_L_pow2_plus(x, q, out_q, mode);
-  if (power > 0x1p31) {
-    require(got == INT32_MAX, "2^x saturates");
-  } else if (power < 0x1p30) {
-    require(is_near(got, power, 0.51 + power * 0.006), "2^x");
+  const bool flag = (choice & 16) != 0, is_inverse = (choice & 32) != 0;
+  std::vector<std::int32_t> re(flag ? 512 : 256), im(re.size());
+  switch (choice % 4) {
+    case 0: {
+      const std::int32_t energy = computeEnergy(audio.data(), count);
+      require(energy >= 0 && energy <= 90, "an energy is 0 to 90 dB");
+      // The last block is processed whole.
+      const std::int32_t block = std::max(rate_hz / 50, 1);
+      const Samples blocks = exactly(static_cast<std::size_t>((count + block - 1) / block * block));
+      ComputeEnergy(blocks.data(), count, rate_hz);
+      break;
+    }
+    case 1:
+      re.assign(flag ? ORVALIS_BINS_16K : ORVALIS_BINS_8K, -1);
+      getSpectrum(exactly(flag ? 160 : 80).data(), re.data(), flag ? 16000 : 8000);
+      for (const std::int32_t power : re)
+        require(power >= 0 && power <= 1 << 30, "a power is 0 to 2^30");
+      break;
+    case 2:
+      r_fft_epd(exactly(flag ? 128 : 256).data(), is_inverse ? -1 : 1, flag);
+      r_fft_ns(exactly(256).data(), is_inverse ? -1 : 1);
+      break;
+    default: {
+      audio.resize(std::clamp<std::size_t>(audio.size(), 1, re.size()));
+      const Samples frame = exactly(audio.size());
+      const auto length = static_cast<std::int32_t>(frame.size());
+      flag ? Noscale_FFT_512p_Frame(frame.data(), length, re.data(), im.data())
+           : Noscale_FFT_256p_Frame_64bit(frame.data(), length, re.data(), im.data());
+      audio.resize(512);
+      std::vector<float> data(audio.begin(), audio.end());
+      r_fft(data.data(), is_inverse ? -1 : 1);
+    }
   }
-}
-
-void check_angles(std::int32_t y, std::int32_t x) {
-  require(is_near(std::ldexp(ZOLT_L_sin(x), -31), std::sin(std::ldexp(x, -22)), 0.004), "sine");
-  require(is_near(std::ldexp(ZOLT_L_cos(x), -31), std::cos(std::ldexp(x, -22)), 0.004), "cosine");
-  if (x >= 0)
-    require(is_near(std::ldexp(ZOLT_L_atan(x), -22), std::atan(std::ldexp(x, -11)), 0.0018),
-            "arc tangent");
-  if (y != 0)
-    require(is_near(std::ldexp(ZOLT_L_atan2(y, x), -22), std::atan2(y, x), 0.0019), "angle");
-}
-
-void check_roots(std::int32_t x) {
-  const double value = std::ldexp(x, -31);
-  require(is_near(ZOLT_L_cuberoot(x), std::ldexp(std::cbrt(value), 31), 64), "cube root");
-  if (x >= 0)
-    require(is_near(ZOLT_L_root15(x), std::ldexp(std::pow(value, 2.0 / 3), 31), 5), "x^(2/3)");
-}
-
-void check_wide(std::int64_t a, std::int64_t b) {
-  require(ZOLT_L64_abs(a) >= 0, "no absolute value is negative");
-  if (a >= 0)
-    require(is_near(ZOLT_L64_sqrt_Q0(a), std::min(std::sqrt(static_cast<double>(a)), 0x1p31), 1),
-            "square root");
-  if (b != 0) ZOLT_L64_div(a, b);
-  const auto low = static_cast<std::int32_t>(b);
-  const double product = static_cast<double>(a) * low;
-  require(is_near(static_cast<double>(ZOLT_LL_mult_64a32(a, low)), std::ldexp(product, -32),
-                  1 + std::ldexp(std::abs(product), -82)),
-          "a * b / 2^32");
-  ZOLT_L64_mult(a, b);
-  const auto high = static_cast<std::int32_t>(a >> 32);
-  if (low != 0 && high != INT32_MIN && low != INT32_MIN)
-    require(ZOLT_get_gcd(high, low) == std::gcd(high, low), "greatest common divisor");
-  std::int64_t coefficients[9];
-  for (int i = 0; i < 9; ++i) coefficients[i] = a >> i;
-  ZOLT_POLYVALFix(coefficients, low, 9);
 }
 
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
   Input input(bytes, size);
-  while (!input.is_empty()) {
+  for (int calls = 0; !input.is_empty() && calls < 256; ++calls) {
     const std::uint8_t choice = input.byte();
-    const std::int32_t x = input.number();
-    switch (choice % 8) {
-      case 0:
-        check_logarithm(static_cast<std::uint32_t>(x));
-        break;
-      case 1:
-        check_exponential(x);
-        break;
-      case 2: {
-        const std::int16_t q = input.word(), out_q = input.word();
-        check_power_of_two(x, q, out_q, input.byte());
-        break;
-      }
-      case 3:
-        require(ZOLT_expintFix(x) == ZOLT_expintFix(-std::max(x, -INT32_MAX)) || x < -INT32_MAX,
-                "E1 takes the absolute value");
-        break;
-      case 4:
-        check_angles(x, input.number());
-        break;
-      case 5:
-        check_roots(x);
-        break;
-      case 6:
-        ZOLT_L_pow(x, input.number());
-        break;
-      default:
-        check_wide(static_cast<std::int64_t>(static_cast<std::uint64_t>(x) << 32 |
-                                             static_cast<std::uint32_t>(input.number())),
-                   wide(input));
-    }
+    (choice & 8) == 0 ? compute(choice, input) : query(choice, input);
   }
   return 0;
 }

@@ -16,6 +16,8 @@ inline void require(bool holds, const char *expectation) {
   std::abort();
 }
 
+using Samples = std::vector<std::int16_t>;
+
 class Input {
 public:
   Input(const std::uint8_t *bytes, std::size_t size) : at_(bytes), end_(bytes + size) {}
@@ -40,11 +42,11 @@ public:
 
   /// A chunk of audio in a buffer of exactly its size, so that reading beyond it is noticed.
   /// Speech is long and inputs are short: all kinds but the literal one grow from a few bytes.
-  std::vector<std::int16_t> audio() {
+  Samples audio() {
     enum Kind { kLiteral, kConstant, kNoise, kPulses };
     const auto kind = static_cast<Kind>(byte() % 4);
     const std::size_t length = byte();
-    std::vector<std::int16_t> samples(kind == kLiteral ? length : 40 * (length + 1));
+    Samples samples(kind == kLiteral ? length : 40 * (length + 1));
     const std::int32_t level = kind == kLiteral ? 0 : word();
     const std::uint32_t period = kind == kPulses ? byte() + 1U : 1;
     for (std::size_t i = 0; i < samples.size(); ++i) {

@@ -11,6 +11,7 @@ namespace {
 
 using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
+using orvalis::fuzz::Samples;
 
 constexpr std::size_t kMaxSamples = 16000;
 constexpr std::size_t kMaxCalibrated = 96000;  // a calibration takes 93000
@@ -21,13 +22,6 @@ void configure(VADINFO &vad, Input &input) {
   vad.calibrationEnable = input.number();
   vad.lowThresholdSelect = input.number();
   vad.energyMargin = input.number();
-}
-
-/// Mostly hundredths, and now and then any 32 bits.
-float read_exponent(Input &input) {
-  const std::int32_t number = input.number();
-  return number >= 0 && number < 255 ? static_cast<float>(number) / 100
-                                     : std::bit_cast<float>(number);
 }
 
 void require_invariants(const VADINFO &vad, std::int32_t decision) {
@@ -50,17 +44,6 @@ void require_invariants(const VADINFO &vad, std::int32_t decision) {
   require(std::count(std::begin(vad.reserved), std::end(vad.reserved), 0) == 80, "reserved is 0");
 }
 
-void process(VADINFO *vad, const std::vector<std::int16_t> &audio, std::int32_t length,
-             float exponent) {
-  for (std::size_t at = 0; at + MCRA_FRAME_SAMPLES <= audio.size(); at += MCRA_FRAME_SAMPLES) {
-    // Without spare capacity, so that reading or writing beyond it is noticed.
-    std::vector<std::int16_t> frame(&audio[at], &audio[at] + MCRA_FRAME_SAMPLES);
-    const std::int32_t index = vad->frameIndex;
-    require_invariants(*vad, processVAD(&vad, frame.data(), length, exponent));
-    require(vad->frameIndex == index + 1, "frames are counted");
-  }
-}
-
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
@@ -74,28 +57,30 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   // Few sessions are long, so that many are run.
   const std::size_t max_samples = vad->calibrationEnable == 1 ? kMaxCalibrated : kMaxSamples;
   for (std::size_t pushed = 0; !input.is_empty() && pushed < max_samples;) {
-    switch (input.byte() % 8) {
-      case 0:
-        reset_MCRA_params(&vad);
-        break;
-      case 1:
-        initialVADINFO(&vad);
-        break;
-      case 2:
-        configure(*vad, input);
-        break;
-      case 3: {
-        std::vector<std::int16_t> frame = input.audio();
-        frame.resize(MCRA_FRAME_SAMPLES);
-        ApplyVAD(&vad, frame.data(), input.number());
-        break;
-      }
-      default: {
-        const std::int32_t length = input.number();
-        const float exponent = read_exponent(input);
-        const std::vector<std::int16_t> audio = input.audio();
-        pushed += audio.size();
-        process(vad, audio, length, exponent);
+    const std::uint8_t call = input.byte() % 8;
+    if (call == 0) {
+      reset_MCRA_params(&vad);
+    } else if (call == 1) {
+      initialVADINFO(&vad);
+    } else if (call == 2) {
+      configure(*vad, input);
+    } else if (call == 3) {
+      Samples frame = input.audio();
+      frame.resize(MCRA_FRAME_SAMPLES);
+      ApplyVAD(&vad, frame.data(), input.number());
+    } else {
+      const std::int32_t length = input.number(), exponent = input.number();
+      const Samples audio = input.audio();
+      pushed += audio.size();
+      for (std::size_t at = 0; at + MCRA_FRAME_SAMPLES <= audio.size(); at += MCRA_FRAME_SAMPLES) {
+        // Without spare capacity, so that reading or writing beyond it is noticed.
+        Samples frame(&audio[at], &audio[at] + MCRA_FRAME_SAMPLES);
+        const std::int32_t index = vad->frameIndex;
+        // Mostly hundredths, and now and then any 32 bits.
+        const float power = exponent >= 0 && exponent < 255 ? static_cast<float>(exponent) / 100
+                                                            : std::bit_cast<float>(exponent);
+        require_invariants(*vad, processVAD(&vad, frame.data(), length, power));
+        require(vad->frameIndex == index + 1, "frames are counted");
       }
     }
   }

@@ -15,7 +15,7 @@ namespace {
 
 using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
-using Samples = std::vector<std::int16_t>;
+using orvalis::fuzz::Samples;
 
 constexpr std::size_t kMaxSamples = 96000;  // more than a lead-in searches at 8 kHz
 
@@ -164,31 +164,15 @@ UtteranceSettings read_settings(Input &input) {
   return settings;
 }
 
-bool is_from(std::int32_t value, std::int32_t min, std::int32_t max) {
-  return value >= min && value <= max;
-}
-
-bool is_valid(const UtteranceSettings &settings) {
-  const bool is_mcra = settings.detector == UTTERANCE_MCRA;
-  return (settings.rate_hz == 16000 || settings.rate_hz == 8000) &&
-         is_from(settings.detector, UTTERANCE_CHANNEL_ENERGY, UTTERANCE_MCRA) &&
-         is_from(settings.input_gain, 0, is_mcra ? 0 : 2) &&
-         is_from(settings.lead_in, 0, is_mcra ? 0 : 1) &&
-         (!is_mcra || settings.content_type == 0) &&
-         std::min({settings.hangover_ms, settings.pad_before_ms, settings.pad_after_ms,
-                   settings.min_speech_ms}) >= 0;
-}
-
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
   SetLogSink(LogNothing, nullptr);
   Input input(bytes, size);
   const UtteranceSettings settings = read_settings(input);
-  if (!is_valid(settings)) {
-    require(OpenUtteranceStream(&settings) == nullptr, "settings out of range are refused");
-    return 0;
-  }
+  UtteranceStream *stream = OpenUtteranceStream(&settings);
+  if (stream == nullptr) return 0;
+  CloseUtteranceStream(stream);
   try_finder(settings, input);
 
   Listener chunked(settings);
@@ -208,11 +192,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t siz
   whole.push(pushed);
   whole.flush();
   static_assert(std::has_unique_object_representations_v<Utterance>);
-  require(chunked.found().size() == whole.found().size() &&
-              std::equal(chunked.found().begin(), chunked.found().end(), whole.found().begin(),
-                         [](const Utterance &a, const Utterance &b) {
-                           return std::memcmp(&a, &b, sizeof a) == 0;
-                         }),
+  require(std::ranges::equal(chunked.found(), whole.found(),
+                             [](const Utterance &a, const Utterance &b) {
+                               return std::memcmp(&a, &b, sizeof a) == 0;
+                             }),
           "no utterance is lost or depends on the chunk size");
   return 0;
 }
