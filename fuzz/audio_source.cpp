@@ -18,53 +18,6 @@ using orvalis::fuzz::require;
 
 constexpr std::size_t kMaxSamples = 200000;  // silence packs well; there is no end to wait for
 
-/// A file in memory with a name that it can be opened by.
-class MemoryFile {
-public:
-  MemoryFile(const std::uint8_t *bytes, std::size_t size)
-      : descriptor_(memfd_create("audio", MFD_CLOEXEC)) {
-    require(descriptor_ >= 0 && write(descriptor_, bytes, size) == static_cast<ssize_t>(size),
-            "a file is made");
-  }
-  ~MemoryFile() { close(descriptor_); }
-  MemoryFile(const MemoryFile &) = delete;
-  MemoryFile &operator=(const MemoryFile &) = delete;
-
-  std::string path() const { return "/proc/self/fd/" + std::to_string(descriptor_); }
-
-private:
-  int descriptor_;
-};
-
-/// A pipe that another thread fills, cut into pieces.
-class CutPipe {
-public:
-  CutPipe(std::span<const std::uint8_t> bytes, std::size_t piece) {
-    std::signal(SIGPIPE, SIG_IGN);  // when the reader has had enough
-    require(pipe(ends_) == 0, "a pipe is made");
-    writer_ = std::thread([bytes, piece, end = ends_[1]]() mutable {
-      while (!bytes.empty()) {
-        const auto part = bytes.first(std::min(piece, bytes.size()));
-        if (write(end, part.data(), part.size()) != static_cast<ssize_t>(part.size())) break;
-        bytes = bytes.subspan(part.size());
-      }
-      close(end);
-    });
-  }
-  ~CutPipe() {
-    close(ends_[0]);
-    writer_.join();
-  }
-  CutPipe(const CutPipe &) = delete;
-  CutPipe &operator=(const CutPipe &) = delete;
-
-  std::string path() const { return "/proc/self/fd/" + std::to_string(ends_[0]); }
-
-private:
-  int ends_[2];
-  std::thread writer_;
-};
-
 orvalis::cli::AudioSettings settings_of(std::uint8_t byte) {
   using orvalis::cli::Channels;
   constexpr int kRates[] = {16000, 8000, 44100, 11025};
@@ -96,19 +49,43 @@ std::size_t read_all(const std::string &path, const orvalis::cli::AudioSettings 
   return heard;
 }
 
+std::string path_of(int descriptor) { return "/proc/self/fd/" + std::to_string(descriptor); }
+
+/// From a pipe that another thread fills, cut into pieces.
+std::size_t read_pipe(std::span<const std::uint8_t> bytes, std::size_t piece,
+                      const orvalis::cli::AudioSettings &settings) {
+  std::signal(SIGPIPE, SIG_IGN);  // when the reader has had enough
+  int ends[2];
+  require(pipe(ends) == 0, "a pipe is made");
+  std::thread writer([bytes, piece, end = ends[1]]() mutable {
+    while (!bytes.empty()) {
+      const auto part = bytes.first(std::min(piece, bytes.size()));
+      if (write(end, part.data(), part.size()) != static_cast<ssize_t>(part.size())) break;
+      bytes = bytes.subspan(part.size());
+    }
+    close(end);
+  });
+  const std::size_t heard = read_all(path_of(ends[0]), settings);
+  close(ends[0]);
+  writer.join();
+  return heard;
+}
+
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *bytes, std::size_t size) {
   if (size < 2) return 0;
   const auto settings = settings_of(bytes[0]);
   const std::span content(bytes + 2, size - 2);
-  read_all(MemoryFile(content.data(), content.size()).path(), settings);
+  const int file = memfd_create("audio", MFD_CLOEXEC);
+  require(write(file, content.data(), content.size()) == std::ssize(content), "a file is made");
+  read_all(path_of(file), settings);
+  close(file);
   // The end is cut off, too, if the second byte says so.
-  const std::size_t kept =
-      bytes[1] < 128 ? content.size() : content.size() * (bytes[1] - 127) / 129;
+  const auto kept =
+      content.first(bytes[1] < 128 ? content.size() : content.size() * (bytes[1] - 127) / 129);
   const std::size_t piece = 1 + bytes[1] % 128;
-  const std::size_t heard = read_all(CutPipe(content.first(kept), piece).path(), settings);
-  require(heard == read_all(CutPipe(content.first(kept), kept).path(), settings),
+  require(read_pipe(kept, piece, settings) == read_pipe(kept, kept.size(), settings),
           "pieces do not matter");
   return 0;
 }

@@ -9,7 +9,7 @@ namespace {
 
 using orvalis::fuzz::Input;
 using orvalis::fuzz::require;
-using Audio = std::vector<std::int16_t>;
+using Audio = orvalis::fuzz::Samples;
 
 constexpr std::size_t kMaxSamples = 48000;  // a longer input teaches nothing new
 // A last frame that is processed whole, and the 160 samples that the suppressor takes of it, stay
