@@ -66,19 +66,17 @@ Pcm audio(int microphones, unsigned seed = 1) {
 
 /// What the flat interface makes of frames, with the delayed first microphone where it is silent.
 Pcm suppressed(int mode, int microphones, int delay, const Pcm &in) {
-  Pcm suppressed;
   const int frame = 160 * microphones;
+  Pcm late(delay * microphones), first;
+  late.insert(late.end(), in.begin(), in.end());
   NsInstance *ns = InitializeDoNS(mode, microphones, 0);
   for (int at = 0; at < std::ssize(in); at += frame) {
-    Pcm work = part(in, at, frame), out(frame);
-    for (int i = 0; i < frame; ++i)
-      out[i] = in[std::max(at + (i / microphones - delay) * microphones, 0)] *
-               (at / microphones + i / microphones >= delay);
+    Pcm work = part(in, at, frame), out = part(late, at, frame);
     ProcessDoNSFrame(ns, work.data(), frame, out.data(), frame);
-    for (int i = 0; i < frame; i += microphones) suppressed.push_back(out[i]);
+    for (int i = 0; i < frame; i += microphones) first.push_back(out[i]);
   }
   FreeMemoryNS(ns);
-  return suppressed;
+  return first;
 }
 
 TEST(EnhancementStream, IsTheEngineFrameByFrameWithTheDelayedInputWhereItIsSilent) {
@@ -127,32 +125,27 @@ TEST(EnhancementStream, KeepsLengthAndDelayAndMirrorsTheEnd) {
 
 TEST(EnhancementStream, CountsWhatIsLoudAndClipped) {
   // A second of a tone that is not loud, then half a second of one that is and clips.
-  Pcm tone;
+  Pcm tone, pairs, out;
   for (int i = 0; i < 24000; ++i)
     tone.push_back(to_sample((i < 16050 ? 2000 : 40000) * std::sin(i * 0.1)));
+  for (const std::int16_t sample : tone) pairs.insert(pairs.end(), 2, sample);
+  const Stream stream = open({2, 0, 1, 1});
+  const auto expect = [&](const std::array<std::int64_t, 7> &expected) {
+    EnhancementCounts c;
+    EXPECT_EQ(GetEnhancementCounts(stream.get(), &c), 0);
+    EXPECT_EQ(
+        (std::array{c.clipped_in.count, c.clipped_in.first, c.loud_frames.count,
+                    c.loud_frames.first, c.clipped_out.count, c.clipped_out.first, c.is_loud}),
+        expected);
+  };
   const auto is_clipped = [](int x) { return x == 32767 || x == -32768; };
   const auto clipped = [&](const Pcm &x) { return std::ranges::count_if(x, is_clipped); };
   const auto first = [&](const Pcm &x) { return std::ranges::find_if(x, is_clipped) - x.begin(); };
-  for (const int microphones : {1, 2}) {
-    const Stream stream = open({microphones, 0, 1, 1});
-    EnhancementCounts counts;
-    EXPECT_EQ(GetEnhancementCounts(stream.get(), &counts), 0);
-    EXPECT_EQ(counts.clipped_in.first, -1);
-    Pcm in, out;
-    for (const std::int16_t sample : tone) in.insert(in.end(), microphones, sample);
-    push(stream, in, out);
-    GetEnhancementCounts(stream.get(), &counts);
-    EXPECT_EQ(counts.clipped_in.count, microphones * clipped(tone));
-    EXPECT_EQ(counts.clipped_in.first, first(tone));
-    EXPECT_EQ(counts.loud_frames.count, 50);
-    EXPECT_EQ(counts.loud_frames.first, 16000);
-    EXPECT_EQ(counts.clipped_out.count, clipped(out));
-    EXPECT_EQ(counts.clipped_out.first, first(out));
-    EXPECT_EQ(counts.is_loud, 1);
-    push(stream, Pcm(1760 * microphones), out);
-    GetEnhancementCounts(stream.get(), &counts);
-    EXPECT_EQ(counts.is_loud, 0);
-  }
+  expect({0, -1, 0, -1, 0, -1, 0});
+  push(stream, pairs, out);
+  expect({2 * clipped(tone), first(tone), 50, 16000, clipped(out), first(out), 1});
+  push(stream, Pcm(3520), out);
+  expect({2 * clipped(tone), first(tone), 59, 16000, clipped(out), first(out), 0});
 }
 
 TEST(EnhancementStream, RefusesBadArguments) {
@@ -169,7 +162,7 @@ TEST(EnhancementStream, RefusesBadArguments) {
   EXPECT_EQ(GetEnhancementCounts(nullptr, &counts), -1);
   EXPECT_EQ(CloseEnhancementStream(nullptr), -1);
 
-  std::int16_t out[ENHANCEMENT_HELD_BACK];
+  std::int16_t out[ENHANCEMENT_HELD_BACK], *const none = nullptr;
   const Pcm frame(160, 1000);
   Stream stream = open(ENHANCEMENT_SETTINGS_DEFAULT);
   const auto push = [&](const std::int16_t *pcm, int count, std::int16_t *to, int room) {
@@ -178,22 +171,20 @@ TEST(EnhancementStream, RefusesBadArguments) {
   const auto flush = [&](std::int16_t *to, int room) {
     return FlushEnhancementStream(stream.get(), to, room);
   };
+  const auto *pcm = frame.data();
   EXPECT_EQ(GetEnhancementCounts(stream.get(), nullptr), -1);
-  EXPECT_EQ(push(nullptr, 1, out, 160), -1);
-  EXPECT_EQ(push(frame.data(), 160, nullptr, 112), -1);
-  EXPECT_EQ(push(frame.data(), -1, out, 160), -1);
-  EXPECT_EQ(push(frame.data(), 1, out, -1), -1);
-  EXPECT_EQ(push(frame.data(), 160, out, 111), -1);
-  EXPECT_EQ(push(frame.data(), 159, nullptr, 0), 0);
-  EXPECT_EQ(push(frame.data(), 1, out, 112), 112);
-  EXPECT_EQ(flush(out, 47), -1);
-  EXPECT_EQ(flush(nullptr, 48), -1);
-  EXPECT_EQ(flush(out, -1), -1);
+  for (const int result :
+       {push(none, 1, out, 160), push(pcm, 160, none, 112), push(pcm, -1, out, 160),
+        push(pcm, 1, out, -1), push(pcm, 160, out, 111)})
+    EXPECT_EQ(result, -1);
+  EXPECT_EQ(push(pcm, 159, none, 0), 0);
+  EXPECT_EQ(push(pcm, 1, out, 112), 112);
+  for (const int result : {flush(out, 47), flush(none, 48), flush(out, -1)}) EXPECT_EQ(result, -1);
   EXPECT_EQ(flush(out, 48), 48);
-  EXPECT_EQ(flush(nullptr, 0), 0);
-  EXPECT_EQ(push(nullptr, 0, nullptr, 0), -1);
+  EXPECT_EQ(flush(none, 0), 0);
+  EXPECT_EQ(push(none, 0, none, 0), -1) << "after the flush";
   stream = open({2, 13, 0, 1});
-  EXPECT_EQ(push(frame.data(), 3, out, 160), 0);
+  EXPECT_EQ(push(pcm, 3, out, 160), 0);
   EXPECT_EQ(flush(out, ENHANCEMENT_HELD_BACK), -1) << "half a pair";
 }
 
@@ -236,10 +227,10 @@ TEST(EnhancementStream, TakesItsMemoryWhenItOpensAndGivesItBack) {
   const Pcm in = audio(2), expected = enhanced(both, in);
   const Stream stream = open(both);
   Pcm out(in.size());
-  const auto count = static_cast<int32_t>(in.size());
   const auto memory = ScriptedMalloc::failing();
-  int32_t ready = PushEnhancementAudio(stream.get(), in.data(), count, out.data(), count);
-  ready += FlushEnhancementStream(stream.get(), &out[ready], count - ready);
+  const int32_t room = std::ssize(out);
+  int32_t ready = PushEnhancementAudio(stream.get(), in.data(), room, out.data(), room);
+  ready += FlushEnhancementStream(stream.get(), &out[ready], room - ready);
   EXPECT_EQ(part(out, 0, ready), expected);
 }
 

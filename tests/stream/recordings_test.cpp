@@ -1,5 +1,5 @@
-// Where the utterances of real recordings lie, clean and in noise: against the recordings' own
-// energy and the number of words that their transcripts hold.
+// Where the utterances of real recordings lie, clean and in noise, against the recordings' own
+// energy.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -20,28 +20,28 @@ namespace {
 using namespace orvalis::test;
 
 struct Span {
-  double start_s;
-  double end_s;
+  double start_s, end_s;
 };
 
 std::vector<Span> utterances_of(const Pcm &pcm, const UtteranceSettings &settings) {
   UtteranceStream *stream = OpenUtteranceStream(&settings);
-  EXPECT_EQ(PushUtteranceAudio(stream, pcm.data(), static_cast<int32_t>(pcm.size())),
-            static_cast<int32_t>(pcm.size()));
+  const auto samples = static_cast<int32_t>(pcm.size());
+  EXPECT_EQ(PushUtteranceAudio(stream, pcm.data(), samples), samples);
   FlushUtteranceStream(stream);
   std::vector<Span> spans;
-  for (Utterance next; NextUtterance(stream, &next) == 1;) {
+  for (Utterance next; NextUtterance(stream, &next) == 1;)
     spans.push_back({double(next.start) / settings.rate_hz, double(next.end) / settings.rate_hz});
-  }
   CloseUtteranceStream(stream);
   return spans;
 }
 
-/// What the channel-energy detector itself finds.
-UtteranceSettings unpadded(int32_t rate_hz = 16000) {
-  UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
-  settings.rate_hz = rate_hz;
+UtteranceSettings unpadded(UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT) {
   settings.pad_before_ms = settings.pad_after_ms = 0;
+  return settings;
+}
+
+UtteranceSettings with_lead_in(UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT) {
+  settings.lead_in = 1;
   return settings;
 }
 
@@ -54,69 +54,6 @@ UtteranceSettings mcra() {
   return settings;
 }
 
-/// The range that holds all of a recording's energy but `rest` of it on either side.
-Span energetic_range(const Pcm &pcm, int32_t rate_hz, double rest) {
-  std::vector<double> energy;
-  double sum = 0;
-  for (const std::int16_t sample : pcm) energy.push_back(sum += double(sample) * sample);
-  const auto time_of = [&](double share) {
-    const auto at = std::lower_bound(energy.begin(), energy.end(), share * sum);
-    return double(at - energy.begin()) / rate_hz;
-  };
-  return {time_of(rest), time_of(1 - rest)};
-}
-
-/// Of sentences and spoken cards, at 16 kHz.
-std::vector<std::string> ten_names() {
-  std::vector<std::string> names(std::begin(kSentences), std::end(kSentences));
-  for (const char *name : {"001", "002", "003", "004", "005"})
-    names.push_back(std::string("cards/") + name + ".wav");
-  return names;
-}
-
-std::vector<Pcm> ten_recordings() {
-  std::vector<Pcm> recordings;
-  for (const std::string &name : ten_names()) recordings.push_back(speech_16k(name));
-  return recordings;
-}
-
-TEST(Recordings, EachIsOneUtteranceWhereItsSpeechIs) {
-  struct Recording {
-    std::string name;
-    int32_t rate_hz;
-  };
-  std::vector<Recording> recordings = {{"goforward.raw", 16000},
-                                       {"something.raw", 16000},
-                                       {"tidigits/dhd.2934z.raw", 16000},
-                                       {"wav/hts1a.wav", 8000},
-                                       {"wav/big_dog.wav", 8000}};
-  for (const std::string &name : ten_names()) recordings.push_back({name, 16000});
-  // At 60 dB the noise only keeps the pauses from being null audio. The first two are for all.
-  const std::tuple<NoiseColour, double, double> kNoises[] = {{NoiseColour::kWhite, 60, 0.05},
-                                                             {NoiseColour::kPink, 20, 0.05},
-                                                             {NoiseColour::kWhite, 20, 0.05},
-                                                             {NoiseColour::kWhite, 10, 0.2},
-                                                             {NoiseColour::kPink, 10, 0.2}};
-  for (const auto &[name, rate_hz] : recordings) {
-    const Pcm speech = rate_hz == 16000 ? speech_16k(name) : speech_8k(name);
-    const Span loud = energetic_range(speech, rate_hz, 0.005);
-    const Span all = energetic_range(speech, rate_hz, 0.0001);
-    for (const auto &[colour, below_db, slack_s] :
-         std::span(kNoises).first(rate_hz == 8000 ? 2 : 5)) {
-      SCOPED_TRACE(testing::Message() << name << " in noise at " << below_db << " dB");
-      const double level = speech_level(speech, rate_hz) - below_db;
-      const auto found =
-          utterances_of(in_noise(speech, rate_hz * 3 / 2, colour, level), unpadded(rate_hz));
-      ASSERT_EQ(found.size(), 1U);
-      const double start_s = found[0].start_s - 1.5, end_s = found[0].end_s - 1.5;
-      EXPECT_LT(start_s, loud.start_s + slack_s / 2);
-      EXPECT_GT(end_s, loud.end_s - slack_s);
-      EXPECT_GT(start_s, all.start_s - 0.1);
-      EXPECT_LT(end_s, all.end_s + 0.1);
-    }
-  }
-}
-
 /// Whether each frame of a recording is within 30 dB of the loudest.
 std::vector<bool> speech_frames(const Pcm &speech) {
   const auto levels = frame_levels(speech, 160);
@@ -126,15 +63,66 @@ std::vector<bool> speech_frames(const Pcm &speech) {
   return is_speech;
 }
 
+/// Sentences and spoken cards at 16 kHz.
+std::vector<Pcm> ten_recordings() {
+  std::vector<Pcm> recordings;
+  for (const char *name : kSentences) recordings.push_back(speech_16k(name));
+  for (const char number : {'1', '2', '3', '4', '5'})
+    recordings.push_back(speech_16k(std::string("cards/00") + number + ".wav"));
+  return recordings;
+}
+
+/// The range that holds all of a recording's energy but `rest` of it on either side.
+Span energetic_range(const Pcm &pcm, int32_t rate_hz, double rest) {
+  std::vector<double> energy;
+  double sum = 0;
+  for (const std::int16_t sample : pcm) energy.push_back(sum += double(sample) * sample);
+  const auto time_of = [&](double share) {
+    const auto at = std::ranges::lower_bound(energy, share * sum);
+    return double(at - energy.begin()) / rate_hz;
+  };
+  return {time_of(rest), time_of(1 - rest)};
+}
+
+TEST(Recordings, EachIsOneUtteranceWhereItsSpeechIs) {
+  std::vector<Pcm> recordings = ten_recordings();
+  for (const char *name : {"goforward.raw", "something.raw", "tidigits/dhd.2934z.raw"})
+    recordings.push_back(speech_16k(name));
+  const auto wide = std::ssize(recordings);
+  for (const char *name : {"wav/hts1a.wav", "wav/big_dog.wav"})
+    recordings.push_back(speech_8k(name));
+  // At 60 dB the noise only keeps the pauses from being null audio. The first two are for all.
+  const std::tuple<NoiseColour, double, double> kNoises[] = {{NoiseColour::kWhite, 60, 0.05},
+                                                             {NoiseColour::kPink, 20, 0.05},
+                                                             {NoiseColour::kWhite, 20, 0.05},
+                                                             {NoiseColour::kWhite, 10, 0.2},
+                                                             {NoiseColour::kPink, 10, 0.2}};
+  UtteranceSettings settings = unpadded();
+  for (std::ptrdiff_t i = 0; i < std::ssize(recordings); ++i) {
+    settings.rate_hz = i < wide ? 16000 : 8000;
+    const Span loud = energetic_range(recordings[i], settings.rate_hz, 0.005);
+    const Span audible = energetic_range(recordings[i], settings.rate_hz, 0.0001);
+    for (const auto &[colour, below_db, slack_s] : std::span(kNoises).first(i < wide ? 5 : 2)) {
+      const double level = speech_level(recordings[i], settings.rate_hz) - below_db;
+      const Pcm noisy = in_noise(recordings[i], settings.rate_hz * 3 / 2, colour, level);
+      const auto found = utterances_of(noisy, settings);
+      SCOPED_TRACE(testing::Message() << "recording " << i << " at " << below_db << " dB");
+      ASSERT_EQ(found.size(), 1U);
+      EXPECT_LT(found[0].start_s - 1.5, loud.start_s + slack_s / 2);
+      EXPECT_GT(found[0].end_s - 1.5, loud.end_s - slack_s);
+      EXPECT_GT(found[0].start_s - 1.5, audible.start_s - 0.1);
+      EXPECT_LT(found[0].end_s - 1.5, audible.end_s + 0.1);
+    }
+  }
+}
+
 TEST(Recordings, ALeadInFindsTheFirstWordAndSpeechThroughout) {
-  UtteranceSettings without = unpadded(), with = without, reference = mcra();
-  with.lead_in = 1;
-  reference.pad_before_ms = reference.pad_after_ms = 0;
   const auto share_found = [](const Pcm &pcm, const UtteranceSettings &settings) {
     double sum = 0;
     for (const auto &[start_s, end_s] : utterances_of(pcm, settings)) sum += end_s - start_s;
     return 16000 * sum / double(pcm.size());
   };
+  const UtteranceSettings without = unpadded(), with = with_lead_in(without);
   Pcm all;
   for (const Pcm &speech : ten_recordings()) {
     const auto late = utterances_of(speech, without), found = utterances_of(speech, with);
@@ -142,7 +130,7 @@ TEST(Recordings, ALeadInFindsTheFirstWordAndSpeechThroughout) {
     ASSERT_EQ(found.size(), 1U);
     EXPECT_DOUBLE_EQ(late[0].start_s, 0.39) << "the detector finds nothing before";
     EXPECT_LT(found[0].start_s, 0.30);
-    EXPECT_NEAR(found[0].start_s, utterances_of(speech, reference)[0].start_s, 0.135);
+    EXPECT_NEAR(found[0].start_s, utterances_of(speech, unpadded(mcra()))[0].start_s, 0.135);
     EXPECT_NEAR(found[0].end_s, late[0].end_s, 0.025);
 
     Pcm dense;
@@ -155,15 +143,9 @@ TEST(Recordings, ALeadInFindsTheFirstWordAndSpeechThroughout) {
   EXPECT_GT(share_found(all, with), 0.99);
 }
 
-enum class Background { kWhite, kPink, kBabble };
-
-/// Of unit power. Babble is all recordings but one over and over, equally loud.
-std::vector<double> unit_background(Background kind, const std::vector<Pcm> &recordings,
-                                    std::size_t without, std::size_t samples) {
-  if (kind != Background::kBabble)
-    return unit_noise(samples,
-                      kind == Background::kWhite ? NoiseColour::kWhite : NoiseColour::kPink,
-                      20260705 + static_cast<unsigned>(without));
+/// The recordings, all but one, over and over and equally loud; of unit power.
+std::vector<double> babble(const std::vector<Pcm> &recordings, std::size_t without,
+                           std::size_t samples) {
   std::vector<double> babble(samples);
   for (std::size_t other = 0; other < recordings.size(); ++other) {
     if (other == without) continue;
@@ -180,86 +162,79 @@ std::vector<double> unit_background(Background kind, const std::vector<Pcm> &rec
 
 /// How much of the speech lies in utterances, and how much of the utterances lies beside it.
 struct Coverage {
-  int speech = 0, kept = 0, recordings = 0;
-  double beyond_s = 0;
+  double speech = 0, kept = 0, beyond_s = 0;
 
   void take(const std::vector<bool> &is_speech, const std::vector<Span> &spans) {
-    int first = 1 << 30, last = 0;
-    for (int i = 0; i < std::ssize(is_speech); ++i) {
-      if (!is_speech[static_cast<std::size_t>(i)]) continue;
-      const double middle_s = 0.01 * i + 0.005;
-      first = std::min(first, i);
-      last = i + 1;
-      ++speech;
-      kept += std::ranges::any_of(
-          spans, [=](const Span &s) { return s.start_s <= middle_s && middle_s < s.end_s; });
+    for (std::size_t i = 0; i < is_speech.size(); ++i) {
+      const double middle_s = 0.01 * double(i) + 0.005;
+      speech += is_speech[i];
+      kept += is_speech[i] && std::ranges::any_of(spans, [=](const Span &s) {
+                return s.start_s <= middle_s && middle_s < s.end_s;
+              });
     }
-    for (const auto &[start_s, end_s] : spans) {
-      beyond_s += std::max(0.0, std::min(end_s, 0.01 * first) - start_s) +
-                  std::max(0.0, end_s - std::max(start_s, 0.01 * last));
-    }
-    ++recordings;
+    const auto first = std::ranges::find(is_speech, true) - is_speech.begin();
+    const auto behind = std::find(is_speech.rbegin(), is_speech.rend(), true) - is_speech.rbegin();
+    const Span words = {0.01 * double(first), 0.01 * double(std::ssize(is_speech) - behind)};
+    for (const auto &[start_s, end_s] : spans)
+      beyond_s += std::max(0.0, std::min(end_s, words.start_s) - start_s) +
+                  std::max(0.0, end_s - std::max(start_s, words.end_s));
   }
-  double percent() const { return 100.0 * kept / speech; }
-  double beyond_ms() const { return 1000 * beyond_s / recordings; }
+  double percent() const { return 100 * kept / speech; }
 };
 
 TEST(Recordings, WordsAreKept) {
   const struct {
-    const char *name;
-    Background kind;
+    const char *background;
     double below_db;
     double min_kept[5];  // in percent, of each way below
-  } kMixes[] = {{"clean", Background::kWhite, 60, {88, 96, 99, 96, 99}},
-                {"white 20 dB", Background::kWhite, 20, {88, 96, 98, 95, 98}},
-                {"white 10 dB", Background::kWhite, 10, {85, 95, 97, 90, 97}},
-                {"white  5 dB", Background::kWhite, 5, {80, 93, 95, 74, 92}},
-                {"white  0 dB", Background::kWhite, 0, {63, 80, 83, 36, 61}},
-                {"pink  20 dB", Background::kPink, 20, {88, 96, 98, 95, 98}},
-                {"pink  10 dB", Background::kPink, 10, {87, 95, 97, 90, 97}},
-                {"pink   5 dB", Background::kPink, 5, {76, 89, 91, 73, 90}},
-                {"pink   0 dB", Background::kPink, 0, {37, 59, 62, 33, 52}},
-                {"babble 20 dB", Background::kBabble, 20, {88, 96, 99, 98, 99}},
-                {"babble 10 dB", Background::kBabble, 10, {89, 96, 99, 99, 99}},
-                {"babble  5 dB", Background::kBabble, 5, {91, 97, 99, 99, 99}},
-                {"babble  0 dB", Background::kBabble, 0, {85, 91, 98, 99, 99}}};
-  UtteranceSettings ways[5] = {unpadded(), UTTERANCE_SETTINGS_DEFAULT, UTTERANCE_SETTINGS_DEFAULT,
-                               mcra(), mcra()};
-  ways[2].lead_in = 1;
-  ways[3].pad_before_ms = ways[3].pad_after_ms = 0;
+  } kMixes[] = {{"white", 60, {88, 96, 99, 96, 99}},  {"white", 20, {88, 96, 98, 95, 98}},
+                {"white", 10, {85, 95, 97, 90, 97}},  {"white", 5, {80, 93, 95, 74, 92}},
+                {"white", 0, {63, 80, 83, 36, 61}},   {"pink", 20, {88, 96, 98, 95, 98}},
+                {"pink", 10, {87, 95, 97, 90, 97}},   {"pink", 5, {76, 89, 91, 73, 90}},
+                {"pink", 0, {37, 59, 62, 33, 52}},    {"babble", 20, {88, 96, 99, 98, 99}},
+                {"babble", 10, {89, 96, 99, 99, 99}}, {"babble", 5, {91, 97, 99, 99, 99}},
+                {"babble", 0, {85, 91, 98, 99, 99}}};
+  const UtteranceSettings ways[] = {unpadded(), UTTERANCE_SETTINGS_DEFAULT, with_lead_in(),
+                                    unpadded(mcra()), mcra()};
   const auto recordings = ten_recordings();
-  std::printf(
-      "               channel energy               MCRA              beyond the words [ms]\n"
-      "background       bare  padded  and lead-in    bare  padded     channel energy   MCRA\n");
-  for (const auto &[name, kind, below_db, min_kept] : kMixes) {
+  std::puts(
+      "background: kept by channel energy bare, padded, and with lead-in, by MCRA bare and padded "
+      "[%]");
+  for (const auto &[background, below_db, min_kept] : kMixes) {
+    const std::string kind = background;
     Coverage found[5];
     for (std::size_t r = 0; r < recordings.size(); ++r) {
       const Pcm &speech = recordings[r];
       Pcm mixed(speech.size() + 24000);
-      const auto background = unit_background(kind, recordings, r, mixed.size());
+      const auto noise =
+          kind == "babble"
+              ? babble(recordings, r, mixed.size())
+              : unit_noise(mixed.size(), kind == "white" ? NoiseColour::kWhite : NoiseColour::kPink,
+                           20260705 + static_cast<unsigned>(r));
       const double level = std::pow(10, (speech_level(speech, 16000) - below_db) / 20);
       for (std::size_t i = 0; i < mixed.size(); ++i)
-        mixed[i] = to_sample(level * background[i] + (i < speech.size() ? speech[i] : 0));
+        mixed[i] = to_sample(level * noise[i] + (i < speech.size() ? speech[i] : 0));
       for (int way = 0; way < 5; ++way)
         found[way].take(speech_frames(speech), utterances_of(mixed, ways[way]));
     }
-    std::printf("%-13s  %5.1f   %5.1f        %5.1f   %5.1f   %5.1f     %14.0f  %5.0f\n", name,
-                found[0].percent(), found[1].percent(), found[2].percent(), found[3].percent(),
-                found[4].percent(), found[2].beyond_ms(), found[4].beyond_ms());
-    for (int way = 0; way < 5; ++way) EXPECT_GT(found[way].percent(), min_kept[way]) << name;
-    EXPECT_GT(found[2].percent(), found[1].percent()) << name;
-    EXPECT_TRUE(kind == Background::kBabble || found[2].beyond_ms() < 250) << name;
+    std::printf("%s at %.0f dB:", background, below_db);
+    for (const Coverage &way : found) std::printf(" %.1f", way.percent());
+    std::printf("; beyond the words %.0f and %.0f ms\n", 100 * found[2].beyond_s,
+                100 * found[4].beyond_s);
+    for (int way = 0; way < 5; ++way) EXPECT_GT(found[way].percent(), min_kept[way]) << kind;
+    EXPECT_GT(found[2].percent(), found[1].percent()) << kind;
+    EXPECT_TRUE(kind == "babble" || found[2].beyond_s < 2.5) << kind;
   }
 }
 
 TEST(Recordings, SteadyNoiseHoldsNoUtterance) {
+  UtteranceSettings settings = unpadded();
   for (const int32_t rate_hz : {16000, 8000}) {
+    settings.rate_hz = rate_hz;
     for (const double dbfs : {-50.0, -30.0}) {
       const double level = 20 * std::log10(32768) + dbfs;
-      const Pcm noise =
-          in_noise({}, static_cast<std::size_t>(rate_hz) * 30, NoiseColour::kWhite, level);
-      EXPECT_TRUE(utterances_of(noise, unpadded(rate_hz)).empty())
-          << rate_hz << " Hz, " << dbfs << " dBFS";
+      const Pcm noise = in_noise({}, rate_hz * 30, NoiseColour::kWhite, level);
+      EXPECT_TRUE(utterances_of(noise, settings).empty()) << rate_hz << " Hz, " << dbfs << " dBFS";
     }
   }
 }
