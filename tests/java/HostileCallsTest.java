@@ -70,19 +70,17 @@ class HostileCallsTest {
           case 3 -> Loquent.processDRC(handle == 0 ? pick(0, -1) : drc, pcm, count);
           case 4 -> Loquent.computeEnergyFrame(pcm, count, rate);
           case 5 -> Loquent.getSpectrum(pcm, bins, rate);
-          default -> Loquent.resetEPDparams(handle * epd) + Loquent.LogEpdSetting(handle * epd, rate);
+          default ->
+              Loquent.resetEPDparams(handle * epd) + Loquent.LogEpdSetting(handle * epd, rate);
         };
         boolean tooMany = method < 5 && count > 0
             && (pcm == null || count > pcm.length
                 || method == 2 && (out == null || count > out.length));
-        if (tooMany) {
-          ++refused;
-          assertEquals(-1, result, repeat);
-        }
-        if (method == 5) {
-          boolean enough = pcm != null && bins != null && pcm.length >= 160 && bins.length >= 128;
-          assertEquals(enough ? 1 : 0, result, repeat);
-        }
+        if (tooMany) ++refused;
+        if (tooMany || handle == 0 && method < 4) assertEquals(-1, result, repeat);
+        if (handle == 0 && method == 6) assertEquals(-2, result, repeat);
+        boolean enough = pcm != null && bins != null && pcm.length >= 160 && bins.length >= 128;
+        if (method == 5) assertEquals(enough ? 1 : 0, result, repeat);
         boolean inPlace = method == 3 || method == 2 && out == pcm;
         if (result == -1 || !inPlace) assertArrayEquals(before, pcm, repeat);
         if (result == -1) assertArrayEquals(outBefore, out, repeat);

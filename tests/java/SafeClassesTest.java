@@ -88,14 +88,13 @@ class SafeClassesTest {
   void loudnessIsThatOfTheLastFrame() {
     short[] frame = new short[160];
     Arrays.fill(frame, (short) 20000);
-    try (DynamicsControl drc = new DynamicsControl()) {
-      drc.push(frame, 0, 159);
-      assertFalse(drc.isLoud());
-      drc.push(frame, 0, 1);
-      assertTrue(drc.isLoud());
-      drc.push(new short[1760]);
-      assertFalse(drc.isLoud());
-    }
+    DynamicsControl drc = new DynamicsControl();
+    drc.push(frame, 0, 159);
+    assertFalse(drc.isLoud());
+    drc.push(frame, 0, 1);
+    assertTrue(drc.isLoud());
+    drc.push(new short[1760]);
+    assertFalse(drc.isLoud());
   }
 
   @Test
@@ -103,10 +102,9 @@ class SafeClassesTest {
     short[] pcm = new short[10];
     for (int kind = 0; kind < Target.KINDS; ++kind) {
       Target target = Target.of(kind);
-      for (int[] range : new int[][] {{-1, 1}, {0, 11}, {10, 1}, {5, -1}, {1 << 30, 1 << 30}}) {
-        assertMisuse(
-            IllegalArgumentException.class, () -> target.push().push(pcm, range[0], range[1]));
-      }
+      for (int[] range : new int[][] {{-1, 1}, {0, 11}, {10, 1}, {5, -1}, {1 << 30, 1 << 30}})
+        assertMisuse(IllegalArgumentException.class,
+            () -> target.push().push(pcm, range[0], range[1]));
       assertMisuse(IllegalArgumentException.class, () -> target.push().push(null, 0, 0));
       for (int i = 0; i < 2; ++i) {
         assertEquals("", target.flush().get());
@@ -119,28 +117,18 @@ class SafeClassesTest {
       }
     }
     EndPointDetector.Settings settings = EndPointDetector.at(16000);
-    assertMisuse(
-        IllegalArgumentException.class,
-        () -> EndPointDetector.at(44100),
-        () -> settings.inputGain(3),
-        () -> settings.inputGain(-1),
-        () -> settings.hangoverMillis(-1),
-        () -> settings.padBeforeMillis(-1),
-        () -> settings.padAfterMillis(-1),
-        () -> settings.minSpeechMillis(-1),
-        () -> settings.method(null),
-        () -> settings.open().push(null),
-        () -> new DynamicsControl().push(null),
+    assertMisuse(IllegalArgumentException.class,
+        () -> EndPointDetector.at(44100), () -> settings.method(null),
+        () -> settings.inputGain(3), () -> settings.inputGain(-1),
+        () -> settings.hangoverMillis(-1), () -> settings.minSpeechMillis(-1),
+        () -> settings.padBeforeMillis(-1), () -> settings.padAfterMillis(-1),
+        () -> settings.open().push(null), () -> new DynamicsControl().push(null),
         () -> NoiseSuppressor.forTwoMicrophones().push(null),
-        () -> NoiseSuppressor.forOneMicrophone(null),
-        () -> EngineLog.toLogger(null));
+        () -> NoiseSuppressor.forOneMicrophone(null), () -> EngineLog.toLogger(null));
     NoiseSuppressor pair = NoiseSuppressor.forTwoMicrophones();
     pair.push(new short[3]);
-    assertMisuse(
-        IllegalStateException.class,
-        pair::flush,
-        () -> new NativeHandle(this, 0, x -> {}),
-        () -> new NativeHandle(this, -1, x -> {}));
+    assertMisuse(IllegalStateException.class, pair::flush,
+        () -> new NativeHandle(this, 0, x -> {}), () -> new NativeHandle(this, -1, x -> {}));
   }
 
   private static void assertMisuse(Class<? extends RuntimeException> kind, Executable... calls) {
@@ -176,13 +164,12 @@ class SafeClassesTest {
   void linesGoWhereTheyAreSent() {
     List<String> lines = LoquentTest.linesOf(() -> new DynamicsControl().close());
     assertTrue(lines.get(0).startsWith("FINE Create DRC, SamplingRate : 16000"), lines.toString());
-    lines = LoquentTest.linesOf(() -> Loquent.computeEnergyFrame(null, 160, 16000));
-    assertEquals(
-        List.of("SEVERE TQE: computeEnergyFrame: 160 samples asked of an array of 0"), lines);
     lines = LoquentTest.linesOf(() -> {
+      Loquent.computeEnergyFrame(null, 160, 16000);
       EngineLog.off();
       new DynamicsControl().close();
     });
-    assertEquals(List.of(), lines);
+    String line = "SEVERE TQE: computeEnergyFrame: 160 samples asked of an array of 0";
+    assertEquals(List.of(line), lines);
   }
 }

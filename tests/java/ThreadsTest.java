@@ -19,7 +19,6 @@ import java.util.concurrent.Future;
 import java.util.concurrent.ThreadLocalRandom;
 import java.util.concurrent.TimeUnit;
 import java.util.concurrent.atomic.AtomicInteger;
-import java.util.concurrent.atomic.AtomicReferenceArray;
 import org.junit.jupiter.api.BeforeEach;
 import org.junit.jupiter.api.Tag;
 import org.junit.jupiter.api.Test;
@@ -28,7 +27,7 @@ import org.junit.jupiter.api.Test;
 class ThreadsTest {
   private static final int CALLS = Integer.getInteger("calls", 20_000);
 
-  private final AtomicReferenceArray<Target> targets = new AtomicReferenceArray<>(16);
+  private final Target[] targets = new Target[16]; // racing on purpose
   private final AtomicInteger calls = new AtomicInteger();
   private final AtomicInteger refusals = new AtomicInteger();
 
@@ -41,9 +40,8 @@ class ThreadsTest {
   private static <T> Set<T> onThreads(int count, Callable<T> work) throws Exception {
     ExecutorService pool = Executors.newFixedThreadPool(count);
     Set<T> results = new HashSet<>();
-    for (Future<T> one : pool.invokeAll(Collections.nCopies(count, work), 500, TimeUnit.SECONDS)) {
+    for (Future<T> one : pool.invokeAll(Collections.nCopies(count, work), 500, TimeUnit.SECONDS))
       results.add(one.get());
-    }
     pool.shutdown();
     return results;
   }
@@ -105,13 +103,13 @@ class ThreadsTest {
 
   private void callAtRandom() {
     ThreadLocalRandom random = ThreadLocalRandom.current();
-    int at = random.nextInt(targets.length());
-    Target target = targets.get(at);
+    int at = random.nextInt(targets.length);
+    Target target = targets[at];
     calls.incrementAndGet();
     switch (random.nextInt(8)) {
       case 0 -> target.close().run();
       case 1 -> target.flush().get();
-      case 2, 3 -> targets.set(at, Target.of(random.nextInt(Target.KINDS))); // the old one is open
+      case 2, 3 -> targets[at] = Target.of(random.nextInt(Target.KINDS)); // the old one is open
       default -> target.push().push(new short[8000], 0, 2 * random.nextInt(4000));
     }
   }
@@ -119,7 +117,7 @@ class ThreadsTest {
   /** Nothing crashes or hangs; only handlers are refused, other threads wait. */
   @Test
   void handlersAndThreadsCallAtRandom() {
-    for (int i = 0; i < targets.length(); ++i) targets.set(i, Target.of(i % Target.KINDS));
+    Arrays.setAll(targets, i -> Target.of(i % Target.KINDS));
     Callable<Boolean> work = () -> {
       while (calls.get() < CALLS) assertFalse(isRefused(this::callAtRandom));
       return true;
