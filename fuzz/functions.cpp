@@ -64,42 +64,31 @@ void query(std::uint8_t choice, Input &input) {
   const std::int32_t rate_hz = 100 * (input.number() % 1000);
   Samples audio = input.audio();
   const auto count = static_cast<std::int32_t>(audio.size());
-  const auto exactly = [&](std::size_t size) {
-    audio.resize(size);
+  const auto exactly = [&](std::int32_t size) {
+    audio.resize(static_cast<std::size_t>(size));
     return Samples(audio.begin(), audio.end());
   };
-  const bool flag = (choice & 16) != 0, is_inverse = (choice & 32) != 0;
+  const bool flag = (choice & 16) != 0;
+  const std::int16_t sign = (choice & 32) != 0 ? -1 : 1;
   std::vector<std::int32_t> re(flag ? 512 : 256), im(re.size());
-  switch (choice % 4) {
-    case 0: {
-      const std::int32_t energy = computeEnergy(audio.data(), count);
-      require(energy >= 0 && energy <= 90, "an energy is 0 to 90 dB");
-      // The last block is processed whole.
-      const std::int32_t block = std::max(rate_hz / 50, 1);
-      const Samples blocks = exactly(static_cast<std::size_t>((count + block - 1) / block * block));
-      ComputeEnergy(blocks.data(), count, rate_hz);
-      break;
-    }
-    case 1:
-      re.assign(flag ? ORVALIS_BINS_16K : ORVALIS_BINS_8K, -1);
-      getSpectrum(exactly(flag ? 160 : 80).data(), re.data(), flag ? 16000 : 8000);
-      for (const std::int32_t power : re)
-        require(power >= 0 && power <= 1 << 30, "a power is 0 to 2^30");
-      break;
-    case 2:
-      r_fft_epd(exactly(flag ? 128 : 256).data(), is_inverse ? -1 : 1, flag);
-      r_fft_ns(exactly(256).data(), is_inverse ? -1 : 1);
-      break;
-    default: {
-      audio.resize(std::clamp<std::size_t>(audio.size(), 1, re.size()));
-      const Samples frame = exactly(audio.size());
-      const auto length = static_cast<std::int32_t>(frame.size());
-      flag ? Noscale_FFT_512p_Frame(frame.data(), length, re.data(), im.data())
-           : Noscale_FFT_256p_Frame_64bit(frame.data(), length, re.data(), im.data());
-      audio.resize(512);
-      std::vector<float> data(audio.begin(), audio.end());
-      r_fft(data.data(), is_inverse ? -1 : 1);
-    }
+  if (choice % 4 == 0) {
+    const std::int32_t energy = computeEnergy(audio.data(), count);
+    require(energy >= 0 && energy <= 90, "an energy is 0 to 90 dB");
+    const std::int32_t block = std::max(rate_hz / 50, 1);  // the last one is processed whole
+    ComputeEnergy(exactly((count + block - 1) / block * block).data(), count, rate_hz);
+  } else if (choice % 4 == 1) {
+    std::vector<std::int32_t> bins(flag ? ORVALIS_BINS_16K : ORVALIS_BINS_8K, -1);
+    getSpectrum(exactly(flag ? 160 : 80).data(), bins.data(), flag ? 16000 : 8000);
+    for (const std::int32_t power : bins) require(power >= 0 && power <= 1 << 30, "a power");
+  } else if (choice % 4 == 2) {
+    r_fft_epd(exactly(flag ? 128 : 256).data(), sign, flag);
+    r_fft_ns(exactly(256).data(), sign);
+  } else {
+    const std::int32_t length = std::clamp<std::int32_t>(count, 1, flag ? 512 : 256);
+    const auto transform = flag ? Noscale_FFT_512p_Frame : Noscale_FFT_256p_Frame_64bit;
+    transform(exactly(length).data(), length, re.data(), im.data());
+    const Samples samples = exactly(512);
+    r_fft(std::vector<float>(samples.begin(), samples.end()).data(), sign);
   }
 }
 

@@ -20,6 +20,8 @@ import java.util.logging.Level;
 import java.util.logging.Logger;
 import org.junit.jupiter.api.BeforeEach;
 import org.junit.jupiter.api.Test;
+import org.junit.jupiter.params.ParameterizedTest;
+import org.junit.jupiter.params.provider.CsvSource;
 
 /** The raw methods: what they return, what they do to arrays, and their loading. */
 class LoquentTest {
@@ -101,22 +103,23 @@ class LoquentTest {
   }
 
   /** A partial last frame counts as if zeros followed, whatever lies behind it in the array. */
-  @Test
-  void partialFramesAreFollowedByZeros() {
+  @ParameterizedTest
+  @CsvSource({"900,960", "500,640"}) // copied to the heap, and to the stack
+  void partialFramesAreFollowedByZeros(int count, int whole) {
     short[] pcm = Arrays.copyOfRange(Audio.COMMAND, 8000, 8000 + 1920);
-    short[] padded = Arrays.copyOf(Arrays.copyOf(pcm, 900), 1920);
+    short[] padded = Arrays.copyOf(Arrays.copyOf(pcm, count), 1920);
     for (int microphones = 1; microphones <= 2; ++microphones) {
-      short[] out = suppressed(0, microphones, pcm, 900);
-      short[] expected = Arrays.copyOf(suppressed(0, microphones, padded, 960), 900);
+      short[] out = suppressed(0, microphones, pcm, count);
+      short[] expected = Arrays.copyOf(suppressed(0, microphones, padded, whole), count);
       assertArrayEquals(Arrays.copyOf(expected, 1920), out);
     }
     // With frames of 80 samples the suppressor reaches 80 samples beyond the last one.
     assertNotEquals(0, suppressed(3000, 1, pcm, 1920)[1919]);
-    int energy = Loquent.computeEnergyFrame(padded, 960, 16000);
-    assertEquals(energy, Loquent.computeEnergyFrame(pcm, 900, 16000));
-    short[] expected = levelled(padded, 960);
-    System.arraycopy(pcm, 900, expected, 900, 1020);
-    assertArrayEquals(expected, levelled(pcm, 900));
+    int energy = Loquent.computeEnergyFrame(padded, whole, 16000);
+    assertEquals(energy, Loquent.computeEnergyFrame(pcm, count, 16000));
+    short[] expected = levelled(padded, whole);
+    System.arraycopy(pcm, count, expected, count, 1920 - count);
+    assertArrayEquals(expected, levelled(pcm, count));
   }
 
   private static short[] suppressed(int mode, int microphones, short[] pcm, int count) {

@@ -197,9 +197,8 @@ TEST(Recordings, WordsAreKept) {
   const UtteranceSettings ways[] = {unpadded(), UTTERANCE_SETTINGS_DEFAULT, with_lead_in(),
                                     unpadded(mcra()), mcra()};
   const auto recordings = ten_recordings();
-  std::puts(
-      "background: kept by channel energy bare, padded, and with lead-in, by MCRA bare and padded "
-      "[%]");
+  std::puts("               channel energy               MCRA              beyond the words [ms]");
+  std::puts("background       bare  padded  and lead-in    bare  padded     channel energy   MCRA");
   for (const auto &[background, below_db, min_kept] : kMixes) {
     const std::string kind = background;
     Coverage found[5];
@@ -217,9 +216,9 @@ TEST(Recordings, WordsAreKept) {
       for (int way = 0; way < 5; ++way)
         found[way].take(speech_frames(speech), utterances_of(mixed, ways[way]));
     }
-    std::printf("%s at %.0f dB:", background, below_db);
-    for (const Coverage &way : found) std::printf(" %.1f", way.percent());
-    std::printf("; beyond the words %.0f and %.0f ms\n", 100 * found[2].beyond_s,
+    std::printf("%-6s %2.0f dB   %5.1f   %5.1f        %5.1f   %5.1f   %5.1f     %14.0f  %5.0f\n",
+                background, below_db, found[0].percent(), found[1].percent(), found[2].percent(),
+                found[3].percent(), found[4].percent(), 100 * found[2].beyond_s,
                 100 * found[4].beyond_s);
     for (int way = 0; way < 5; ++way) EXPECT_GT(found[way].percent(), min_kept[way]) << kind;
     EXPECT_GT(found[2].percent(), found[1].percent()) << kind;
