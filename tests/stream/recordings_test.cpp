@@ -35,22 +35,13 @@ std::vector<Span> utterances_of(const Pcm &pcm, const UtteranceSettings &setting
   return spans;
 }
 
-UtteranceSettings unpadded(UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT) {
-  settings.pad_before_ms = settings.pad_after_ms = 0;
-  return settings;
-}
-
-UtteranceSettings with_lead_in(UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT) {
-  settings.lead_in = 1;
-  return settings;
-}
-
-/// The MCRA detector as `orvalis vad` takes it.
-UtteranceSettings mcra() {
+/// The default settings, and the MCRA detector as `orvalis vad` takes it.
+UtteranceSettings settings_of(bool is_mcra, bool is_padded, bool has_lead_in = false) {
   UtteranceSettings settings = UTTERANCE_SETTINGS_DEFAULT;
-  settings.detector = UTTERANCE_MCRA;
-  settings.hangover_ms = 300;
-  settings.min_speech_ms = 100;
+  if (is_mcra) settings.detector = UTTERANCE_MCRA;
+  if (is_mcra) settings.hangover_ms = 300, settings.min_speech_ms = 100;
+  if (!is_padded) settings.pad_before_ms = settings.pad_after_ms = 0;
+  settings.lead_in = has_lead_in;
   return settings;
 }
 
@@ -97,7 +88,7 @@ TEST(Recordings, EachIsOneUtteranceWhereItsSpeechIs) {
                                                              {NoiseColour::kWhite, 20, 0.05},
                                                              {NoiseColour::kWhite, 10, 0.2},
                                                              {NoiseColour::kPink, 10, 0.2}};
-  UtteranceSettings settings = unpadded();
+  UtteranceSettings settings = settings_of(false, false);
   for (std::ptrdiff_t i = 0; i < std::ssize(recordings); ++i) {
     settings.rate_hz = i < wide ? 16000 : 8000;
     const Span loud = energetic_range(recordings[i], settings.rate_hz, 0.005);
@@ -122,7 +113,7 @@ TEST(Recordings, ALeadInFindsTheFirstWordAndSpeechThroughout) {
     for (const auto &[start_s, end_s] : utterances_of(pcm, settings)) sum += end_s - start_s;
     return 16000 * sum / double(pcm.size());
   };
-  const UtteranceSettings without = unpadded(), with = with_lead_in(without);
+  const auto without = settings_of(false, false), with = settings_of(false, false, true);
   Pcm all;
   for (const Pcm &speech : ten_recordings()) {
     const auto late = utterances_of(speech, without), found = utterances_of(speech, with);
@@ -130,7 +121,8 @@ TEST(Recordings, ALeadInFindsTheFirstWordAndSpeechThroughout) {
     ASSERT_EQ(found.size(), 1U);
     EXPECT_DOUBLE_EQ(late[0].start_s, 0.39) << "the detector finds nothing before";
     EXPECT_LT(found[0].start_s, 0.30);
-    EXPECT_NEAR(found[0].start_s, utterances_of(speech, unpadded(mcra()))[0].start_s, 0.135);
+    EXPECT_NEAR(found[0].start_s, utterances_of(speech, settings_of(true, false))[0].start_s,
+                0.135);
     EXPECT_NEAR(found[0].end_s, late[0].end_s, 0.025);
 
     Pcm dense;
@@ -194,8 +186,9 @@ TEST(Recordings, WordsAreKept) {
                 {"pink", 0, {37, 59, 62, 33, 52}},    {"babble", 20, {88, 96, 99, 98, 99}},
                 {"babble", 10, {89, 96, 99, 99, 99}}, {"babble", 5, {91, 97, 99, 99, 99}},
                 {"babble", 0, {85, 91, 98, 99, 99}}};
-  const UtteranceSettings ways[] = {unpadded(), UTTERANCE_SETTINGS_DEFAULT, with_lead_in(),
-                                    unpadded(mcra()), mcra()};
+  const UtteranceSettings ways[] = {settings_of(false, false), settings_of(false, true),
+                                    settings_of(false, true, true), settings_of(true, false),
+                                    settings_of(true, true)};
   const auto recordings = ten_recordings();
   std::puts("               channel energy               MCRA              beyond the words [ms]");
   std::puts("background       bare  padded  and lead-in    bare  padded     channel energy   MCRA");
@@ -227,7 +220,7 @@ TEST(Recordings, WordsAreKept) {
 }
 
 TEST(Recordings, SteadyNoiseHoldsNoUtterance) {
-  UtteranceSettings settings = unpadded();
+  UtteranceSettings settings = settings_of(false, false);
   for (const int32_t rate_hz : {16000, 8000}) {
     settings.rate_hz = rate_hz;
     for (const double dbfs : {-50.0, -30.0}) {
