@@ -37,10 +37,6 @@ class HostileCallsTest {
     return pick(length, length, length, length - 1, length + 1, length / 2, -length, number());
   }
 
-  private static short[] copy(short[] array) {
-    return array == null ? null : array.clone();
-  }
-
   @Test
   void surviveByTheThousand() {
     EngineLog.off();
@@ -55,8 +51,8 @@ class HostileCallsTest {
         short[] pcm = array();
         short[] out = random.nextInt(10) == 0 ? pcm : array();
         int[] bins = random.nextInt(8) == 0 ? null : new int[pick(0, 1, 64, 127, 128, 129)];
-        short[] before = copy(pcm);
-        short[] outBefore = copy(out);
+        short[] before = pcm == null ? null : pcm.clone();
+        short[] outBefore = out == null ? null : out.clone();
         int count = count(pcm);
         int outCount = random.nextInt(4) == 0 ? number() : count;
         // Blocks of 20 ms at the highest rates are large: seldom.
@@ -76,7 +72,7 @@ class HostileCallsTest {
         boolean tooMany = method < 5 && count > 0
             && (pcm == null || count > pcm.length
                 || method == 2 && (out == null || count > out.length));
-        if (tooMany) ++refused;
+        refused += tooMany ? 1 : 0;
         if (tooMany || handle == 0 && method < 4) assertEquals(-1, result, repeat);
         if (handle == 0 && method == 6) assertEquals(-2, result, repeat);
         boolean enough = pcm != null && bins != null && pcm.length >= 160 && bins.length >= 128;

@@ -44,7 +44,7 @@ class LoquentTest {
     return digest;
   }
 
-  private static int detector(int mode, int contentType) {
+  static int detector(int mode, int contentType) {
     int frame = mode % 10000 == 1000 ? 80 : 160;
     long epd = Loquent.initializeEPD(mode, 0);
     int digest = digest(frame == 80 ? Audio.NARROW : Audio.SENTENCE, frame, pcm ->

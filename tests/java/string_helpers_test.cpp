@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <atomic>
+#include <cstdarg>
 #include <cstdlib>
 #include <latch>
 #include <memory>
@@ -26,11 +27,32 @@ std::string content;  // of the one array
 bool fails(const char *function) { return std::string(failing.load()) == function; }
 
 _jclass type;
-_jstring text;
+_jstring text, encoding;
 _jbyteArray array;
-int method;
-jobject give_bytes(JNIEnv *, jobject, jmethodID, ...) { return &array; }
-jobject give_text(JNIEnv *, jclass, jmethodID, ...) { return &text; }
+constexpr const char *kMethods[] = {"getBytes()[B", "getBytes(Ljava/lang/String;)[B", "<init>([B)V",
+                                    "<init>([BLjava/lang/String;)V"};
+
+/// The method by its number, with the encoding behind the other arguments if it takes one.
+int number_of(jmethodID id) { return static_cast<int>(reinterpret_cast<std::intptr_t>(id)) - 1; }
+
+jobject give_bytes(JNIEnv *, jobject given, jmethodID id, ...) {
+  va_list rest;
+  va_start(rest, id);
+  EXPECT_EQ(given, &text);
+  EXPECT_TRUE(number_of(id) == 0 || (number_of(id) == 1 && va_arg(rest, jobject) == &encoding));
+  va_end(rest);
+  return &array;
+}
+
+jobject give_text(JNIEnv *, jclass given, jmethodID id, ...) {
+  va_list rest;
+  va_start(rest, id);
+  EXPECT_EQ(given, &type);
+  EXPECT_EQ(va_arg(rest, jobject), &array);
+  EXPECT_TRUE(number_of(id) == 2 || (number_of(id) == 3 && va_arg(rest, jobject) == &encoding));
+  va_end(rest);
+  return &text;
+}
 
 JNINativeInterface_ make_functions() {
   JNINativeInterface_ java = {};
@@ -39,11 +61,13 @@ JNINativeInterface_ make_functions() {
     ++references;
     return fails("NewGlobalRef") ? nullptr : object;
   };
-  java.GetMethodID = [](JNIEnv *, jclass, const char *, const char *) {
-    return fails("GetMethodID") ? nullptr : reinterpret_cast<jmethodID>(&method);
+  java.GetMethodID = [](JNIEnv *, jclass, const char *name, const char *signature) {
+    const auto found = std::ranges::find(kMethods, std::string(name) + signature);
+    return fails("GetMethodID") ? nullptr : reinterpret_cast<jmethodID>(found - kMethods + 1);
   };
-  java.NewStringUTF = [](JNIEnv *, const char *) {
-    return fails("NewStringUTF") ? nullptr : &text;
+  java.NewStringUTF = [](JNIEnv *, const char *name) {
+    EXPECT_STREQ(name, "UTF-8");
+    return fails("NewStringUTF") ? nullptr : &encoding;
   };
   java.CallObjectMethod = give_bytes;
   java.NewObject = give_text;
@@ -123,6 +147,19 @@ TEST(StringHelpers, CopyUpToTheFirstZero) {
       EXPECT_TRUE(fails("NewByteArray") || content == given.c_str());
     }
   }
+}
+
+TEST(StringHelpers, ReturnNullForNull) {
+  SetLogSink(LogNothing, nullptr);
+  EXPECT_EQ(cstr2jbyteArray(&env, nullptr), nullptr);
+  EXPECT_EQ(jbyteArray2cstr(&env, nullptr), nullptr);
+  EXPECT_EQ(javaGetBytes(&env, nullptr), nullptr);
+  EXPECT_EQ(javaGetBytesEncoding(&env, nullptr, "UTF-8"), nullptr);
+  EXPECT_EQ(javaGetBytesEncoding(&env, &text, nullptr), nullptr);
+  EXPECT_EQ(javaNewString(&env, nullptr), nullptr);
+  EXPECT_EQ(javaNewStringEncoding(&env, nullptr, "UTF-8"), nullptr);
+  EXPECT_EQ(javaNewStringEncoding(&env, &array, nullptr), nullptr);
+  SetLogSink(nullptr, nullptr);
 }
 
 TEST(StringHelpers, FirstUseMayBeRaced) {
