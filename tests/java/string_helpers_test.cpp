@@ -56,7 +56,10 @@ jobject give_text(JNIEnv *, jclass given, jmethodID id, ...) {
 
 JNINativeInterface_ make_functions() {
   JNINativeInterface_ java = {};
-  java.FindClass = [](JNIEnv *, const char *) { return fails("FindClass") ? nullptr : &type; };
+  java.FindClass = [](JNIEnv *, const char *name) {
+    EXPECT_STREQ(name, "java/lang/String");
+    return fails("FindClass") ? nullptr : &type;
+  };
   java.NewGlobalRef = [](JNIEnv *, jobject object) {
     ++references;
     return fails("NewGlobalRef") ? nullptr : object;
@@ -97,9 +100,9 @@ JNINativeInterface_ make_functions() {
 const JNINativeInterface_ functions = make_functions();
 JNIEnv env = {&functions};
 
-/// Calls all helpers that reach methods of String, which have to succeed or not and to log these
-/// errors.
-void expect(bool get, bool get_named, bool make, bool make_named, const std::string &errors) {
+/// Calls all helpers that reach methods of String; those without an encoding have to succeed or
+/// not, so have those with one, and to log these errors.
+void expect(bool plain, bool named, const std::string &errors) {
   std::string lines;
   SetLogSink(
       [](int priority, const char *tag, const char *line, void *user) {
@@ -107,10 +110,10 @@ void expect(bool get, bool get_named, bool make, bool make_named, const std::str
           *static_cast<std::string *>(user) += std::string(line) + ";";
       },
       &lines);
-  EXPECT_EQ(javaGetBytes(&env, &text), get ? &array : nullptr) << failing;
-  EXPECT_EQ(javaGetBytesEncoding(&env, &text, "UTF-8"), get_named ? &array : nullptr) << failing;
-  EXPECT_EQ(javaNewString(&env, &array), make ? &text : nullptr) << failing;
-  EXPECT_EQ(javaNewStringEncoding(&env, &array, "UTF-8"), make_named ? &text : nullptr) << failing;
+  EXPECT_EQ(javaGetBytes(&env, &text), plain ? &array : nullptr) << failing;
+  EXPECT_EQ(javaGetBytesEncoding(&env, &text, "UTF-8"), named ? &array : nullptr) << failing;
+  EXPECT_EQ(javaNewString(&env, &array), plain ? &text : nullptr) << failing;
+  EXPECT_EQ(javaNewStringEncoding(&env, &array, "UTF-8"), named ? &text : nullptr) << failing;
   EXPECT_EQ(lines, errors) << failing;
   SetLogSink(nullptr, nullptr);
 }
@@ -121,15 +124,15 @@ TEST(StringHelpers, TellWhatFailedAndTryAgain) {
   for (const auto &[function, error] : {std::pair("FindClass", std::string("cls.error;")),
                                         {"NewGlobalRef", "class_String.error;"}}) {
     failing = function;
-    expect(false, false, false, false, get + error + get + error + make + error + error);
+    expect(false, false, get + error + get + error + make + error + error);
   }
   failing = "GetMethodID";
-  expect(false, false, false, false, get + no_get + get + no_get + make + no_make + no_make);
+  expect(false, false, get + no_get + get + no_get + make + no_make + no_make);
   failing = "NewStringUTF";
-  expect(true, false, true, false, get + get + make);
+  expect(true, false, get + get + make);
   failing = "";
   const int before = references;  // the class was kept from the time when only methods failed
-  for (int round = 0; round < 2; ++round) expect(true, true, true, true, get + get + make);
+  for (int round = 0; round < 2; ++round) expect(true, true, get + get + make);
   EXPECT_EQ(references, before);
 }
 

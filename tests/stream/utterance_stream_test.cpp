@@ -128,6 +128,7 @@ TEST(UtteranceStream, StopsWhenTheQueueIsFull) {
   FlushUtteranceStream(stream.get());
   const auto found = take(stream);
   EXPECT_EQ(found.size(), UTTERANCE_QUEUE_LENGTH + 1U);
+  for (std::size_t i = 0; i < found.size(); ++i) EXPECT_EQ(found[i].number, int(i) + 1);
   EXPECT_EQ(found.back().end, done) << "padded up to the end";
 }
 
