@@ -4,6 +4,9 @@ import static org.junit.jupiter.api.Assertions.assertArrayEquals;
 import static org.junit.jupiter.api.Assertions.assertEquals;
 import static org.junit.jupiter.api.Assertions.assertTrue;
 
+import java.util.ArrayList;
+import java.util.Collections;
+import java.util.List;
 import java.util.Random;
 import org.junit.jupiter.api.Test;
 
@@ -86,5 +89,25 @@ class HostileCallsTest {
       assertEquals(0, Loquent.freeMemoryDRC(drc));
     }
     assertTrue(refused > CALLS / 20, refused + " refused; " + repeat);
+  }
+
+  /** What chance does not try often, and the line that tells of a wrong array or count. */
+  @Test
+  void refusalsAreTold() {
+    long epd = Loquent.initializeEPD(0, 0);
+    long ns = Loquent.initializeDoNS(0, 1, 0);
+    short[] in = new short[160];
+    List<Integer> results = new ArrayList<>();
+    List<String> lines = LoquentTest.linesOf(() -> Collections.addAll(results,
+        Loquent.processEPDFrame(epd, null, 160), Loquent.processEPDFrame(epd, in, 161),
+        Loquent.processDoNSFrame(ns, in, 160, new short[159], 160),
+        Loquent.processDoNSFrame(ns, in, 160, in.clone(), 80), Loquent.freeMemoryEPD(0),
+        Loquent.freeMemoryDoNS(0), Loquent.freeMemoryDRC(0), Loquent.freeMemoryDRC(-1)));
+    assertEquals(Collections.nCopies(8, -1), results);
+    assertEquals(3, lines.stream().filter(line -> line.contains("asked of")).count());
+    assertEquals(0, Loquent.computeEnergyFrame(in, 160, 49), "no block, no energy");
+    assertEquals(0, Loquent.processEPDFrame(epd, null, -1), "no samples, no array");
+    Loquent.freeMemoryEPD(epd);
+    Loquent.freeMemoryDoNS(ns);
   }
 }

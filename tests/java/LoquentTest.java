@@ -138,33 +138,6 @@ class LoquentTest {
     return levelled;
   }
 
-  /** With a line for each wrong array or count. HostileCallsTest makes the rest of wrong calls. */
-  @Test
-  void wrongArgumentsAreRefused() {
-    long epd = Loquent.initializeEPD(0, 0);
-    long ns = Loquent.initializeDoNS(0, 1, 0);
-    short[] in = new short[160];
-    List<Integer> results = new ArrayList<>();
-    List<String> lines = linesOf(() -> Collections.addAll(results,
-        Loquent.processEPDFrame(epd, null, 160), Loquent.processEPDFrame(epd, in, 161),
-        Loquent.processDoNSFrame(ns, null, 160, in, 160),
-        Loquent.processDoNSFrame(ns, in, 160, null, 160),
-        Loquent.processDoNSFrame(ns, in, 160, new short[159], 160),
-        Loquent.computeEnergyFrame(in, 161, 16000)));
-    assertEquals(Collections.nCopies(6, -1), results);
-    assertEquals(6, lines.stream().filter(line -> line.contains("asked of")).count());
-    results.clear();
-    lines = linesOf(() -> Collections.addAll(results,
-        Loquent.processDoNSFrame(ns, in, 160, in.clone(), 80), Loquent.freeMemoryEPD(0),
-        Loquent.freeMemoryDoNS(0), Loquent.freeMemoryDRC(0), Loquent.freeMemoryDRC(-1)));
-    assertEquals(Collections.nCopies(5, -1), results);
-    assertEquals(List.of(), lines.stream().filter(line -> line.contains("asked of")).toList());
-    assertEquals(0, Loquent.computeEnergyFrame(in, 160, 49), "no block, no energy");
-    assertEquals(0, Loquent.processEPDFrame(epd, null, -1), "no samples, no array");
-    Loquent.freeMemoryEPD(epd);
-    Loquent.freeMemoryDoNS(ns);
-  }
-
   @Test
   void versionAndHangoverLinesAreTheEngines() {
     assertEquals("160705", Loquent.GetVersion());

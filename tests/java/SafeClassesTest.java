@@ -49,17 +49,15 @@ class SafeClassesTest {
     String one = "utterance 1: 3840 to 109920 (7200, 109920)\n";
     assertEquals(one, Target.of(settings).output(Audio.SENTENCE));
     settings.inputGain(1).contentType(2).hangoverMillis(90).padBeforeMillis(30).padAfterMillis(70);
-    assertEquals(
-        "utterance 1: 5760 to 34400 (6880, 35520)\nutterance 2: 36640 to 62720 (37760, 63840)\n"
-            + "utterance 3: 64640 to 73920 (65760, 75040)\n"
-            + "utterance 4: 92640 to 102880 (93760, 104000)\n",
-        Target.of(settings.minSpeechMillis(200)).output(Audio.SENTENCE));
-    String fourth = "utterance 4: 80960 to 102880 (82080, 104000)\n";
-    assertTrue(Target.of(settings.leadIn(true)).output(Audio.SENTENCE).endsWith(fourth));
+    String fourth = "utterance 4: 92640 to 102880 (93760, 104000)\n";
+    String found = Target.of(settings.minSpeechMillis(200)).output(Audio.SENTENCE);
+    assertTrue(found.startsWith("utterance 1: 5760 to") && found.endsWith(fourth), found);
+    found = Target.of(settings.leadIn(true)).output(Audio.SENTENCE);
+    assertTrue(found.endsWith("utterance 4: 80960 to 102880 (82080, 104000)\n"), found);
     String narrow = "utterance 1: 1920 to 21840 (3600, 22080)\n";
     assertEquals(narrow, Target.of(EndPointDetector.at(8000)).output(Audio.NARROW));
-    String mcra = "utterance 2: 2720 to 112800 (4160, 108800)\n";
-    assertTrue(Target.of(1).output(Audio.SENTENCE).endsWith(mcra));
+    found = Target.of(1).output(Audio.SENTENCE);
+    assertTrue(found.endsWith("utterance 2: 2720 to 112800 (4160, 108800)\n"), found);
     settings.method(EndPointDetector.Method.MCRA);
     assertMisuse(IllegalArgumentException.class, settings::open);
     assertMisuse(IllegalArgumentException.class, settings.inputGain(0)::open);
