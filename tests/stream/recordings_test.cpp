@@ -1,13 +1,11 @@
-// Where the utterances of real recordings lie, clean and in noise, against the recordings' own
-// energy.
+// How much of the speech of real recordings lies in utterances, clean and in noise, judged by the
+// recordings' own energy.
 #include <gtest/gtest.h>
 
 #include <algorithm>
 #include <cmath>
 #include <cstdio>
-#include <span>
 #include <string>
-#include <tuple>
 #include <vector>
 
 #include "jni/orvalis.h"
@@ -61,50 +59,6 @@ std::vector<Pcm> ten_recordings() {
   for (const char number : {'1', '2', '3', '4', '5'})
     recordings.push_back(speech_16k(std::string("cards/00") + number + ".wav"));
   return recordings;
-}
-
-/// The range that holds all of a recording's energy but `rest` of it on either side.
-Span energetic_range(const Pcm &pcm, int32_t rate_hz, double rest) {
-  std::vector<double> energy;
-  double sum = 0;
-  for (const std::int16_t sample : pcm) energy.push_back(sum += double(sample) * sample);
-  const auto time_of = [&](double share) {
-    const auto at = std::ranges::lower_bound(energy, share * sum);
-    return double(at - energy.begin()) / rate_hz;
-  };
-  return {time_of(rest), time_of(1 - rest)};
-}
-
-TEST(Recordings, EachIsOneUtteranceWhereItsSpeechIs) {
-  std::vector<Pcm> recordings = ten_recordings();
-  for (const char *name : {"goforward.raw", "something.raw", "tidigits/dhd.2934z.raw"})
-    recordings.push_back(speech_16k(name));
-  const auto wide = std::ssize(recordings);
-  for (const char *name : {"wav/hts1a.wav", "wav/big_dog.wav"})
-    recordings.push_back(speech_8k(name));
-  // At 60 dB the noise only keeps the pauses from being null audio. The first two are for all.
-  const std::tuple<NoiseColour, double, double> kNoises[] = {{NoiseColour::kWhite, 60, 0.05},
-                                                             {NoiseColour::kPink, 20, 0.05},
-                                                             {NoiseColour::kWhite, 20, 0.05},
-                                                             {NoiseColour::kWhite, 10, 0.2},
-                                                             {NoiseColour::kPink, 10, 0.2}};
-  UtteranceSettings settings = settings_of(false, false);
-  for (std::ptrdiff_t i = 0; i < std::ssize(recordings); ++i) {
-    settings.rate_hz = i < wide ? 16000 : 8000;
-    const Span loud = energetic_range(recordings[i], settings.rate_hz, 0.005);
-    const Span audible = energetic_range(recordings[i], settings.rate_hz, 0.0001);
-    for (const auto &[colour, below_db, slack_s] : std::span(kNoises).first(i < wide ? 5 : 2)) {
-      const double level = speech_level(recordings[i], settings.rate_hz) - below_db;
-      const Pcm noisy = in_noise(recordings[i], settings.rate_hz * 3 / 2, colour, level);
-      const auto found = utterances_of(noisy, settings);
-      SCOPED_TRACE(testing::Message() << "recording " << i << " at " << below_db << " dB");
-      ASSERT_EQ(found.size(), 1U);
-      EXPECT_LT(found[0].start_s - 1.5, loud.start_s + slack_s / 2);
-      EXPECT_GT(found[0].end_s - 1.5, loud.end_s - slack_s);
-      EXPECT_GT(found[0].start_s - 1.5, audible.start_s - 0.1);
-      EXPECT_LT(found[0].end_s - 1.5, audible.end_s + 0.1);
-    }
-  }
 }
 
 TEST(Recordings, ALeadInFindsTheFirstWordAndSpeechThroughout) {
