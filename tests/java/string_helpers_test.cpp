@@ -154,14 +154,13 @@ TEST(StringHelpers, CopyUpToTheFirstZero) {
 
 TEST(StringHelpers, ReturnNullForNull) {
   SetLogSink(LogNothing, nullptr);
-  EXPECT_EQ(cstr2jbyteArray(&env, nullptr), nullptr);
-  EXPECT_EQ(jbyteArray2cstr(&env, nullptr), nullptr);
-  EXPECT_EQ(javaGetBytes(&env, nullptr), nullptr);
-  EXPECT_EQ(javaGetBytesEncoding(&env, nullptr, "UTF-8"), nullptr);
-  EXPECT_EQ(javaGetBytesEncoding(&env, &text, nullptr), nullptr);
-  EXPECT_EQ(javaNewString(&env, nullptr), nullptr);
-  EXPECT_EQ(javaNewStringEncoding(&env, nullptr, "UTF-8"), nullptr);
-  EXPECT_EQ(javaNewStringEncoding(&env, &array, nullptr), nullptr);
+  for (const void *result : std::initializer_list<const void *>{
+           cstr2jbyteArray(&env, nullptr), jbyteArray2cstr(&env, nullptr),
+           javaGetBytes(&env, nullptr), javaGetBytesEncoding(&env, nullptr, "UTF-8"),
+           javaGetBytesEncoding(&env, &text, nullptr), javaNewString(&env, nullptr),
+           javaNewStringEncoding(&env, nullptr, "UTF-8"),
+           javaNewStringEncoding(&env, &array, nullptr)})
+    EXPECT_EQ(result, nullptr);
   SetLogSink(nullptr, nullptr);
 }
 
