@@ -21,8 +21,9 @@ namespace {
 
 constinit std::atomic<const char *> failing = "";  // name of the function that fails
 constinit std::atomic<int> references = 0;
-int copies = 0;       // of elements that were not given back
-std::string content;  // of the one array
+int copies = 0;                   // of elements that were not given back
+std::string content;              // of the one array
+thread_local std::string called;  // the numbers of the methods
 
 bool fails(const char *function) { return std::string(failing.load()) == function; }
 
@@ -32,14 +33,18 @@ _jbyteArray array;
 constexpr const char *kMethods[] = {"getBytes()[B", "getBytes(Ljava/lang/String;)[B", "<init>([B)V",
                                     "<init>([BLjava/lang/String;)V"};
 
-/// The method by its number, with the encoding behind the other arguments if it takes one.
-int number_of(jmethodID id) { return static_cast<int>(reinterpret_cast<std::intptr_t>(id)) - 1; }
+/// Notes the call. Whether the method takes an encoding.
+bool is_named(jmethodID id) {
+  const auto number = reinterpret_cast<std::intptr_t>(id) - 1;
+  called += std::to_string(number);
+  return number % 2 == 1;
+}
 
 jobject give_bytes(JNIEnv *, jobject given, jmethodID id, ...) {
   va_list rest;
   va_start(rest, id);
   EXPECT_EQ(given, &text);
-  EXPECT_TRUE(number_of(id) == 0 || (number_of(id) == 1 && va_arg(rest, jobject) == &encoding));
+  EXPECT_TRUE(!is_named(id) || va_arg(rest, jobject) == &encoding);
   va_end(rest);
   return &array;
 }
@@ -49,7 +54,7 @@ jobject give_text(JNIEnv *, jclass given, jmethodID id, ...) {
   va_start(rest, id);
   EXPECT_EQ(given, &type);
   EXPECT_EQ(va_arg(rest, jobject), &array);
-  EXPECT_TRUE(number_of(id) == 2 || (number_of(id) == 3 && va_arg(rest, jobject) == &encoding));
+  EXPECT_TRUE(!is_named(id) || va_arg(rest, jobject) == &encoding);
   va_end(rest);
   return &text;
 }
@@ -104,6 +109,7 @@ JNIEnv env = {&functions};
 /// not, so have those with one, and to log these errors.
 void expect(bool plain, bool named, const std::string &errors) {
   std::string lines;
+  called.clear();
   SetLogSink(
       [](int priority, const char *tag, const char *line, void *user) {
         if (priority == 6 && std::string(tag) == "Orvalis")
@@ -114,6 +120,7 @@ void expect(bool plain, bool named, const std::string &errors) {
   EXPECT_EQ(javaGetBytesEncoding(&env, &text, "UTF-8"), named ? &array : nullptr) << failing;
   EXPECT_EQ(javaNewString(&env, &array), plain ? &text : nullptr) << failing;
   EXPECT_EQ(javaNewStringEncoding(&env, &array, "UTF-8"), named ? &text : nullptr) << failing;
+  EXPECT_EQ(called, named ? "0123" : plain ? "02" : "") << failing;
   EXPECT_EQ(lines, errors) << failing;
   SetLogSink(nullptr, nullptr);
 }
