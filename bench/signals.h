@@ -95,7 +95,7 @@ inline std::vector<Signal> signals_for(const ServiceKind &kind) {
   add("steady noise", [&](std::size_t) { return noise(1000); });
   add("full-scale noise", [&](std::size_t) { return noise(32767); });
   add("DC", [](std::size_t) { return 10000L; });
-  add("impulses", [](std::size_t i) { return i % 50 == 0 ? 32767L : 0L; });
+  add("impulses", [](std::size_t i) { return i % 20 == 0 ? 32767L : 0L; });
   add("alternating extremes", [](std::size_t i) { return i % 2 == 0 ? 32767L : -32768L; });
   add("square wave", [&](std::size_t i) { return i / (frame / 4) % 2 == 0 ? 32767L : -32768L; });
   add("noise and quiet in turn",
