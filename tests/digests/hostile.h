@@ -12,12 +12,6 @@ namespace orvalis::test {
 
 using Random = std::mt19937_64;
 
-/// How a sequence makes its calls: at random where it is hostile.
-struct Caller {
-  Random random;
-  bool hostile;
-};
-
 /// A number from first to last.
 inline std::int64_t draw(Random &random, std::int64_t first, std::int64_t last) {
   return first + static_cast<std::int64_t>(random() % static_cast<std::uint64_t>(last - first + 1));
@@ -33,6 +27,10 @@ inline std::int16_t clipped(std::int64_t sample) {
   return static_cast<std::int16_t>(std::clamp<std::int64_t>(sample, INT16_MIN, INT16_MAX));
 }
 
+inline Pcm cut(const Pcm &audio, std::size_t at, std::size_t samples) {
+  return {audio.begin() + static_cast<long>(at), audio.begin() + static_cast<long>(at + samples)};
+}
+
 /// Stretches of speech, louder, softer and clipped, and of everything that is not speech.
 inline Pcm hostile_signal(std::uint64_t seed, std::size_t samples, const Pcm &speech) {
   Random random(seed);
@@ -45,66 +43,33 @@ inline Pcm hostile_signal(std::uint64_t seed, std::size_t samples, const Pcm &sp
     auto length = draw(random, 20, 3000);
     if (kind < 6) length = draw(random, 6000, 16000);
     if (draw(random, 0, 3) == 0) length -= length % 80;
-    const auto from =
-        static_cast<std::size_t>(draw(random, 0, static_cast<std::int64_t>(speech.size()) - 16000));
+    const Pcm said_now =
+        cut(speech, static_cast<std::size_t>(draw(random, 0, std::ssize(speech) - 16000)), 16000);
     for (std::int64_t i = 0; i < length; ++i) {
-      const std::int64_t said = speech[from + static_cast<std::size_t>(i)];
+      const std::int64_t said = said_now[static_cast<std::size_t>(i)];
       const std::int64_t noise = draw(random, -level, level);
+      const std::int64_t small = kind == 8 ? draw(random, -5, 5) : 0;
+      const std::int64_t gap = kind == 7 ? draw(random, 59, 63) : 60;
       const bool odd = i / period % 2 == 1;
-      std::int64_t sample = 0;
-      switch (kind) {
-        case 0:
-        case 1:
-          sample = said;
-          break;
-        case 2:
-          sample = said + noise / 8;
-          break;
-        case 3:
-          sample = said / 8;
-          break;
-        case 4:
-          sample = 4 * said;
-          break;
-        case 5:
-          sample = 40 * said;
-          break;
-        case 6:
-          break;  // silence
-        case 7:
-          sample = i % draw(random, 59, 63) == 0 ? level : 0;
-          break;  // nearly null audio
-        case 8:
-          sample = draw(random, -5, 5);
-          break;  // abnormally small
-        case 9:
-          sample = level;
-          break;  // DC
-        case 10:
-          sample = i % period == 0 ? -level : 1;
-          break;  // impulses
-        case 11:
-          sample = noise;
-          break;
-        case 12:
-          sample = noise >> std::min<std::int64_t>(i / 100, 14);
-          break;  // fading
-        case 13:
-          sample = odd ? INT16_MIN : INT16_MAX;
-          break;
-        case 14:
-          sample = i % 2 == 0 ? INT16_MIN : INT16_MAX;
-          break;
-        case 15:
-          sample = INT16_MIN;
-          break;
-        case 16:
-          sample = odd ? -level : level - 1;
-          break;
-        default:
-          sample = i * i * period / 50 % (2 * level) - level;  // a chirp
-      }
-      signal.push_back(clipped(sample));
+      const std::int64_t sounds[] = {said,
+                                     said,
+                                     said + noise / 8,
+                                     said / 8,
+                                     4 * said,
+                                     40 * said,
+                                     0,                             // silence
+                                     i % gap == 0 ? level : 0,      // nearly null audio
+                                     small,                         // abnormally small
+                                     level,                         // DC
+                                     i % period == 0 ? -level : 1,  // impulses
+                                     noise,
+                                     noise >> std::min<std::int64_t>(i / 100, 14),  // fading
+                                     odd ? INT16_MIN : INT16_MAX,
+                                     i % 2 == 0 ? INT16_MIN : INT16_MAX,
+                                     INT16_MIN,
+                                     odd ? -level : level - 1,
+                                     i * i * period / 50 % (2 * level) - level};  // a chirp
+      signal.push_back(clipped(sounds[kind]));
     }
   }
   signal.resize(samples);

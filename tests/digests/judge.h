@@ -6,6 +6,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <bit>
 #include <cmath>
 #include <concepts>
@@ -16,6 +17,7 @@
 #include <map>
 #include <string>
 #include <utility>
+#include <vector>
 
 namespace orvalis::test {
 
@@ -26,10 +28,9 @@ class Judge {
 public:
   explicit Judge(const std::string &service) : service_(service) {
     // A call that ends the process with status 0 would pass for a success.
-    static const int registered = std::atexit([] {
-      if (is_judging) std::_Exit(1);
-    });
-    is_judging = registered == 0;
+    is_judging = std::atexit([] {
+                   if (is_judging) std::_Exit(1);
+                 }) == 0;
     if (const char *folder = std::getenv("ORVALIS_WRITE_DIGESTS"))
       written_.open(std::string(folder) + "/" + service + ".txt");
     std::ifstream file(std::string(ORVALIS_DIGESTS "/") + service + ".txt");
@@ -62,36 +63,31 @@ public:
 
   /// Ends a call. `what` describes it if it is the first one to differ.
   void call(const std::string &what = {}) {
-    char digits[3];
-    std::snprintf(digits, sizeof digits, "%02x", static_cast<unsigned>(digest_ >> 56));
-    const std::size_t at = ran_.calls.size();
-    ran_.calls += digits;
-    if (!first_difference_.empty()) return;
-    const std::string &expected = expected_[name_].calls;
-    if (at >= expected.size() || expected.compare(at, 2, digits) != 0)
-      first_difference_ = "call " + std::to_string(at / 2) + " differs first " + what;
+    ran_.calls += hexadecimal(digest_ >> 56, 2);
+    described_.push_back(what);
   }
 
   /// Runs `body`, which takes values and ends calls, as a sequence of its own.
   template <class Body>
   void sequence(const std::string &name, Body body) {
-    name_ = name;
     digest_ = 0;
     ran_ = {};
-    first_difference_.clear();
+    described_.clear();
     body();
-    char digits[17];
-    std::snprintf(digits, sizeof digits, "%016llx", static_cast<unsigned long long>(digest_));
-    ran_.total = digits;
-    if (written_.is_open()) {
-      write();
-    } else if (const Sequence expected = std::exchange(expected_[name], {}); expected != ran_) {
-      ADD_FAILURE() << service_ << ", " << name << ": "
-                    << (expected.total.empty()       ? "no digests to hold it against"
-                        : !first_difference_.empty() ? first_difference_
-                                                     : "too few calls, or none tells where");
-    }
+    ran_.total = hexadecimal(digest_, 16);
+    const Sequence expected = std::exchange(expected_[name], {});
     expected_.erase(name);
+    if (written_.is_open()) {
+      write(name);
+    } else if (expected != ran_) {
+      const auto differs = std::ranges::mismatch(ran_.calls, expected.calls).in1;
+      const auto call = static_cast<std::size_t>(differs - ran_.calls.begin()) / 2;
+      ADD_FAILURE() << service_ << ", " << name << ": "
+                    << (expected.total.empty() ? "no digests to hold it against"
+                        : call < described_.size()
+                            ? "call " + std::to_string(call) + " differs first " + described_[call]
+                            : "too few calls, or none tells where");
+    }
   }
 
 private:
@@ -120,9 +116,15 @@ private:
     digest_ ^= digest_ >> 29;
   }
 
-  void write() {
+  static std::string hexadecimal(std::uint64_t value, int digits) {
+    char text[17];
+    std::snprintf(text, sizeof text, "%0*llx", digits, static_cast<unsigned long long>(value));
+    return text;
+  }
+
+  void write(const std::string &name) {
     constexpr std::size_t kLine = 80;
-    written_ << name_ << ' ' << ran_.total << ' ' << ran_.calls.size() << '\n';
+    written_ << name << ' ' << ran_.total << ' ' << ran_.calls.size() << '\n';
     for (std::size_t at = 0; at < ran_.calls.size(); at += kLine)
       written_ << ran_.calls.substr(at, kLine) << '\n';
   }
@@ -130,10 +132,9 @@ private:
   std::string service_;
   std::map<std::string, Sequence> expected_;
   std::ofstream written_;
-  std::string name_;
   std::uint64_t digest_ = 0;
   Sequence ran_;
-  std::string first_difference_;
+  std::vector<std::string> described_;
 };
 
 }  // namespace orvalis::test

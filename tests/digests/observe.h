@@ -1,6 +1,6 @@
 // What a service shows beside its results: the flags of all operators, its log lines, its dump
 // files, and what it prints before it ends the process. Handle numbers in lines and names count as
-// '#'.
+// '#'. And how audio is passed to it.
 #pragma once
 
 #include <sys/wait.h>
@@ -14,6 +14,7 @@
 #include <stdexcept>
 #include <string>
 
+#include "Voice_Engine/ns/s1chns.h"
 #include "Voice_Engine/platform/dump_file.h"
 #include "jni/orvalis.h"
 #include "tests/digests/hostile.h"
@@ -49,6 +50,20 @@ std::string last_words(Call call) {
   return words + std::to_string(WIFEXITED(status) ? WEXITSTATUS(status) : -1);
 }
 
+/// How a sequence makes its calls: at random where it is hostile.
+struct Caller {
+  explicit Caller(std::uint64_t seed, bool is_hostile = true) : random(seed), hostile(is_hostile) {}
+  Random random;
+  bool hostile;
+};
+
+inline void take_record(Judge &judge, const S1chnsState &ns) {
+  judge.take(ns.frame_cnt, ns.first_frame, ns.gain_slope_q15, ns.init_mode, ns.pre_emp_mem,
+             ns.de_emp_mem, ns.update_cnt, ns.hyster_cnt, ns.last_update_cnt, ns.ch_enrg_long_db,
+             ns.min_gain_q21, ns.synthesis_overlap, ns.bin_gain_q15, ns.analysis_overlap,
+             ns.ch_enrg, ns.ch_noise, ns.prev_shift);
+}
+
 class Observer {
 public:
   explicit Observer(Judge &judge) : judge_(judge) {
@@ -71,6 +86,28 @@ public:
 
   /// The instance whose number is a handle's.
   void watch(const void *handle) { number_ = std::to_string(handle_number(handle)); }
+
+  /// Passes frame after frame, one at a time; or, if the caller is hostile, chunks of any size, and
+  /// refused calls for the first of 64 oddities. `process` gets oddity, samples and their count,
+  /// and returns the answer; `take_record` follows every call. Behind the count are samples to
+  /// `room`.
+  template <class Process, class TakeRecord>
+  void drive(const Pcm &audio, Caller &caller, std::size_t room, std::int32_t frame, int refusals,
+             Process process, TakeRecord take_record) {
+    auto &[random, hostile] = caller;
+    for (std::size_t at = 0; at + room <= audio.size();) {
+      Pcm samples = cut(audio, at, room);
+      std::int32_t count = frame;
+      const auto oddity = hostile ? draw(random, 0, 63) : 63;
+      if (hostile) disturb_flags(random);
+      if (oddity >= refusals && oddity < 10) count *= static_cast<std::int32_t>(draw(random, 2, 7));
+      if (oddity == 10) count += static_cast<std::int32_t>(draw(random, 1, 3 * count));
+      judge_.take(process(oddity, samples, count), samples);
+      if (oddity >= refusals) at += static_cast<std::size_t>(count / frame * frame);
+      take_record();
+      call();
+    }
+  }
 
   /// Sometimes leaves values in the flags that no operator would, as a host may.
   void disturb_flags(Random &random) {

@@ -16,8 +16,8 @@ void each_block(Judge &judge, const std::string &name, std::size_t count, Body b
     Random random(13);
     const Pcm audio = hostile_signal(600, 120000, speech_16k(kSentences[2]));
     for (std::size_t at = 0; at + count <= audio.size(); at += 509) {
-      std::vector<Value> block(audio.begin() + static_cast<long>(at),
-                               audio.begin() + static_cast<long>(at + count));
+      const Pcm samples = cut(audio, at, count);
+      std::vector<Value> block(samples.begin(), samples.end());
       const auto standing = static_cast<int>(draw(random, 0, 3));
       write_flags({standing & 1, standing >> 1, standing & 1, standing >> 1, 7, 7});
       body(block, random);
