@@ -1,4 +1,6 @@
-// The end-point detector: every field of the instance after every call.
+// The end-point detector: every field of the instance after every call, and both sides of its
+// thresholds from records made for them.
+#include "Voice_Engine/channel/channel_plans.h"
 #include "Voice_Engine/epd/epd_instance.h"
 #include "tests/digests/observe.h"
 
@@ -110,10 +112,7 @@ TEST(Digests, Detector) {
 
   judge.sequence("refusals", [&] {
     Observer observer(judge);
-    {
-      const auto exhausted = ScriptedMalloc::failing();
-      judge.take(InitializeEPD(1002, 1) == nullptr);
-    }
+    judge.take(without_memory([] { return InitializeEPD(1002, 1) == nullptr; }));
     observer.call();
     auto *const no_handle = reinterpret_cast<EpdInstance *>(std::intptr_t{-1});
     for (const auto answer : {FreeMemoryEPD(nullptr), FreeMemoryEPD(no_handle),
@@ -123,6 +122,99 @@ TEST(Digests, Detector) {
     for (const std::size_t length : {1000, 200, 196, 197, 198, 199, 0})
       judge.take(SetDumpRoot(std::string(length, 'x').c_str()));
     observer.call();
+  });
+}
+
+TEST(Digests, DetectorEdges) {
+  Judge judge("detector_edges");
+  judge.sequence("noise-decision", [&] {  // on both sides of the thresholds of all plans
+    Random random(60);
+    for (int i = 0; i < 60000; ++i) {
+      Word16 unused = 0, count = pick<Word16>(random, {0, 30, 48, 49, MAX_16 - 1, MAX_16});
+      auto last = static_cast<Word16>(count - draw(random, -1, 1));
+      auto calm = pick<Word16>(random, {0, 5, 6, 7, MAX_16});
+      ChannelState state{nullptr, nullptr, nullptr, nullptr, unused, unused,
+                         count,   calm,    last,    1000,    false};
+      ChannelFindings found{};
+      found.voice_metric = pick<Word16>(random, {42, 43, 45, 46, 68, 69});
+      found.total_energy = pick(random, {252, 253, 256, 257, 320, 321});
+      found.deviation_q5 = pick<Word16>(random, {895, 896, 1999, 2000});
+      Flags flags;
+      const ChannelPlan *plans[] = {&kWideBandDetection, &kNarrowBandDetection, &kSuppression};
+      judge.take(decide_noise(flags, *plans[i % 3], state, found), count, last, calm,
+                 flags.overflow);
+    }
+    judge.call();
+  });
+
+  judge.sequence("instances", [&] {
+    Observer observer(judge);
+    const struct {
+      int mode, small, level, counted;  // small samples and their level
+    } cases[] = {
+        {3, 0, 0, 0},         {-3, 0, 0, 0},     {4, 0, 0, 0},          {2000, 0, 0, 0},
+        {9002, 0, 0, 0},      {-11001, 0, 0, 0}, {21011, 0, 0, 0},      {INT32_MAX, 0, 0, 0},
+        {INT32_MIN, 0, 0, 0}, {0, 119, -4, 0},   {0, 120, -4, 0},       {0, 120, 4, 0},
+        {0, 119, 5, 0},       {0, 120, 5, 0},    {0, 0, 0, MAX_32 - 2}, {0, 0, 0, MAX_32}};
+    for (const auto &[mode, small, level, counted] : cases) {
+      EpdInstance *epd = InitializeEPD(mode, 0);
+      observer.watch(epd);
+      Pcm frame(160, 1000);
+      std::fill_n(frame.begin(), small, static_cast<std::int16_t>(level));
+      if (counted > 0) {
+        ProcessEPDFrame(epd, frame.data(), 160);  // a first frame has set the noise
+        epd->processedSamples = epd->kepd.frame_cnt = epd->HANGframe = counted;
+        epd->noise_floor.noise_frames = counted;
+        epd->vad.vad_frame_cnt = epd->suppressor.frame_cnt = counted - MAX_32 + MAX_16;
+      }
+      for (int i = 0; i < 3; ++i) judge.take(ProcessEPDFrame(epd, frame.data(), 160));
+      take_record(judge, *epd);
+      FreeMemoryEPD(epd);
+      observer.call();
+    }
+  });
+  judge.sequence("answers", [&] {
+    for (const bool voiced : {true, false, true}) {
+      KepdState kepd{};
+      kepd.in_speech = 1;
+      kepd.onset_cnt = kepd.speech_frames = kepd.frame_cnt = MAX_32;
+      EpdReasons reasons{};
+      judge.take(decide(kepd, voiced, 0, false, reasons));
+      judge.take(kepd.onset_cnt, kepd.pause_cnt, kepd.speech_frames, kepd.frame_cnt);
+      judge.call();
+    }
+  });
+  judge.sequence("energy-gate", [&] {
+    Word64 energy = 0;
+    Random random(62);
+    for (Word32 i = 0; i < 2048; ++i) {
+      // In silence energies fall to 0.45 of themselves: small steps cross the least of voice.
+      VelmoraVadState vad{}, *state = &vad;
+      vad.ch_enrg[0] = 665600;
+      vad.ch_enrg[1] = std::min(i, 1500);
+      std::ranges::fill(vad.ch_noise, 100);
+      vad.vad_frame_cnt = 100;
+      vad.blk_frames = 24;
+      vad.blk_count = i < 1500 ? 6 : pick(random, {0, 1, 5, 6});
+      vad.blk_acc = pick<Word64>(random, {0, -energy, 25000000000000 - energy});
+      vad.energy_th = pick<Word64>(random, {7, energy, energy + 1});
+      const float score = pick(random, {0.84F, 0.0F});
+      const Word16 silence[160] = {};
+      Flags flags;
+      EpdReasons reasons;
+      judge.take(processVelmoraVAD(flags, &state, silence, &score, 0, reasons), vad.vad_flag,
+                 vad.tot_enrg, vad.energy_th, vad.blk_frames, vad.blk_count, vad.blk_mean);
+      if (i % 64 == 63) judge.call();
+      energy = vad.tot_enrg;
+    }
+  });
+  judge.sequence("absolute-energy", [&] {
+    Pcm loud(320);
+    for (std::size_t i = 0; i < 320; ++i) loud[i] = static_cast<std::int16_t>(INT16_MIN + 60 * i);
+    for (const int mode : {-1, 0, 1, 2, 3}) judge.take(getAbsoluteEnergy(loud.data(), mode));
+    EpdInstance *none = nullptr;
+    judge.take(InitKEPD(&none));
+    judge.call();
   });
 }
 

@@ -1,5 +1,7 @@
 // Noise suppression with one and with two microphones, and dynamics control: every field after
 // every call, and all of the buffers.
+#include <cmath>
+#include <limits>
 #include <memory>
 
 #include "Voice_Engine/drc/dynamics_control.h"
@@ -80,12 +82,23 @@ TEST(Digests, OneMicrophone) {
       judge.call();
     }
   });
+  judge.sequence("counters", [&] {
+    Observer observer(judge);
+    NsInstance *ns = InitializeDoNS(0, 1, 0);
+    for (int i = 0; i < 4; ++i) {
+      Pcm frame(160, 1000);
+      judge.take(ProcessDoNSFrame(ns, frame.data(), 160, frame.data(), 160), frame);
+      take_record(judge, ns->suppressor);
+      judge.call();
+      if (i > 0) continue;  // the first frame has set the noise
+      ns->processedSamples = INT32_MAX - 200;
+      ns->suppressor.frame_cnt = INT16_MAX - 1;
+    }
+    FreeMemoryNS(ns);
+  });
   judge.sequence("refusals", [&] {
     Observer observer(judge);
-    {
-      const auto exhausted = ScriptedMalloc::failing();
-      judge.take(InitializeDoNS(2, 1, 0) == nullptr);
-    }
+    judge.take(without_memory([] { return InitializeDoNS(2, 1, 0) == nullptr; }));
     observer.call();
     NsInstance *ns = InitializeDoNS(0, 1, 0);
     observer.watch(ns);
@@ -118,18 +131,22 @@ Pcm pairs_of(const Pcm &speech) {
   return interleaved(first, second);
 }
 
-/// Straight into the two-microphone suppressor, whose record the flat interface hides.
+/// Straight into the two-microphone suppressor, whose record the flat interface hides. The portable
+/// body gives the same bits as the one that this processor gets.
 void run_two(Judge &judge, const std::string &name, const Pcm &pairs, std::int16_t frames = 1) {
   judge.sequence(name, [&] {
     Observer observer(judge);
-    const auto state = std::make_unique<S2chnsState>();
+    const auto state = std::make_unique<S2chnsState>(), portable = std::make_unique<S2chnsState>();
     const auto samples = static_cast<std::size_t>(frames * 2 * kHop);
     for (std::size_t at = 0; at + samples <= pairs.size(); at += samples) {
-      Pcm out(samples, 1234);
+      Pcm out(samples, 1234), same = out;
+      for (std::size_t i = 0; i < samples / 2; i += kHop)
+        s2chns_frame_portable(*portable, &pairs[at + 2 * i], &same[i]);
       const auto count = static_cast<std::int16_t>(frames * kHop);
       judge.take(S2CHNSProcessNSFrame(*state, &pairs[at], out.data(), count), out);
       take_record(judge, *state);
       observer.call();
+      EXPECT_TRUE(out == same && std::memcmp(state.get(), portable.get(), sizeof *state) == 0);
     }
   });
 }
@@ -165,6 +182,27 @@ TEST(Digests, TwoMicrophones) {
     run(judge, "hostile-" + std::to_string(seed), hostile, 0, 2, Caller(seed));
     run_two(judge, "record-hostile-" + std::to_string(seed), hostile);
   }
+  judge.sequence("edges", [&] {
+    constexpr float kInfinity = std::numeric_limits<float>::infinity(), kNone = NAN;
+    const auto state = std::make_unique<S2chnsState>();
+    const float tail[] = {40000,         -40000.5F, 100000, 32766,     -32768,     2147483520.0F,
+                          2147483648.0F, 3e9F,      -3e9F,  kInfinity, -kInfinity, kNone};
+    std::ranges::copy(tail, state->overlap_tail);
+    Pcm in(320), out(320);
+    std::fill_n(in.rbegin(), 20, 1000);  // far from the samples in question
+    judge.take(S2CHNSProcessNSFrame(*state, in.data(), out.data(), 160), out, S2CHNSFree());
+    for (const float x : {-kInfinity, kInfinity, kNone, -10.0F, 10.0F, 1.0F})
+      judge.take(SAFE_EXP(x), SAFE_SAP(x));
+    const float from[] = {1, 2, 3, 4};
+    for (const Word16 n : {0, -1, -32768, 1, 3}) {
+      float to[] = {5, 6, 7, 8};
+      buffercopy(from, to, n);
+      judge.take(to);
+      bufferreset(to, n);
+      judge.take(to);
+    }
+    judge.call();
+  });
   judge.sequence("gates", [&] {
     for (float x = -11; x <= 11; x += 0x1p-9F) judge.take(SAFE_EXP(x), SAFE_SAP(x / 4));
     judge.call();
@@ -209,14 +247,26 @@ TEST(Digests, Dynamics) {
                  rate_hz, 1, Caller(310));
   judge.sequence("refusals", [&] {
     Observer observer(judge);
-    {
-      const auto exhausted = ScriptedMalloc::failing();
-      judge.take(InitializeDRC(16000, 0));
-    }
+    judge.take(without_memory([] { return InitializeDRC(16000, 0); }));
     observer.call();
     judge.take(FreeMemoryDRC(0));
     judge.take(FreeMemoryDRC(-1));
     observer.call();
+  });
+  judge.sequence("loud-samples", [&] {
+    Observer observer(judge);
+    for (const int rate_hz : {16000, 16001}) {
+      for (const int loud : {9, 10, 11, 50, 51, 99, 100, 101}) {
+        const std::int64_t handle = InitializeDRC(rate_hz, 0);
+        for (int i = 0; i < 24; ++i) {
+          Pcm frame(160, 5);
+          if (i < 12) std::fill_n(frame.rbegin(), loud, loud % 2 == 0 ? 8193 : -8193);
+          judge.take(ProcessDRC(handle, frame.data(), 160));
+        }
+        FreeMemoryDRC(handle);
+        observer.call();
+      }
+    }
   });
   judge.sequence("gain-by-peak", [&] {
     Observer observer(judge);

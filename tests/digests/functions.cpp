@@ -49,15 +49,6 @@ Word random_word(Random &random) {
   return static_cast<Word>(static_cast<Word>(bits) >> (bits >> 40) % (8 * sizeof(Word)));
 }
 
-template <class Visit>
-void cross(Visit visit) {
-  visit();
-}
-template <class Visit, class List, class... Lists>
-void cross(Visit visit, const List &first, const Lists &...rest) {
-  for (const auto x : first) cross([&](auto... tail) { visit(x, tail...); }, rest...);
-}
-
 constexpr auto kEverywhere = [](auto...) { return true; };
 
 /// Folds a function's results, and all flags that it leaves from standing ones of 0 and 1, into a

@@ -76,4 +76,14 @@ inline Pcm hostile_signal(std::uint64_t seed, std::size_t samples, const Pcm &sp
   return signal;
 }
 
+/// Visits every combination of one value of each list.
+template <class Visit>
+void cross(Visit visit) {
+  visit();
+}
+template <class Visit, class List, class... Lists>
+void cross(Visit visit, const List &first, const Lists &...rest) {
+  for (const auto x : first) cross([&](auto... tail) { visit(x, tail...); }, rest...);
+}
+
 }  // namespace orvalis::test

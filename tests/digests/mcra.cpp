@@ -1,8 +1,12 @@
 // The MCRA detector: every field of the record after every call, and the frame, which is windowed
 // in place.
+#include <array>
+#include <cmath>
 #include <memory>
 
 #include "Voice_Engine/MCRAvad/MCRAvad.h"
+#include "Voice_Engine/MCRAvad/frame_decision.h"
+#include "Voice_Engine/MCRAvad/speech_presence.h"
 #include "tests/digests/observe.h"
 
 namespace orvalis::test {
@@ -88,6 +92,40 @@ void run_explained(Judge &judge, const std::string &name, const Pcm &audio,
   });
 }
 
+/// The frame decision on both sides of its thresholds, from measures made for it.
+void run_decisions(Judge &judge) {
+  judge.sequence("decisions", [&] {
+    VADINFO vad{};
+    Random random(61);
+    for (int i = 0; i < 1 << 15; ++i) {
+      vad.frameIndex =
+          i % 2 == 0 ? pick(random, {0, 5, 9, 10, 18, 19, 40, 77, 78, 79}) : vad.frameIndex + 1;
+      vad.energyThreshold = pick(random, {.5F, -1.0F, NAN});
+      vad.lowThresholdSelect = pick(random, {0, 1, 2});
+      vad.energyMargin = pick(random, {0, 1, 2});
+      vad.startupSmoothedEnergy = pick(random, {10.0F, 10.5F, 20.0F, 40.0F});
+      vad.calibrationEnable = pick(random, {0, 0, 1, -1});
+      vad.calibrationMode = pick(random, {0, 1, 2});
+      vad.calibrationCount = pick(random, {vad.calibrationCount, INT32_MAX - 1, INT32_MAX});
+      const float energy = pick(random, {0.0F, .0975F, .1F, .5F, .625F});
+      const float smoothed = pick(random, {0.0F, .4F, .5F, .625F, 1.0F, 1.0625F, 30.0F, 30.25F});
+      const int bins = pick(random, {20, 21});
+      // Over several bins, so that all of them have to be added up.
+      for (int k = 0; k < MCRA_BINS; ++k) {
+        vad.periodogram[k] = k % 64 == 63 ? std::llrint(energy * 0x1p30) : 0;
+        vad.smoothedPeriodogram[k] = k % 64 == 0 ? std::llrint(smoothed * 0x1p30) : 0;
+        vad.minPower[k] = k / 64 == 1 ? std::llrint(.75 * 0x1p25) : 0;
+        vad.speechProb[k] = k < bins ? INT32_MAX : 0;
+      }
+      vad.speechProb[MCRA_BINS - 1] += bins;  // what the greatest probability lacks to 1
+      judge.take(orvalis::decide_frame(vad, 1.0F), vad.energyThreshold, vad.prevFrameEnergy,
+                 vad.prevSmoothedEnergy, vad.prevMinEnergy, vad.prevSpeechBins,
+                 vad.startupFrameEnergy, vad.startupSmoothedEnergy, vad.calibrationCount);
+      if (i % 256 == 255) judge.call();
+    }
+  });
+}
+
 TEST(Digests, Mcra) {
   Judge judge("mcra");
   const Pcm sentence = speech_16k(kSentences[3]);
@@ -95,6 +133,22 @@ TEST(Digests, Mcra) {
   run(judge, "history-calibrating", sentence, {1, 1, 1, 0, 2, 0.84F});
   run(judge, "narrow", speech_8k("wav/hts1a.wav"), {1, 0, 0, 1, 1, 0.84F});
   run(judge, "calibration", hostile_signal(420, 100000, sentence), {0, 1, 1, 1, 2, 0.9F});
+  run_decisions(judge);
+  judge.sequence("presence", [&] {  // from the least noise, and where the count of frames ends
+    VADINFO record{}, *vad = &record;
+    record.frameIndex = INT32_MAX - 2;
+    for (int k = 0; k < MCRA_BINS; ++k) {
+      record.noisePower[k] = k % 4;
+      record.smoothedPeriodogram[k] = k == 9 ? INT64_MAX : std::int64_t{k} << k / 4;
+      record.gain[k] = record.postSnr[k] = 32768 * k / 127;
+    }
+    for (int i = 0; i < 4; ++i) {
+      if (i == 0) orvalis::update_presence(record);
+      if (i > 0) processVAD(&vad, Pcm(160, 9).data(), 160, 0.84F);
+      take_record(judge, record);
+      judge.call();
+    }
+  });
   std::uint64_t seed = 400;
   for (const Configuration &with : {Configuration{0, 0, 0, 0, 2, 0.84F},
                                     {1, 1, 1, 1, 1, 0.5F},

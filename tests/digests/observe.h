@@ -6,6 +6,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <array>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -48,6 +49,12 @@ std::string last_words(Call call) {
   int status = 0;
   waitpid(child, &status, 0);
   return words + std::to_string(WIFEXITED(status) ? WEXITSTATUS(status) : -1);
+}
+
+template <class Call>
+auto without_memory(Call call) {
+  const auto exhausted = ScriptedMalloc::failing();
+  return call();
 }
 
 /// How a sequence makes its calls: at random where it is hostile.
