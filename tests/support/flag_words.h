@@ -7,8 +7,6 @@
 
 namespace orvalis::test {
 
-enum Copy { PLAIN, NS, ZOLT };
-
 /// Overflow and carry of the plain, the ns_ and the ZOLT_ copy.
 using FlagWords = std::array<int, 6>;
 
@@ -23,15 +21,6 @@ inline void write_flags(const FlagWords &words) {
   ns_Carry = words[3];
   Overflow_ZOLT = static_cast<int16_t>(words[4]);
   Carry_ZOLT = static_cast<int16_t>(words[5]);
-}
-
-/// One copy's flags as given; the others hold a value that no operator writes.
-inline FlagWords flags_of(Copy copy, int overflow, int carry) {
-  FlagWords words;
-  words.fill(7);
-  words[2 * copy] = overflow;
-  words[2 * copy + 1] = carry;
-  return words;
 }
 
 }  // namespace orvalis::test
