@@ -1,4 +1,4 @@
-// What the suppressors do to noise, tones and speech, measured on mixtures of real speech, and that
+// What the suppressors do to noise and speech, measured on mixtures of real speech, and that
 // the one for two microphones survives whatever they do.
 #include <gtest/gtest.h>
 
@@ -15,8 +15,8 @@
 namespace orvalis::test {
 namespace {
 
-/// By how many dB mode 0, 2 or 3 lowers `count` samples from `from` on.
-double loss_db(Word16 mode, const Pcm &audio, std::size_t from, std::size_t count) {
+/// By how many dB mode 0, 2 or 3 lowers audio after the first second.
+double loss_db(Word16 mode, const Pcm &audio) {
   S1chnsState state{};
   Flags flags;
   S1CHNSInit(&state, mode);
@@ -25,12 +25,12 @@ double loss_db(Word16 mode, const Pcm &audio, std::size_t from, std::size_t coun
     Pcm in(&audio[at], &audio[at] + 160), out(160);
     s1chns_C(flags, &state, in.data(), out.data());
     EXPECT_EQ(in, out) << "the input is overwritten with the output";
-    for (std::size_t i = std::max(at, from); i < std::min(at + 160, from + count); ++i) {
-      before += 1.0 * audio[i] * audio[i];
-      after += 1.0 * out[i - at] * out[i - at];
+    for (std::size_t i = 0; at >= 16000 && i < 160; ++i) {
+      before += 1.0 * audio[at + i] * audio[at + i];
+      after += 1.0 * out[i] * out[i];
     }
   }
-  return 10 * std::log10(before / (after + 1e-9));
+  return 10 * std::log10(before / after);
 }
 
 TEST(OneMicrophone, LowersWhiteNoiseToTheFloor) {
@@ -39,25 +39,9 @@ TEST(OneMicrophone, LowersWhiteNoiseToTheFloor) {
       Pcm noise;
       for (const double x : unit_noise(80000, NoiseColour::kWhite, 1))
         noise.push_back(to_sample(rms * x));
-      EXPECT_NEAR(loss_db(mode, noise, 16000, 64000), floor_db, 1) << mode << ", rms " << rms;
+      EXPECT_NEAR(loss_db(mode, noise), floor_db, 1) << mode << ", rms " << rms;
     }
   }
-}
-
-TEST(OneMicrophone, PassesNothingAboveBin125) {
-  // Far above the noise that was learnt, a tone opens its channels; after a second it is noise.
-  const auto tone_loss_db = [](double tone_hz, std::size_t from) {
-    std::mt19937 generator(1);
-    Pcm audio(48000);
-    for (std::size_t i = 0; i < audio.size(); ++i) {
-      const double tone = i < 8000 ? 0 : std::sin(2 * M_PI * tone_hz * i / 16000);
-      audio[i] = static_cast<Word16>(8000 * tone + generator() % 21 - 10.0);
-    }
-    return loss_db(2, audio, from, 800);
-  };
-  EXPECT_LT(tone_loss_db(7700, 8800), 1);
-  EXPECT_GT(tone_loss_db(7900, 8800), 17) << "more than what the window leaks into other bins";
-  EXPECT_GT(tone_loss_db(7900, 45000), 34);
 }
 
 // ---- Two microphones ----
