@@ -1,7 +1,8 @@
-// The extended mathematics, queries and transforms: any arguments the manual allows, in buffers of
-// exactly their size. What they compute is for the tests; here they only must not go astray.
+// The extended mathematics against its laws; queries and transforms, whose values the tests hold,
+// in buffers of exactly their size. Any arguments that the manual allows.
 #include <algorithm>
 #include <cmath>
+#include <numeric>
 
 #include "Math_baseop.h"
 #include "fixed_fft.h"
@@ -21,38 +22,64 @@ std::int64_t wide(Input &input) {
   return static_cast<std::int64_t>(high << 32 | static_cast<std::uint32_t>(input.number()));
 }
 
+void require_near(double value, double expected, double tolerance, const char *law) {
+  require(std::abs(value - expected) <= tolerance, law);
+}
+
 void compute(std::uint8_t choice, Input &input) {
   const std::int32_t x = input.number(), y = input.number();
   switch (choice % 4) {
-    case 0:
-      ZOLT_L_log(static_cast<std::uint32_t>(x));
-      ZOLT_S_log(static_cast<std::uint32_t>(x));
-      require(ZOLT_L_exp(x) == (x < 0 ? L_exp_mius(x) : L_exp_plus(x)), "e^x is one of its halves");
-      ZOLT_expintFix(x);
+    case 0: {
+      if (x != 0) {
+        const double logarithm = std::log(std::ldexp(static_cast<std::uint32_t>(x), -16));
+        require_near(std::ldexp(ZOLT_L_log(x), -26), logarithm, 0.0005, "ln");
+        require_near(std::ldexp(ZOLT_S_log(x), -11), logarithm, 0.001, "short ln");
+      }
+      const double power = std::exp(std::clamp(std::ldexp(x, -26), -21.0, 21.0));
+      const double expected = std::ldexp(power, 32) * (x > -1409286144);
+      for (const std::int64_t got : {ZOLT_L_exp(x), L_exp_plus(x), L_exp_mius(x)})
+        require_near(static_cast<double>(got), expected, expected * 0.0002 + 1, "e^x");
+      require(x == INT32_MIN || ZOLT_expintFix(x) == ZOLT_expintFix(-x), "E1 of the magnitude");
       break;
+    }
     case 1: {
       const std::int16_t q = input.word(), out_q = input.word();
       // A shift or an exponent out of range ends the process.
-      if (q > -32 && x >= 0 && std::ldexp(x, -q) < 32768)
-        ZOLT_L_pow2_plus(x, q, out_q, input.byte());
+      if (q > -32 && x >= 0 && std::ldexp(x, -q) < 32768) {
+        const double power = std::exp2(std::ldexp(x, -q) + out_q);
+        const std::int32_t got = ZOLT_L_pow2_plus(x, q, out_q, input.byte());
+        require(power <= 0x1p31 || got == INT32_MAX, "2^x saturates");
+        if (power < 0x1p30) require_near(got, power, 0.51 + power * 0.006, "2^x");
+      }
       ZOLT_L_pow(x, y);
       break;
     }
-    case 2:
-      ZOLT_L_sin(x);
-      ZOLT_L_cos(x);
-      ZOLT_L_cuberoot(x);
-      if (x >= 0) ZOLT_L_atan(x), ZOLT_L_root15(x);
-      if (y != 0) ZOLT_L_atan2(y, x);
+    case 2: {
+      const double angle = std::ldexp(x, -22), value = std::ldexp(x, -31);
+      require_near(std::ldexp(ZOLT_L_sin(x), -31), std::sin(angle), 0.004, "sine");
+      require_near(std::ldexp(ZOLT_L_cos(x), -31), std::cos(angle), 0.004, "cosine");
+      require_near(ZOLT_L_cuberoot(x), std::ldexp(std::cbrt(value), 31), 64, "cube root");
+      if (x >= 0) {
+        require_near(std::ldexp(ZOLT_L_atan(x), -22), std::atan(std::ldexp(x, -11)), 0.0018,
+                     "atan");
+        require_near(ZOLT_L_root15(x), std::ldexp(std::pow(value, 2.0 / 3), 31), 5, "x^(2/3)");
+      }
+      if (y != 0)
+        require_near(std::ldexp(ZOLT_L_atan2(y, x), -22), std::atan2(y, x), 0.0019, "atan2");
       break;
+    }
     default: {
       const std::int64_t a = wide(input), b = wide(input);
+      const auto real = static_cast<double>(a);
       require(ZOLT_L64_abs(a) >= 0, "no absolute value is negative");
-      if (a >= 0) ZOLT_L64_sqrt_Q0(a);
+      if (a >= 0)
+        require_near(ZOLT_L64_sqrt_Q0(a), std::min(std::sqrt(real), 0x1p31), 1, "square root");
       if (b != 0) ZOLT_L64_div(a, b);
       ZOLT_L64_mult(a, b);
-      ZOLT_LL_mult_64a32(a, x);
-      if (x != 0 && x != INT32_MIN && y != INT32_MIN) ZOLT_get_gcd(y, x);
+      require_near(static_cast<double>(ZOLT_LL_mult_64a32(a, x)), std::ldexp(real * x, -32),
+                   1 + std::ldexp(std::abs(real * x), -82), "a * b / 2^32");
+      if (x != 0 && x != INT32_MIN && y != INT32_MIN)
+        require(ZOLT_get_gcd(y, x) == std::gcd(y, x), "greatest common divisor");
       std::int64_t coefficients[9];
       for (int i = 0; i < 9; ++i) coefficients[i] = a >> i;
       ZOLT_POLYVALFix(coefficients, x, 9);
