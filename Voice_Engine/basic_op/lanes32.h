@@ -104,11 +104,13 @@ inline Words L_mpy_ll(Words a, Words b) {
   return (middle >> 14) + 2 * ((a >> 16) * (b >> 16));
 }
 
-/// Q31 quotient for 0 <= a < b, b normalised; saturates.
+/// Q31 quotient for 0 <= a < b, b normalised; saturates. 0 for b = 0.
 inline Words L_divide(Words a, Words b) {
-  const Words approximation = reciprocal_q30(b >> 16);
+  const Words approximation = reciprocal_q30(larger(b >> 16, broadcast_words(0x4000)));
   const Words error = MAX_32 - L_mpy_ls(b, approximation);
-  return L_shift_left(L_mpy_ll(a, L_mpy_ls(error, approximation)), broadcast_words(2));
+  const Words quotient =
+      L_shift_left(L_mpy_ll(a, L_mpy_ls(error, approximation)), broadcast_words(2));
+  return a > b ? Words{} : quotient;
 }
 
 inline Words mult_r(Words a, Words b) { return (a * b + 0x4000) >> 15; }
