@@ -8,9 +8,10 @@
 //   V32     one 32-bit value for each      dot, add32 ... wrap; narrow saturates
 //   Pairs   two factors for each           first and second in turn in memory
 //
-// mult and mult_r are the operators of that name, for factors that are not both the least value.
-// Where kMultipliesInOneStep holds, mult_r is one instruction, worth a vector for a single value.
-// Masks are 0 or -1. Shifts of 16 bits are 0..15 places.
+// average is (a + b + 1) / 2, rounded down and never overflowing. mult and mult_r are the operators
+// of that name, for factors that are not both the least value. Where kMultipliesInOneStep holds,
+// mult_r is one instruction, worth a vector for a single value. Masks are 0 or -1. Shifts of 16
+// bits are 0..15 places.
 #pragma once
 
 #if !defined(ORVALIS_BODY) || !defined(ORVALIS_LANES)
@@ -27,11 +28,6 @@ template <class L>
 using V32 = typename L::V32;
 template <class L>
 using Pairs = typename L::Pairs;
-
-template <class L>
-inline Pairs<L> broadcast_pairs(Word16 first, Word16 second) {
-  return L::pairs(L::broadcast(first), L::broadcast(second));
-}
 
 template <class L>
 inline V<L> negate(V<L> x) {
@@ -56,6 +52,12 @@ inline V<L> shift_r(V<L> x, Word32 n) {
   const int places = -n < 16 ? -n : 16;
   const V<L> before_last = L::shift_right(x, places - 1);
   return L::wrapping_add(L::shift_right(before_last, 1), L::bit_and(before_last, L::broadcast(1)));
+}
+
+/// The same where a shift to the left loses nothing, as with the one that normalises a block.
+template <class L>
+inline V<L> normalise(V<L> x, Word32 n) {
+  return n >= 0 ? L::shift_left(x, n) : shift_r<L>(x, n);
 }
 
 /// Undoes a block shift on sign and magnitude, so that both signs truncate toward zero: shifts left

@@ -28,6 +28,7 @@ struct Lanes8 {
   static V sub(V a, V b) { return vqsubq_s16(a, b); }
   static V min(V a, V b) { return vminq_s16(a, b); }
   static V max(V a, V b) { return vmaxq_s16(a, b); }
+  static V average(V a, V b) { return vrhaddq_s16(a, b); }
   static V greater(V a, V b) { return vreinterpretq_s16_u16(vcgtq_s16(a, b)); }
   static V equal(V a, V b) { return vreinterpretq_s16_u16(vceqq_s16(a, b)); }
   static V bit_and(V a, V b) { return vandq_s16(a, b); }
@@ -74,6 +75,7 @@ struct Lanes8 {
   // --- Products of pairs, in 32 bits
   static Pairs pairs(V first, V second) { return {{first, second}}; }
   static Pairs load_pairs(const Word16 *x) { return vld2q_s16(x); }
+  static Pairs broadcast_pair(const Word16 *x) { return pairs(broadcast(x[0]), broadcast(x[1])); }
   static V32 dot(V a, V b, const Pairs &p) {
     const int32x4_t lo = vmull_s16(vget_low_s16(a), vget_low_s16(p.val[0]));
     const int32x4_t hi = vmull_high_s16(a, p.val[0]);
@@ -83,13 +85,10 @@ struct Lanes8 {
   static V32 broadcast32(Word32 x) { return {vdupq_n_s32(x), vdupq_n_s32(x)}; }
   static V32 add32(V32 a, V32 b) { return {vaddq_s32(a.lo, b.lo), vaddq_s32(a.hi, b.hi)}; }
   static V32 sub32(V32 a, V32 b) { return {vsubq_s32(a.lo, b.lo), vsubq_s32(a.hi, b.hi)}; }
-  static V32 min32(V32 a, V32 b) { return {vminq_s32(a.lo, b.lo), vminq_s32(a.hi, b.hi)}; }
-  static V32 max32(V32 a, V32 b) { return {vmaxq_s32(a.lo, b.lo), vmaxq_s32(a.hi, b.hi)}; }
   template <int kPlaces>
   static V32 shift_right32(V32 a) {
     return {vshrq_n_s32(a.lo, kPlaces), vshrq_n_s32(a.hi, kPlaces)};
   }
-  static V32 widen_q15(V x) { return {vshll_n_s16(vget_low_s16(x), 15), vshll_high_n_s16(x, 15)}; }
   static V narrow(V32 a) { return vqmovn_high_s32(vqmovn_s32(a.lo), a.hi); }
   static void store32(Word32 *x, V32 v) {
     vst1q_s32(x, v.lo);

@@ -48,6 +48,9 @@ struct Lanes8 {
   static V max(const V &a, const V &b) {
     return each([&](int i) { return a.x[i] > b.x[i] ? a.x[i] : b.x[i]; });
   }
+  static V average(const V &a, const V &b) {
+    return each([&](int i) { return (a.x[i] + b.x[i] + 1) >> 1; });
+  }
   static V greater(const V &a, const V &b) {
     return each([&](int i) { return a.x[i] > b.x[i] ? -1 : 0; });
   }
@@ -116,6 +119,7 @@ struct Lanes8 {
     for (int i = 0; i < 16; ++i) p.x[i] = x[i];
     return p;
   }
+  static Pairs broadcast_pair(const Word16 *x) { return pairs(broadcast(x[0]), broadcast(x[1])); }
   static V32 dot(const V &a, const V &b, const Pairs &p) {
     return each32(
         [&](int i) { return wrapping_add(a.x[i] * p.x[2 * i], b.x[i] * p.x[2 * i + 1]); });
@@ -129,18 +133,9 @@ struct Lanes8 {
   static V32 sub32(const V32 &a, const V32 &b) {
     return each32([&](int i) { return wrapping_sub(a.x[i], b.x[i]); });
   }
-  static V32 min32(const V32 &a, const V32 &b) {
-    return each32([&](int i) { return a.x[i] < b.x[i] ? a.x[i] : b.x[i]; });
-  }
-  static V32 max32(const V32 &a, const V32 &b) {
-    return each32([&](int i) { return a.x[i] > b.x[i] ? a.x[i] : b.x[i]; });
-  }
   template <int kPlaces>
   static V32 shift_right32(const V32 &a) {
     return each32([&](int i) { return a.x[i] >> kPlaces; });
-  }
-  static V32 widen_q15(const V &x) {
-    return each32([&](int i) { return x.x[i] * 32768; });
   }
   static V narrow(const V32 &a) {
     return each([&](int i) { return saturated(a.x[i]); });

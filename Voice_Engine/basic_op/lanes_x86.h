@@ -32,6 +32,10 @@ struct Lanes8 {
   static V sub(V a, V b) { return _mm_subs_epi16(a, b); }
   static V min(V a, V b) { return _mm_min_epi16(a, b); }
   static V max(V a, V b) { return _mm_max_epi16(a, b); }
+  static V average(V a, V b) {
+    const V least = broadcast(MIN_16);  // turns signed numbers into unsigned ones, and back
+    return bit_xor(_mm_avg_epu16(bit_xor(a, least), bit_xor(b, least)), least);
+  }
   static V greater(V a, V b) { return _mm_cmpgt_epi16(a, b); }
   static V equal(V a, V b) { return _mm_cmpeq_epi16(a, b); }
   static V bit_and(V a, V b) { return _mm_and_si128(a, b); }
@@ -102,6 +106,11 @@ struct Lanes8 {
     return {_mm_unpacklo_epi16(first, second), _mm_unpackhi_epi16(first, second)};
   }
   static Pairs load_pairs(const Word16 *x) { return {load(x), load(x + 8)}; }
+  static Pairs broadcast_pair(const Word16 *x) {
+    Word32 both;
+    __builtin_memcpy(&both, x, sizeof both);
+    return {_mm_set1_epi32(both), _mm_set1_epi32(both)};
+  }
   /// a * x + b * y for the pairs (x, y).
   static V32 dot(V a, V b, const Pairs &p) {
     return {_mm_madd_epi16(_mm_unpacklo_epi16(a, b), p.lo),
@@ -110,40 +119,15 @@ struct Lanes8 {
   static V32 broadcast32(Word32 x) { return {_mm_set1_epi32(x), _mm_set1_epi32(x)}; }
   static V32 add32(V32 a, V32 b) { return {_mm_add_epi32(a.lo, b.lo), _mm_add_epi32(a.hi, b.hi)}; }
   static V32 sub32(V32 a, V32 b) { return {_mm_sub_epi32(a.lo, b.lo), _mm_sub_epi32(a.hi, b.hi)}; }
-  static V32 min32(V32 a, V32 b) { return {min32(a.lo, b.lo), min32(a.hi, b.hi)}; }
-  static V32 max32(V32 a, V32 b) { return {max32(a.lo, b.lo), max32(a.hi, b.hi)}; }
   template <int kPlaces>
   static V32 shift_right32(V32 a) {
     return {_mm_srai_epi32(a.lo, kPlaces), _mm_srai_epi32(a.hi, kPlaces)};
-  }
-  /// x * 2^15.
-  static V32 widen_q15(V x) {
-    const V zero = _mm_setzero_si128();
-    return shift_right32<1>({_mm_unpacklo_epi16(zero, x), _mm_unpackhi_epi16(zero, x)});
   }
   /// Saturates.
   static V narrow(V32 a) { return _mm_packs_epi32(a.lo, a.hi); }
   static void store32(Word32 *x, V32 v) {
     _mm_storeu_si128(reinterpret_cast<__m128i *>(x), v.lo);
     _mm_storeu_si128(reinterpret_cast<__m128i *>(x + 4), v.hi);
-  }
-
-private:
-  static __m128i min32(__m128i a, __m128i b) {
-#ifdef __SSE4_1__
-    return _mm_min_epi32(a, b);
-#else
-    const __m128i less = _mm_cmpgt_epi32(b, a);
-    return _mm_or_si128(_mm_and_si128(less, a), _mm_andnot_si128(less, b));
-#endif
-  }
-  static __m128i max32(__m128i a, __m128i b) {
-#ifdef __SSE4_1__
-    return _mm_max_epi32(a, b);
-#else
-    const __m128i more = _mm_cmpgt_epi32(a, b);
-    return _mm_or_si128(_mm_and_si128(more, a), _mm_andnot_si128(more, b));
-#endif
   }
 };
 
@@ -173,6 +157,10 @@ struct Lanes16 {
   static V sub(V a, V b) { return _mm256_subs_epi16(a, b); }
   static V min(V a, V b) { return _mm256_min_epi16(a, b); }
   static V max(V a, V b) { return _mm256_max_epi16(a, b); }
+  static V average(V a, V b) {
+    const V least = broadcast(MIN_16);
+    return bit_xor(_mm256_avg_epu16(bit_xor(a, least), bit_xor(b, least)), least);
+  }
   static V greater(V a, V b) { return _mm256_cmpgt_epi16(a, b); }
   static V equal(V a, V b) { return _mm256_cmpeq_epi16(a, b); }
   static V bit_and(V a, V b) { return _mm256_and_si256(a, b); }
@@ -243,6 +231,11 @@ struct Lanes16 {
     exchange_halves(p.lo, p.hi);
     return p;
   }
+  static Pairs broadcast_pair(const Word16 *x) {
+    Word32 both;
+    __builtin_memcpy(&both, x, sizeof both);
+    return {_mm256_set1_epi32(both), _mm256_set1_epi32(both)};
+  }
   static V32 dot(V a, V b, const Pairs &p) {
     return {_mm256_madd_epi16(_mm256_unpacklo_epi16(a, b), p.lo),
             _mm256_madd_epi16(_mm256_unpackhi_epi16(a, b), p.hi)};
@@ -254,19 +247,9 @@ struct Lanes16 {
   static V32 sub32(V32 a, V32 b) {
     return {_mm256_sub_epi32(a.lo, b.lo), _mm256_sub_epi32(a.hi, b.hi)};
   }
-  static V32 min32(V32 a, V32 b) {
-    return {_mm256_min_epi32(a.lo, b.lo), _mm256_min_epi32(a.hi, b.hi)};
-  }
-  static V32 max32(V32 a, V32 b) {
-    return {_mm256_max_epi32(a.lo, b.lo), _mm256_max_epi32(a.hi, b.hi)};
-  }
   template <int kPlaces>
   static V32 shift_right32(V32 a) {
     return {_mm256_srai_epi32(a.lo, kPlaces), _mm256_srai_epi32(a.hi, kPlaces)};
-  }
-  static V32 widen_q15(V x) {
-    const V zero = _mm256_setzero_si256();
-    return shift_right32<1>({_mm256_unpacklo_epi16(zero, x), _mm256_unpackhi_epi16(zero, x)});
   }
   static V narrow(V32 a) { return _mm256_packs_epi32(a.lo, a.hi); }
   static void store32(Word32 *x, V32 v) {

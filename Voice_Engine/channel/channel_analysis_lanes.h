@@ -42,7 +42,7 @@ inline Word16 assemble_frame(const ChannelPlan &plan, ChannelState &state, const
   Flags unseen;
   x[-1] = orvalis::shift_r(unseen, state.pre_emp_mem, rescale);
   for (int i = 0; i < kFrame; i += L::kWidth)
-    L::store(x + i, shift_r<L>(L::load(frame + i), shift));
+    L::store(x + i, normalise<L>(L::load(frame + i), shift));
 
   for (int i = 0; i < kOverlap; i += L::kWidth)
     L::store(buffer + i, shift_r<L>(L::load(state.overlap + i), rescale));
@@ -90,10 +90,15 @@ inline void add_powers(const ChannelPlan &plan, const SplitBuffer &spectrum, Wor
     const V<L> im = L::load(spectrum.im + k);
     L::store32(power + k, L::dot(re, im, L::pairs(re, im)));
   }
-  Word32 below[kSize / 2 + 1] = {0};
+  Word32 below[kSize / 2 + 1];
+  Word32 sum = 0;
   for (int k = 0; k < kSize / 2; k += 8) {
-    for (int i = k; i < k + 8; ++i) below[i + 1] = below[i] + power[i];
+    for (int i = k; i < k + 8; ++i) {
+      below[i] = sum;
+      sum += power[i];
+    }
   }
+  below[kSize / 2] = sum;
   for (int i = 0; i < plan.channels; ++i)
     powers[i] = 2 * (below[plan.bins[i].last + 1] - below[plan.bins[i].first]);
 }

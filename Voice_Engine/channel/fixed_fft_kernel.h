@@ -20,8 +20,8 @@ struct SplitFactors {
 struct TransformPlan {
   Word32 size;             ///< N, the number of 16-bit values in the buffer
   const Word16 *twiddles;  ///< N values: cos, -sin in Q15
-  // The twiddle factors c + j s of the last stages, 8, 16 ... N/4 of them one after the other, as
-  // pairs of -c and s, and of s and c.
+  // The twiddle factors c + j s of the stages, 1, 2 ... N/4 of them one after the other, as pairs
+  // of -c and s, and of s and c.
   const Word16 *minus_cos_sin;
   const Word16 *sin_cos;
   // The same of the stage with 8, each one eight times, in bit-reversed order.

@@ -8,8 +8,6 @@
 // tables, lane by lane.
 #pragma once
 
-#include <initializer_list>
-
 #include "Voice_Engine/basic_op/lanes.h"
 #include "Voice_Engine/basic_op/operators.h"
 #include "Voice_Engine/channel/fixed_fft_kernel.h"
@@ -23,11 +21,8 @@ struct SplitBuffer {
   alignas(64) Word16 im[128];
 };
 
-constexpr int reversed_bits(int x, int bits) {
-  int reversed = 0;
-  for (int i = 0; i < bits; ++i) reversed |= ((x >> i) & 1) << (bits - 1 - i);
-  return reversed;
-}
+/// 0..7 with their three bits in reverse.
+inline constexpr int kReversedBits[8] = {0, 4, 2, 6, 1, 5, 3, 7};
 
 /// A twiddle factor c + j s: dot products with a complex value's parts are the parts of the
 /// product, the real one negated (-32768 occurs as s, and has no negative).
@@ -75,6 +70,79 @@ inline V<L> add_and_subtract(V<L> &upper_re, V<L> &upper_im, V<L> &lower_re, V<L
   return saturated;
 }
 
+/// Where the pairs of a stage begin in the tables of twiddle factors.
+constexpr int pairs_of_stage(int stage) { return 2 * ((1 << stage) - 1); }
+
+/// A stage whose butterflies combine whole vectors: block by block, each with one twiddle factor.
+template <class L, int kVectors, Direction kDirection, int kStage>
+inline void vector_stage(const TransformPlan &plan, V<L> *re, V<L> *im) {
+  constexpr int kDistance = kVectors >> (kStage + 1);
+  for (int block = 0; block < 1 << kStage; ++block) {
+    const int factor = pairs_of_stage(kStage) + 2 * (kReversedBits[block] >> (3 - kStage));
+    const Rotation<L> rotation = {L::broadcast_pair(plan.minus_cos_sin + factor),
+                                  L::broadcast_pair(plan.sin_cos + factor)};
+    for (int i = 0; i < kDistance; ++i) {
+      const int upper = block * 2 * kDistance + i;
+      V<L> &lower_re = re[upper + kDistance];
+      V<L> &lower_im = im[upper + kDistance];
+      if (block == 0) {
+        lower_re = times_32767<L>(lower_re);
+        lower_im = times_32767<L>(lower_im);
+      } else {
+        rotate<L>(lower_re, lower_im, rotation);
+      }
+      add_and_subtract<L, kDirection>(re[upper], im[upper], lower_re, lower_im);
+    }
+  }
+}
+
+/// A stage whose butterflies combine whole vectors, with a twiddle factor for each lane. Returns
+/// what add_and_subtract does of the last one.
+template <class L, int kVectors, Direction kDirection, int kStage>
+inline V<L> lane_stage(const TransformPlan &plan, V<L> *re, V<L> *im) {
+  constexpr int kDistance = (1 << kStage) / L::kWidth;
+  V<L> saturated = L::broadcast(0);
+  for (int i = 0; i < kDistance; ++i) {
+    const int factors = pairs_of_stage(kStage) + 2 * i * L::kWidth;
+    const Rotation<L> rotation = {L::load_pairs(plan.minus_cos_sin + factors),
+                                  L::load_pairs(plan.sin_cos + factors)};
+    for (int upper = i; upper < kVectors; upper += 2 * kDistance) {
+      const int lower = upper + kDistance;
+      rotate<L>(re[lower], im[lower], rotation);
+      saturated = add_and_subtract<L, kDirection>(re[upper], im[upper], re[lower], im[lower]);
+    }
+  }
+  return saturated;
+}
+
+/// The stage between them where vectors are as wide as two blocks of eight: that of their halves.
+template <class L, int kVectors, Direction kDirection>
+inline void half_stage(const TransformPlan &plan, V<L> *re, V<L> *im) {
+  for (int v = 0; v < kVectors; v += 2) {
+    const Rotation<L> rotation = {L::load_pairs(plan.halves_minus_cos_sin + v * L::kWidth),
+                                  L::load_pairs(plan.halves_sin_cos + v * L::kWidth)};
+    L::exchange_halves(re[v], re[v + 1]);
+    L::exchange_halves(im[v], im[v + 1]);
+    rotate<L>(re[v + 1], im[v + 1], rotation);
+    add_and_subtract<L, kDirection>(re[v], im[v], re[v + 1], im[v + 1]);
+    L::exchange_halves(re[v], re[v + 1]);
+    L::exchange_halves(im[v], im[v + 1]);
+  }
+}
+
+/// Makes lanes of the vectors' numbers, and vectors of the lanes' ones, either in bit-reversed
+/// order.
+template <class L, int kVectors>
+inline void exchange_vectors_and_lanes(V<L> *part) {
+  constexpr int kGroups = kVectors / 8;
+  for (int group = 0; group < kGroups; ++group) {
+    V<L> rows[8];
+    for (int v = 0; v < 8; ++v) rows[kReversedBits[v]] = part[v * kGroups + group];
+    L::transpose(rows);
+    for (int v = 0; v < 8; ++v) part[kReversedBits[v] * kGroups + group] = rows[v];
+  }
+}
+
 /// The complex transform of kPoints values. The inverse one, which conjugates its factors, is the
 /// forward one with real and imaginary parts exchanged, and without its halving. Returns whether
 /// the very last sum saturated: every butterfly overwrites the overflow flag with its own.
@@ -82,8 +150,6 @@ template <class L, int kPoints, Direction kDirection>
 inline bool transform(const TransformPlan &plan, Word16 *first_part, Word16 *second_part) {
   constexpr int kVectors = kPoints / L::kWidth;
   constexpr int kStages = kPoints == 128 ? 7 : 6;
-  constexpr int kRowBits = kStages - 3;  // of a value's number, above those of a block of eight
-  constexpr int kVectorStages = L::kWidth == 16 ? kRowBits - 1 : kRowBits;
   constexpr bool kForward = kDirection == Direction::kForward;
   Word16 *const real = kForward ? first_part : second_part;
   Word16 *const imag = kForward ? second_part : first_part;
@@ -94,68 +160,16 @@ inline bool transform(const TransformPlan &plan, Word16 *first_part, Word16 *sec
     re[v] = L::load(real + v * L::kWidth);
     im[v] = L::load(imag + v * L::kWidth);
   }
-
-  for (int stage = 0; stage < kVectorStages; ++stage) {
-    const int distance = kVectors >> (stage + 1);
-    for (int block = 0; block < 1 << stage; ++block) {
-      const int upper = block * 2 * distance;
-      const Word16 *factor = plan.twiddles + reversed_bits(block, stage) * 2 * (kPoints >> stage);
-      const Rotation<L> rotation = {broadcast_pairs<L>(static_cast<Word16>(-factor[0]), factor[1]),
-                                    broadcast_pairs<L>(factor[1], factor[0])};
-      for (int v = upper; v < upper + distance; ++v) {
-        V<L> &lower_re = re[v + distance];
-        V<L> &lower_im = im[v + distance];
-        if (block == 0) {
-          lower_re = times_32767<L>(lower_re);
-          lower_im = times_32767<L>(lower_im);
-        } else {
-          rotate<L>(lower_re, lower_im, rotation);
-        }
-        add_and_subtract<L, kDirection>(re[v], im[v], lower_re, lower_im);
-      }
-    }
-  }
-
-  if constexpr (L::kWidth == 16) {  // the next stage is that of the halves of each vector
-    for (int v = 0; v < kVectors; v += 2) {
-      const Rotation<L> rotation = {L::load_pairs(plan.halves_minus_cos_sin + v * L::kWidth),
-                                    L::load_pairs(plan.halves_sin_cos + v * L::kWidth)};
-      L::exchange_halves(re[v], re[v + 1]);
-      L::exchange_halves(im[v], im[v + 1]);
-      rotate<L>(re[v + 1], im[v + 1], rotation);
-      add_and_subtract<L, kDirection>(re[v], im[v], re[v + 1], im[v + 1]);
-      L::exchange_halves(re[v], re[v + 1]);
-      L::exchange_halves(im[v], im[v + 1]);
-    }
-  }
-
-  constexpr int kGroups = kVectors / 8;
-  for (int group = 0; group < kGroups; ++group) {
-    for (V<L> *part : {re, im}) {
-      V<L> rows[8];
-      for (int v = 0; v < 8; ++v) rows[reversed_bits(v, 3)] = part[v * kGroups + group];
-      L::transpose(rows);
-      for (int v = 0; v < 8; ++v) part[reversed_bits(v, 3) * kGroups + group] = rows[v];
-    }
-  }
-
-  V<L> saturated = L::broadcast(0);
-  for (int stage = kStages - 3; stage < kStages; ++stage) {
-    const int distance = (1 << stage) / L::kWidth;
-    const int table = 2 * ((1 << stage) - 8);
-    for (int block = 0; block < kVectors; block += 2 * distance) {
-      for (int v = 0; v < distance; ++v) {
-        const int at = table + 2 * v * L::kWidth;
-        const Rotation<L> rotation = {L::load_pairs(plan.minus_cos_sin + at),
-                                      L::load_pairs(plan.sin_cos + at)};
-        const int upper = block + v;
-        const int lower = upper + distance;
-        rotate<L>(re[lower], im[lower], rotation);
-        saturated = add_and_subtract<L, kDirection>(re[upper], im[upper], re[lower], im[lower]);
-      }
-    }
-  }
-
+  vector_stage<L, kVectors, kDirection, 0>(plan, re, im);
+  vector_stage<L, kVectors, kDirection, 1>(plan, re, im);
+  vector_stage<L, kVectors, kDirection, 2>(plan, re, im);
+  if constexpr (kVectors == 16) vector_stage<L, kVectors, kDirection, 3>(plan, re, im);
+  if constexpr (L::kWidth == 16) half_stage<L, kVectors, kDirection>(plan, re, im);
+  exchange_vectors_and_lanes<L, kVectors>(re);
+  exchange_vectors_and_lanes<L, kVectors>(im);
+  lane_stage<L, kVectors, kDirection, kStages - 3>(plan, re, im);
+  lane_stage<L, kVectors, kDirection, kStages - 2>(plan, re, im);
+  const V<L> saturated = lane_stage<L, kVectors, kDirection, kStages - 1>(plan, re, im);
   for (int v = 0; v < kVectors; ++v) {
     L::store(real + v * L::kWidth, re[v]);
     L::store(imag + v * L::kWidth, im[v]);
@@ -163,15 +177,13 @@ inline bool transform(const TransformPlan &plan, Word16 *first_part, Word16 *sec
   return L::last(saturated) != 0;
 }
 
-/// (even + odd) / 2 rounded to 16 bits, from Q15 parts: the odd one saturates before the sum, the
-/// sum before it is rounded.
+/// (even + odd) / 2, rounded to 16 bits, of an even part in Q15 and an odd one in Q30. The odd part
+/// saturates before the sum, and the sum before it is rounded. The odd part's low bits can go
+/// first: they never carry.
 template <class L>
-inline V<L> rounded_half(V32<L> even, V32<L> odd) {
-  constexpr Word32 kMaxHalf = (1 << 30) - 1;
-  odd = L::min32(L::max32(odd, L::broadcast32(-kMaxHalf - 1)), L::broadcast32(kMaxHalf));
-  const V32<L> sum = L::min32(L::add32(even, odd), L::broadcast32(kMaxHalf));
-  const V32<L> rounded = L::add32(sum, L::broadcast32(0x8000));
-  return L::max(L::narrow(L::template shift_right32<16>(rounded)), L::broadcast(-16384));
+inline V<L> rounded_half(V<L> even, V32<L> odd) {
+  const V<L> half = L::average(even, L::narrow(L::template shift_right32<15>(odd)));
+  return L::min(L::max(half, L::broadcast(-16384)), L::broadcast(16384));
 }
 
 /// The middle bin, which is its own mirror and turns by a quarter. Operator by operator: it comes
@@ -214,18 +226,19 @@ inline void split(Flags &flags, const TransformPlan &plan, Word16 *re, Word16 *i
       odd_re = negate<L>(odd_re);
       odd_im = negate<L>(odd_im);
     }
-    const V32<L> even_re = L::widen_q15(L::add(low_re, high_re));
-    const V32<L> even_im = L::widen_q15(L::sub(low_im, high_im));
-    // -32768 negated saturates.
-    const V32<L> minus_even_im =
-        L::min32(L::sub32(L::broadcast32(0), even_im), L::broadcast32((1 << 30) - 1));
+    const V<L> even_re = L::add(low_re, high_re);
+    const V<L> even_im = L::sub(low_im, high_im);
     const auto turned = [&](const Word16 *factor) {
       return L::dot(odd_re, odd_im, L::load_pairs(factor + 2 * (k - 1)));
     };
+    // -32768 negated saturates in 32 bits, to 32767 and all of its fraction.
+    const V<L> least = L::equal(even_im, L::broadcast(MIN_16));
+    const V32<L> fraction = L::dot(least, least, L::pairs(L::broadcast(-MAX_16), L::broadcast(0)));
+    const V32<L> high_odd_im = L::add32(turned(factors.high_im), fraction);
     L::store(re + k, rounded_half<L>(even_re, turned(factors.low_re)));
     L::store(im + k, rounded_half<L>(even_im, turned(factors.low_im)));
     L::store(re + mirrored, L::reverse(rounded_half<L>(even_re, turned(factors.high_re))));
-    L::store(im + mirrored, L::reverse(rounded_half<L>(minus_even_im, turned(factors.high_im))));
+    L::store(im + mirrored, L::reverse(rounded_half<L>(negate<L>(even_im), high_odd_im)));
   }
   re[kMiddle] = middle_re;
   im[kMiddle] = middle_im;

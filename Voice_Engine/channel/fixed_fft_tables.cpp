@@ -79,15 +79,15 @@ struct LaneTables {
     Table<2 * kBins> low_re, low_im, high_re, high_im;
   };
 
-  Table<kSize - 16> minus_cos_sin{};
-  Table<kSize - 16> sin_cos{};
+  Table<kSize - 2> minus_cos_sin{};
+  Table<kSize - 2> sin_cos{};
   Table<128> halves_minus_cos_sin{};
   Table<128> halves_sin_cos{};
   Split split[2]{};
 
   explicit constexpr LaneTables(const Table<kSize> &twiddles) {
     std::size_t at = 0;
-    for (std::size_t factors = 8; factors < kSize / 2; factors *= 2) {
+    for (std::size_t factors = 1; factors < kSize / 2; factors *= 2) {
       for (std::size_t j = 0; j < factors; ++j, at += 2)
         put_rotation(twiddles, j * kSize / (2 * factors), at, minus_cos_sin, sin_cos);
     }

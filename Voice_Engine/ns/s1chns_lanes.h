@@ -83,7 +83,7 @@ inline void synthesise(SplitBuffer &x, Word16 shift, Word16 *samples) {
   const auto spectrum_shift = static_cast<Word16>(orvalis::norm_s(largest) - kHeadroom);
   for (Word16 *part : {x.re, x.im}) {
     for (int k = 0; k < kBins; k += L::kWidth)
-      L::store(part + k, shift_r<L>(L::load(part + k), spectrum_shift));
+      L::store(part + k, normalise<L>(L::load(part + k), spectrum_shift));
   }
   Flags unseen;
   real_transform<L, kBins, Direction::kInverse>(unseen, *kSuppression.transform, x);
@@ -142,14 +142,14 @@ inline void s1chns_C(Flags &flags, S1chnsState *state, Word16 *in, Word16 *out) 
   Flags unseen;
   ChannelFindings found = analyse_frame_of<Wide, 256>(unseen, plan, channels, in, spectrum);
   compute_gains<Wide>(ns, found);
-  if (found.is_noise) ORVALIS_BODY::track_noise(plan, channels);
-
   apply_gains<Wide>(ns.bin_gain_q15, spectrum);
   Word16 samples[kMaxTransformSize];
   synthesise<Wide>(spectrum, found.shift, samples);
   overlap_add<Wide>(samples, ns.synthesis_overlap);
   flags.overflow = de_emphasise(samples, ns.de_emp_mem, out);
   if (in != out) std::copy_n(out, kMaxFrameSamples, in);
+  // Here it waits for nothing, while the de-emphasis still does.
+  if (found.is_noise) ORVALIS_BODY::track_noise(plan, channels);
   ns.first_frame = 0;
 }
 
