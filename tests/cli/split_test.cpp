@@ -1,30 +1,15 @@
 // The files that `orvalis epd` writes: utterances of their own, and the engine's dump files.
-#include <gtest/gtest.h>
+#include <gmock/gmock.h>
 
-#include <algorithm>
-#include <filesystem>
-#include <string>
-#include <vector>
+#include <cmath>
 
 #include "tests/cli/tool.h"
-#include "tests/support/audio_file.h"
-#include "tests/support/recordings.h"
 
 namespace orvalis::test {
 namespace {
 
-namespace fs = std::filesystem;
-
 class Split : public Tool {
 protected:
-  static std::vector<std::string> names_in(const fs::path &folder) {
-    std::vector<std::string> names;
-    for (const auto &entry : fs::directory_iterator(folder))
-      names.push_back(entry.path().filename());
-    std::ranges::sort(names);
-    return names;
-  }
-
   /// Splits an input and compares each part with the samples of `source`.
   void expect_parts(const std::string &input, const std::string &stem, const Audio &source,
                     int subtype, const std::string &bytes = {}) const {
@@ -53,8 +38,7 @@ TEST_F(Split, PartsAreTheSourcesOwnSamples) {
     const char *name;
     int rate_hz, channels, format, subtype_of_parts;
   } kCases[] = {
-      {"mono.wav", 8000, 1, SF_FORMAT_WAV | SF_FORMAT_PCM_16, SF_FORMAT_PCM_16},
-      {"stereo.wav", 44100, 2, SF_FORMAT_WAV | SF_FORMAT_PCM_16, SF_FORMAT_PCM_16},
+      {"stereo.wav", 44100, 2, kWav16, SF_FORMAT_PCM_16},
       {"fine.flac", 16000, 3, SF_FORMAT_FLAC | SF_FORMAT_PCM_24, SF_FORMAT_PCM_24},
       {"coarse.au", 11025, 1, SF_FORMAT_AU | SF_FORMAT_PCM_S8, SF_FORMAT_PCM_U8},
       {"companded.wav", 8000, 1, SF_FORMAT_WAV | SF_FORMAT_ULAW, SF_FORMAT_ULAW},
@@ -76,49 +60,38 @@ TEST_F(Split, PartsAreTheSourcesOwnSamples) {
   }
 }
 
-TEST_F(Split, PartsOfPipesAreWhatTheEngineWasGiven) {
-  // All of it, so that much is forgotten on the way; and one of two channels at 8 kHz.
-  const std::string wav = read_file(kNarrow);
-  expect_parts("-", "stdin", read_audio(kNarrow), SF_FORMAT_PCM_16, wav);
-  expect_parts("- <" + kNarrow, "stdin", read_audio(kNarrow), SF_FORMAT_PCM_16);
-  std::string stereo;
-  for (std::size_t i = kWavHeader; i + 1 < wav.size(); i += 2)
-    stereo += std::string(2, '\0') + wav.substr(i, 2);
-  expect_parts("--raw --rate 8000 --channels 2 --channel 2 -", "stdin", read_audio(kNarrow),
-               SF_FORMAT_PCM_16, stereo);
+TEST_F(Split, PartsOfRawFilesAndPipesAreWhatTheEngineWasGiven) {
+  // All of it, so that much is forgotten on the way; and one of two channels.
+  const Audio audio = read_audio(kNarrow);
+  const Pcm pcm = load_recording(kNarrow);
+  const std::string raw = "--raw --rate 8000 ", file = write("all.raw", bytes_of(pcm));
+  expect_parts(raw + file, "all", audio, SF_FORMAT_PCM_16);
+  expect_parts("-", "stdin", audio, SF_FORMAT_PCM_16, read_file(kNarrow));
+  expect_parts("- <" + kNarrow, "stdin", audio, SF_FORMAT_PCM_16);
+  expect_parts(raw + "--channels 2 --channel 2 -", "stdin", audio, SF_FORMAT_PCM_16,
+               bytes_of(interleaved(Pcm(pcm.size()), pcm)));
 }
 
-TEST_F(Split, RawFilesAreCopiedAsTheyAre) {
-  const std::string file = write("all.raw", read_file(kNarrow).substr(kWavHeader));
-  expect_parts("--raw --rate 8000 " + file, "all", read_audio(kNarrow), SF_FORMAT_PCM_16);
-}
+TEST_F(Split, FilesThatAreThereAreReplacedOnlyByForceAndNoneIsHalfWritten) {
+  const std::string parts = folder_ / "parts", split = "epd -q --split " + parts + " " + kNarrow;
+  // A part of 33484 bytes fits; the second has 98604.
+  const Result large = shell("ulimit -f 128; " + command(split));
+  EXPECT_EQ(large.status, 1);
+  EXPECT_EQ(large.err, "orvalis: " + kNarrow + ": " + parts + "/all-002.wav: File too large\n");
+  EXPECT_EQ(names_in(parts), Names{"all-001.wav"});
+  fs::remove(parts + "/all-001.wav");
 
-TEST_F(Split, FilesThatAreThereAreReplacedOnlyByForce) {
-  const std::string parts = folder_ / "parts";
-  fs::create_directory(parts);
   const std::string there = write("parts/all-002.wav", "a letter");
-  const Result refused = run("epd -q --split " + parts + " " + kNarrow + " " + kWide);
+  const Result refused = run(split + " " + kWide);
   EXPECT_EQ(refused.status, 1);
   EXPECT_EQ(refused.err,
             "orvalis: " + kNarrow + ": " + there + ": the file exists; --force replaces it\n");
   EXPECT_EQ(read_file(there), "a letter");
-  const std::vector<std::string> kept = {"005-001.wav", "all-001.wav", "all-002.wav"};
-  EXPECT_EQ(names_in(parts), kept) << "the other input is done";
+  EXPECT_EQ(names_in(parts), (Names{"005-001.wav", "all-001.wav", "all-002.wav"}))
+      << "the other input is done";
   EXPECT_EQ(refused.out.find("\n        2 "), std::string::npos) << "no part, no report";
-
-  EXPECT_EQ(epd("--force --split " + parts + " " + kNarrow).size(), 6u);
+  EXPECT_EQ(run(split + " --force").status, 0);
   EXPECT_EQ(read_audio(there).info.samplerate, 8000);
-}
-
-TEST_F(Split, NothingHalfWrittenIsLeft) {
-  const std::string parts = folder_ / "parts";
-  // A part of 33484 bytes fits; the second has 98604.
-  ChildProcess child("(ulimit -f 128; " + command("epd --split " + parts + " " + kNarrow) + ")",
-                     folder_.path());
-  EXPECT_EQ(child.finish(), 1);
-  EXPECT_EQ(child.errors(),
-            "orvalis: " + kNarrow + ": " + parts + "/all-002.wav: File too large\n");
-  EXPECT_EQ(names_in(parts), std::vector<std::string>{"all-001.wav"});
 
   for (const std::string option : {"--split", "--dump"}) {
     const Result result = run("epd " + option + " " + kNarrow + " " + kWide);
@@ -129,27 +102,24 @@ TEST_F(Split, NothingHalfWrittenIsLeft) {
 }
 
 TEST_F(Split, DumpsHoldInputAndDecisions) {
-  for (const std::string frames : {"--frames ", ""}) {
-    const std::string root = folder_ / ("dump" + frames);
-    epd(frames + "--dump '" + root + "' " + kWide);
-    Pcm input, decided;
-    const std::string name = root + "/sdcard/VRpreprocess/005";
-    input = load_recording(name + "_inputEPD.pcm");
-    decided = load_recording(name + "_resultEPD.pcm");
-    Pcm expected = load_recording(kWide);
-    expected.resize(expected.size() / 160 * 160);
-    EXPECT_EQ(input, expected);
-    const auto frames_found = epd("--frames " + kWide);
-    ASSERT_EQ(decided.size(), 160 * frames_found.size());
-    for (std::size_t i = 0; i < decided.size(); ++i)
-      ASSERT_EQ(decided[i] >= 1000, frames_found[i / 160]["answer"] == 1) << i;
-  }
-  ChildProcess full("(ulimit -f 64; " + command("epd --dump " + (folder_ / "full ") + kWide) + ")",
-                    folder_.path());
-  EXPECT_EQ(full.finish(), 1);
-  EXPECT_NE(full.errors().find("005_inputEPD.pcm: the dump is incomplete, 32768 bytes of 112000"),
-            std::string::npos)
-      << full.errors();
+  const std::string root = folder_ / "dump", name = root + "/sdcard/VRpreprocess/005";
+  const auto frames = epd("--frames --dump " + root + " " + kWide);
+  const Pcm decided = load_recording(name + "_resultEPD.pcm");
+  Pcm expected = load_recording(kWide);
+  expected.resize(expected.size() / 160 * 160);
+  EXPECT_EQ(load_recording(name + "_inputEPD.pcm"), expected);
+  ASSERT_EQ(decided.size(), 160 * frames.size());
+  for (std::size_t i = 0; i < decided.size(); ++i)
+    ASSERT_EQ(decided[i] >= 1000, frames[i / 160]["answer"] == 1) << i;
+  // Another run takes another name.
+  epd("--dump " + root + " " + kWide);
+  EXPECT_EQ(load_recording(name + "-2_resultEPD.pcm"), decided);
+
+  const Result full =
+      shell("ulimit -f 64; " + command("epd --dump " + (folder_ / "full ") + kWide));
+  EXPECT_EQ(full.status, 1);
+  EXPECT_THAT(full.err, testing::HasSubstr(
+                            "005_inputEPD.pcm: the dump is incomplete, 32768 bytes of 112000"));
 }
 
 }  // namespace
