@@ -7,6 +7,7 @@
 #include <cstdlib>
 
 #include "Voice_Engine/MCRAvad/MCRAvad.h"
+#include "cli/report.h"
 #include "jni/orvalis.h"
 #include "tests/cli/tool.h"
 
@@ -15,120 +16,96 @@ namespace {
 
 using Reports = Tool;
 
-TEST_F(Reports, FormatsHoldTheSameUtterancesAndSilences) {
-  const std::string odd = folder_ / "two, \"three\".wav";
-  const std::string odd_in_csv = fmt::format("\"{}\"", folder_ / "two, \"\"three\"\".wav");
-  fs::copy(kNarrow, odd);
-  for (const std::string what : {"utterance", "silence"}) {
-    const bool silences = what == "silence";
-    const std::string option = silences ? "epd --silences " : "epd ",
-                      number = silences ? what : "number";
-    std::string table, csv = silences ? "file,silence,start,end,duration\n"
-                                      : "file,number,start,end,duration,began,ended,open\n";
-    for (const std::string &file : {odd, kWideOpen}) {
-      const std::string quoted = fmt::format("'{}'", file);
-      const int rate = file == kWideOpen ? 16000 : 8000;
-      const auto length = static_cast<int>(read_audio(file).samples.size());
-      auto found = epd(quoted);
-      if (silences) {
-        const auto utterances = std::exchange(found, {});
-        int start = 0;
-        const auto add = [&](int end) {
-          if (end == start) return;
-          found.push_back({{"start_sample", start}, {"end_sample", end}});
-          found.back().update({{"silence", found.size()}, {"file", file}, {"rate", rate}});
-        };
-        for (const Json &utterance : utterances) {
-          add(utterance["start_sample"]);
-          start = utterance["end_sample"];
-        }
-        add(length);
-      }
-      ASSERT_FALSE(found.empty());
-      std::string labels, rttm, intervals;
-      const std::string id = silences ? "other <NA>" : "<NA> speech";
-      int count = 0, covered = 0;
-      const auto add_interval = [&](int end, const char *text) {
-        if (end > covered)
-          intervals += fmt::format(
-              "        intervals [{}]:\n            xmin = {:.6f}\n            xmax = {:.6f}\n"
-              "            text = \"{}\"\n",
-              ++count, double(covered) / rate, double(end) / rate, text);
-        covered = end;
-      };
-      table += fmt::format("{}{}\n{:>9}     start       end  duration\n", table.empty() ? "" : "\n",
-                           file, what);
-      for (std::size_t i = 0; i < found.size(); ++i) {
-        Json &one = found[i];
-        EXPECT_EQ(one[number], i + 1);
-        const int start = one["start_sample"], end = one["end_sample"];
-        const double from = double(start) / rate, to = double(end) / rate;
-        const double duration = double(end - start) / rate;
-        const bool open = !silences && one["open"].get<bool>();
-        EXPECT_EQ(open, !silences && file == kWideOpen && i + 1 == found.size());
-        one.update({{"start", from}, {"end", to}, {"duration", duration}});
-        table += fmt::format("{:9} {:9.3f} {:9.3f} {:9.3f}{}\n", i + 1, from, to, duration,
-                             open ? "  open" : "");
-        csv += fmt::format("{},{},{:.6f},{:.6f},{:.6f}", file == odd ? odd_in_csv : file, i + 1,
-                           from, to, duration);
-        if (!silences) {
-          const int began = one["began_sample"], ended = one["ended_sample"];
-          EXPECT_LT(start, began);
-          EXPECT_LT(began, ended);
-          one.update({{"began", double(began) / rate}, {"ended", double(ended) / rate}});
-          csv +=
-              fmt::format(",{:.6f},{:.6f},{:d}", double(began) / rate, double(ended) / rate, open);
-        }
-        csv += "\n";
-        labels += fmt::format("{:.6f}\t{:.6f}\t{} {}\n", from, to, what, i + 1);
-        rttm += fmt::format("{} {} 1 {:.3f} {:.3f} <NA> {} <NA> <NA>\n",
-                            silences ? "NON-SPEECH" : "SPEAKER",
-                            file == odd ? "two,_\"three\"" : "001", from, duration, id);
-        add_interval(start, "");
-        add_interval(end, silences ? "silence" : "speech");
-      }
-      add_interval(length, "");
-      const std::string text_grid = fmt::format(
-          "File type = \"ooTextFile\"\nObject class = \"TextGrid\"\n\nxmin = 0\nxmax = {0:.6f}\n"
-          "tiers? <exists>\nsize = 1\nitem []:\n    item [1]:\n        class = \"IntervalTier\"\n"
-          "        name = \"orvalis\"\n        xmin = 0\n        xmax = {0:.6f}\n"
-          "        intervals: size = {1}\n{2}\n",
-          double(length) / rate, count, intervals);
-      EXPECT_EQ(json_lines(run(option + "-f json " + quoted).out), found);
-      EXPECT_EQ(run(option + "-f labels " + quoted).out, labels);
-      EXPECT_EQ(run(option + "-f rttm " + quoted).out, rttm);
-      EXPECT_EQ(run(option + "-f textgrid " + quoted).out, text_grid);
-    }
-    const std::string both = fmt::format("'{}' {}", odd, kWideOpen);
-    EXPECT_EQ(run(option + both).out, table);
-    EXPECT_EQ(run(option + "-f csv " + both).out, csv);
+/// What a format makes of a file of 1 s at 8 kHz.
+template <class Find>
+std::string in_format(const std::string &format, cli::Reported reported, Find find) {
+  cli::Console console;
+  testing::internal::CaptureStdout();
+  const auto report = std::ranges::find(cli::report_formats(), format, &cli::ReportFormat::name)
+                          ->make(console, true);
+  report->begin_file("in/two, \"three\".wav", 8000, reported);
+  find(*report);
+  report->end_file(8000);
+  return testing::internal::GetCapturedStdout();
+}
+
+TEST(Formats, HoldUtterancesAndSilences) {
+  const std::string name = "in/two, \"three\".wav", csv = "\"in/two, \"\"three\"\".wav\"",
+                    rttm = " two,_\"three\" 1 ",
+                    json = R"({"file":"in/two, \"three\".wav","rate":8000,)";
+  const std::string columns = "     start       end  duration\n";
+  const auto grid = [](const std::string &text) {
+    return "File type = \"ooTextFile\"\nObject class = \"TextGrid\"\n\nxmin = 0\nxmax = 1.000000\n"
+           "tiers? <exists>\nsize = 1\nitem []:\n    item [1]:\n        class = \"IntervalTier\"\n"
+           "        name = \"orvalis\"\n        xmin = 0\n        xmax = 1.000000\n"
+           "        intervals: size = 3\n        intervals [1]:\n            xmin = 0.000000\n"
+           "            xmax = 0.100000\n            text = \"\"\n        intervals [2]:\n"
+           "            xmin = 0.100000\n            xmax = 0.300000\n            text = \"" +
+           text +
+           "\"\n        intervals [3]:\n            xmin = 0.300000\n            xmax = 1.000000\n"
+           "            text = \"\"\n\n";
+  };
+  const struct {
+    std::string format, utterance, silence;
+  } kCases[] = {
+      {"table", name + "\nutterance" + columns + "        7     0.100     0.300     0.200  open\n",
+       name + "\n  silence" + columns + "        8     0.100     0.300     0.200\n"},
+      {"json",
+       json + R"("number":7,"start":0.1,"end":0.3,"duration":0.2,"began":0.15,"ended":0.25,)" +
+           R"("start_sample":800,"end_sample":2400,"began_sample":1200,"ended_sample":2000,)" +
+           "\"open\":true}\n",
+       json + R"("silence":8,"start":0.1,"end":0.3,"duration":0.2,)" +
+           "\"start_sample\":800,\"end_sample\":2400}\n"},
+      {"csv",
+       "file,number,start,end,duration,began,ended,open\n" + csv +
+           ",7,0.100000,0.300000,0.200000,0.150000,0.250000,1\n",
+       "file,silence,start,end,duration\n" + csv + ",8,0.100000,0.300000,0.200000\n"},
+      {"labels", "0.100000\t0.300000\tutterance 7\n", "0.100000\t0.300000\tsilence 8\n"},
+      {"textgrid", grid("speech"), grid("silence")},
+      {"rttm", "SPEAKER" + rttm + "0.100 0.200 <NA> <NA> speech <NA> <NA>\n",
+       "NON-SPEECH" + rttm + "0.100 0.200 <NA> other <NA> <NA> <NA>\n"}};
+  for (const auto &[format, utterance, silence] : kCases) {
+    EXPECT_EQ(in_format(format, cli::Reported::kUtterances,
+                        [](auto &report) {
+                          report.utterance({800, 2400, 1200, 2000, 7, 1});
+                        }),
+              utterance);
+    EXPECT_EQ(in_format(format, cli::Reported::kSilences,
+                        [](auto &report) {
+                          report.silence({8, 800, 2400});
+                        }),
+              silence);
   }
 }
 
-TEST_F(Reports, SilenceAndNoAudioAreNoErrors) {
-  const std::string none = wav("none.wav", {}), silence = wav("silence.wav", Pcm(50000), 48000);
-  for (const std::string &input : {none, silence, "- <" + none})
-    EXPECT_EQ(run("epd " + input).out, "no utterance\n");
-  EXPECT_TRUE(epd(none).empty());
-  EXPECT_EQ(run("epd --silences " + none).out, "no silence\n");
-}
-
-TEST_F(Reports, StatisticsSumUpTheUtterances) {
+TEST_F(Reports, SilencesAndStatisticsFollowFromTheUtterances) {
   // Neighbours at full scale where the tool reads the next chunk, and at the end.
   Pcm clipped(16000, 1);
   for (const int i : {798, 800, 801, 804, 805, 15995, 15997, 15999})
     clipped[static_cast<std::size_t>(i)] = static_cast<short>(i % 2 == 0 ? -32767 : 32767);
-  const std::string none = wav("none.wav", {});
-  const std::string files =
-      kNarrow + " " + kWideOpen + " " + wav("clipped.wav", clipped) + " " + none;
+  const std::string none = wav("none.wav", {}), files = kNarrow + " " + kWideOpen + " " +
+                                                        wav("clipped.wav", clipped) + " " + none;
   std::string expected = "   length    speech    share  utterances   clipped  file\n";
   std::vector<int> all_clipped;
   for (const Json &line : epd("-j 2 --stats " + files)) {
     const std::string file = line["file"];
-    const auto found = epd(file);
-    double speech = 0;
-    for (const Json &utterance : found) speech += utterance["duration"].get<double>();
     const double length = line["length"], share = line["share"];
+    double speech = 0;
+    std::int64_t start = 0;
+    std::vector<std::pair<std::int64_t, std::int64_t>> between, silences;
+    const auto found = epd(file);
+    for (const Json &utterance : found) {
+      speech += utterance["duration"].get<double>();
+      between.emplace_back(start, utterance["start_sample"]);
+      start = utterance["end_sample"];
+    }
+    between.emplace_back(start, std::ssize(read_audio(file).samples));
+    std::erase_if(between, [](const auto &span) { return span.first == span.second; });
+    for (const Json &silence : epd("--silences " + file)) {
+      silences.emplace_back(silence["start_sample"], silence["end_sample"]);
+      EXPECT_EQ(silence["silence"], silences.size());
+    }
+    EXPECT_EQ(silences, between);
     EXPECT_NEAR(line["speech"], speech, 1e-9);
     EXPECT_DOUBLE_EQ(share, length > 0 ? speech / length : 0);
     EXPECT_EQ(line["utterances"], found.size());
@@ -141,6 +118,8 @@ TEST_F(Reports, StatisticsSumUpTheUtterances) {
   EXPECT_EQ(
       run("vad -q --stats --format csv " + none).out,
       "file,length,speech,share,utterances,clipped\n" + none + ",0.000000,0.000000,0.000000,0,0\n");
+  EXPECT_EQ(run("epd " + wav("silence.wav", Pcm(50000), 48000)).out, "no utterance\n");
+  EXPECT_EQ(run("epd --silences - <" + none).out, "no silence\n");
 }
 
 TEST_F(Reports, FramesAndTraceOfEpdAgreeWithUtterances) {

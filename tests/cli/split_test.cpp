@@ -70,6 +70,16 @@ TEST_F(Split, PartsOfRawFilesAndPipesAreWhatTheEngineWasGiven) {
   expect_parts("- <" + kNarrow, "stdin", audio, SF_FORMAT_PCM_16);
   expect_parts(raw + "--channels 2 --channel 2 -", "stdin", audio, SF_FORMAT_PCM_16,
                bytes_of(interleaved(Pcm(pcm.size()), pcm)));
+
+  // An utterance of two minutes and more does not stay in memory.
+  std::string longer;
+  for (int i = 0; i < 3; ++i) longer += bytes_of(pcm);
+  const std::string parts = folder_ / "parts";
+  const auto found = epd(raw + "--hangover 5s --split " + parts + " -", longer);
+  ASSERT_EQ(found.size(), 1u);
+  const std::size_t start = found[0]["start_sample"];
+  EXPECT_EQ(bytes_of(samples_in(parts + "/stdin-001.wav")),
+            longer.substr(2 * start, 2 * (found[0]["end_sample"].get<std::size_t>() - start)));
 }
 
 TEST_F(Split, FilesThatAreThereAreReplacedOnlyByForceAndNoneIsHalfWritten) {
