@@ -55,13 +55,10 @@ TEST_F(Outputs, StreamsBeginBeforeTheInputEnds) {
   child.write(bytes_of(speech).substr(16000));
   EXPECT_EQ(child.finish(), 0);
 
-  // The stream can be read from a pipe, and from a file.
-  const std::string streamed = child.output();
-  EXPECT_EQ(samples_of(streamed.substr(kWavHeader)), enhanced(kDenoise, speech));
-  const auto expected = unnamed("--raw --lead-in -", streamed.substr(kWavHeader));
-  EXPECT_FALSE(expected.empty());
-  EXPECT_EQ(unnamed("-", streamed), expected);
-  EXPECT_EQ(unnamed(write("streamed.wav", streamed)), expected);
+  EXPECT_EQ(samples_of(child.output().substr(kWavHeader)), enhanced(kDenoise, speech));
+  const std::string streamed = write("streamed.wav", child.output());
+  EXPECT_EQ(unnamed("- <" + streamed),
+            unnamed("--raw " + write("raw", child.output().substr(kWavHeader))));
 }
 
 TEST_F(Outputs, NoFileIsLost) {
@@ -144,6 +141,14 @@ TEST_F(Outputs, InterruptedWorkLeavesNothing) {
   }
   EXPECT_EQ(run("denoise " + kWide + " " + out + "/b.wav").status, 0);
   EXPECT_EQ(names_in(out), (Names{".orvalis-letter.part", "b.wav"}));
+
+  // Ctrl-C ends the recorder; what it recorded last is reported.
+  const std::string start = write("raw", bytes_of(load_recording(kNarrow)).substr(0, 24000));
+  const Result live =
+      shell("{ cat " + start + "; sleep 0.8; } | env --default-signal=INT " +
+            command("epd --raw --rate 8000 -") + " & sleep 0.4; kill -INT $!; wait $!; echo $?");
+  EXPECT_EQ(live.out, run("epd --raw --rate 8000 - <" + start).out + "0\n") << live.err;
+  EXPECT_THAT(live.out, HasSubstr("        1 "));
 }
 
 TEST_F(Outputs, NothingHalfWrittenIsLeft) {
