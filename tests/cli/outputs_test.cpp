@@ -3,6 +3,8 @@
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
+#include <csignal>
+
 #include "tests/cli/tool.h"
 
 namespace orvalis::test {
@@ -141,14 +143,23 @@ TEST_F(Outputs, InterruptedWorkLeavesNothing) {
   }
   EXPECT_EQ(run("denoise " + kWide + " " + out + "/b.wav").status, 0);
   EXPECT_EQ(names_in(out), (Names{".orvalis-letter.part", "b.wav"}));
+}
 
-  // Ctrl-C ends the recorder; what it recorded last is reported.
-  const std::string start = write("raw", bytes_of(load_recording(kNarrow)).substr(0, 24000));
-  const Result live =
-      shell("{ cat " + start + "; sleep 0.8; } | env --default-signal=INT " +
-            command("epd --raw --rate 8000 -") + " & sleep 0.4; kill -INT $!; wait $!; echo $?");
-  EXPECT_EQ(live.out, run("epd --raw --rate 8000 - <" + start).out + "0\n") << live.err;
-  EXPECT_THAT(live.out, HasSubstr("        1 "));
+TEST_F(Outputs, CtrlCOfLiveAudioEndsTheRecorderOnly) {
+  // Within the second utterance.
+  const std::string samples = bytes_of(load_recording(kNarrow)).substr(0, 2 * 8000 * 5);
+  const std::string epd = "epd --raw --rate 8000 -";
+  ChildProcess live(
+      "exec 3<&0; env --default-signal=INT " + command(epd) + " <&3 & echo $! >&2; wait $!",
+      folder_.path());
+  live.write(samples);
+  EXPECT_TRUE(live.prints("\n        1 "));
+  kill(std::stoi(live.errors()), SIGINT);
+  std::this_thread::sleep_for(std::chrono::milliseconds(100));
+  EXPECT_EQ(live.finish(), 0);
+  const std::string reported = live.output();
+  EXPECT_THAT(reported, HasSubstr("  open\n"));
+  EXPECT_EQ(reported, run(epd, samples).out);
 }
 
 TEST_F(Outputs, NothingHalfWrittenIsLeft) {
