@@ -120,6 +120,7 @@ TEST_F(Reports, SilencesAndStatisticsFollowFromTheUtterances) {
       "file,length,speech,share,utterances,clipped\n" + none + ",0.000000,0.000000,0.000000,0,0\n");
   EXPECT_EQ(run("epd " + wav("silence.wav", Pcm(50000), 48000)).out, "no utterance\n");
   EXPECT_EQ(run("epd --silences - <" + none).out, "no silence\n");
+  EXPECT_NE(run("epd -f textgrid " + kNarrow).out.find("\nxmax = 57.114000\n"), std::string::npos);
 }
 
 TEST_F(Reports, FramesAndTraceOfEpdAgreeWithUtterances) {
@@ -205,6 +206,7 @@ TEST_F(Reports, SegmentsOfVadFollowItsDecisions) {
     std::vector<std::pair<int, int>> expected, found;  // in samples
     for (const Json &frame : trace) {
       const int now = frame["frame"].get<int>() * 160;
+      ASSERT_DOUBLE_EQ(frame["start"], now / 8000.0);
       if (frame["answer"] == 0) continue;
       if (expected.empty() || now - expected.back().second >= 8 * min_silence)
         expected.push_back({now, now});
