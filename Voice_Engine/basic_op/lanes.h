@@ -6,7 +6,9 @@
 //
 //   V       kWidth values of 16 bits       add, sub saturate, wrapping_... do not
 //   V32     one 32-bit value for each      dot, add32 ... wrap; narrow saturates
-//   Pairs   two factors for each           first and second in turn in memory
+//   Pairs   two factors for each           first and second in turn in memory; Lanes16 expects
+//   those
+//                                          of lanes 8..11 before those of lanes 4..7
 //
 // average is (a + b + 1) / 2, rounded down and never overflowing. mult and mult_r are the operators
 // of that name, for factors that are not both the least value. Where kMultipliesInOneStep holds,

@@ -226,11 +226,7 @@ struct Lanes16 {
   static Pairs pairs(V first, V second) {
     return {_mm256_unpacklo_epi16(first, second), _mm256_unpackhi_epi16(first, second)};
   }
-  static Pairs load_pairs(const Word16 *x) {
-    Pairs p{load(x), load(x + 16)};
-    exchange_halves(p.lo, p.hi);
-    return p;
-  }
+  static Pairs load_pairs(const Word16 *x) { return {load(x), load(x + 16)}; }
   static Pairs broadcast_pair(const Word16 *x) {
     Word32 both;
     __builtin_memcpy(&both, x, sizeof both);

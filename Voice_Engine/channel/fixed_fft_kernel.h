@@ -16,18 +16,24 @@ struct SplitFactors {
   const Word16 *high_im;
 };
 
-/// Size and tables of one transform.
-struct TransformPlan {
-  Word32 size;             ///< N, the number of 16-bit values in the buffer
-  const Word16 *twiddles;  ///< N values: cos, -sin in Q15
-  // The twiddle factors c + j s of the stages, 1, 2 ... N/4 of them one after the other, as pairs
-  // of -c and s, and of s and c.
+/// Twiddle factors in the order in which vectors of one width read them.
+struct LaneFactors {
+  // The factors c + j s of the stages, 1, 2 ... N/4 of them one after the other, as pairs of -c and
+  // s, and of s and c.
   const Word16 *minus_cos_sin;
   const Word16 *sin_cos;
   // The same of the stage with 8, each one eight times, in bit-reversed order.
   const Word16 *halves_minus_cos_sin;
   const Word16 *halves_sin_cos;
   SplitFactors split[2];  ///< of the forward transform, of the inverse
+};
+
+/// Size and tables of one transform.
+struct TransformPlan {
+  Word32 size;             ///< N, the number of 16-bit values in the buffer
+  const Word16 *twiddles;  ///< N values: cos, -sin in Q15
+  LaneFactors of_lanes8;
+  LaneFactors of_lanes16;  ///< for N = 256
 };
 
 extern const TransformPlan kWideTransform;         ///< of the detector: 256 values

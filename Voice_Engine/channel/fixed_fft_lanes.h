@@ -24,6 +24,11 @@ struct SplitBuffer {
 /// 0..7 with their three bits in reverse.
 inline constexpr int kReversedBits[8] = {0, 4, 2, 6, 1, 5, 3, 7};
 
+template <class L>
+inline const LaneFactors &factors_of(const TransformPlan &plan) {
+  return L::kWidth == 16 ? plan.of_lanes16 : plan.of_lanes8;
+}
+
 /// A twiddle factor c + j s: dot products with a complex value's parts are the parts of the
 /// product, the real one negated (-32768 occurs as s, and has no negative).
 template <class L>
@@ -75,12 +80,12 @@ constexpr int pairs_of_stage(int stage) { return 2 * ((1 << stage) - 1); }
 
 /// A stage whose butterflies combine whole vectors: block by block, each with one twiddle factor.
 template <class L, int kVectors, Direction kDirection, int kStage>
-inline void vector_stage(const TransformPlan &plan, V<L> *re, V<L> *im) {
+inline void vector_stage(const LaneFactors &factors, V<L> *re, V<L> *im) {
   constexpr int kDistance = kVectors >> (kStage + 1);
   for (int block = 0; block < 1 << kStage; ++block) {
-    const int factor = pairs_of_stage(kStage) + 2 * (kReversedBits[block] >> (3 - kStage));
-    const Rotation<L> rotation = {L::broadcast_pair(plan.minus_cos_sin + factor),
-                                  L::broadcast_pair(plan.sin_cos + factor)};
+    const int at = pairs_of_stage(kStage) + 2 * (kReversedBits[block] >> (3 - kStage));
+    const Rotation<L> rotation = {L::broadcast_pair(factors.minus_cos_sin + at),
+                                  L::broadcast_pair(factors.sin_cos + at)};
     for (int i = 0; i < kDistance; ++i) {
       const int upper = block * 2 * kDistance + i;
       V<L> &lower_re = re[upper + kDistance];
@@ -99,13 +104,13 @@ inline void vector_stage(const TransformPlan &plan, V<L> *re, V<L> *im) {
 /// A stage whose butterflies combine whole vectors, with a twiddle factor for each lane. Returns
 /// what add_and_subtract does of the last one.
 template <class L, int kVectors, Direction kDirection, int kStage>
-inline V<L> lane_stage(const TransformPlan &plan, V<L> *re, V<L> *im) {
+inline V<L> lane_stage(const LaneFactors &factors, V<L> *re, V<L> *im) {
   constexpr int kDistance = (1 << kStage) / L::kWidth;
   V<L> saturated = L::broadcast(0);
   for (int i = 0; i < kDistance; ++i) {
-    const int factors = pairs_of_stage(kStage) + 2 * i * L::kWidth;
-    const Rotation<L> rotation = {L::load_pairs(plan.minus_cos_sin + factors),
-                                  L::load_pairs(plan.sin_cos + factors)};
+    const int at = pairs_of_stage(kStage) + 2 * i * L::kWidth;
+    const Rotation<L> rotation = {L::load_pairs(factors.minus_cos_sin + at),
+                                  L::load_pairs(factors.sin_cos + at)};
     for (int upper = i; upper < kVectors; upper += 2 * kDistance) {
       const int lower = upper + kDistance;
       rotate<L>(re[lower], im[lower], rotation);
@@ -117,10 +122,10 @@ inline V<L> lane_stage(const TransformPlan &plan, V<L> *re, V<L> *im) {
 
 /// The stage between them where vectors are as wide as two blocks of eight: that of their halves.
 template <class L, int kVectors, Direction kDirection>
-inline void half_stage(const TransformPlan &plan, V<L> *re, V<L> *im) {
+inline void half_stage(const LaneFactors &factors, V<L> *re, V<L> *im) {
   for (int v = 0; v < kVectors; v += 2) {
-    const Rotation<L> rotation = {L::load_pairs(plan.halves_minus_cos_sin + v * L::kWidth),
-                                  L::load_pairs(plan.halves_sin_cos + v * L::kWidth)};
+    const Rotation<L> rotation = {L::load_pairs(factors.halves_minus_cos_sin + v * L::kWidth),
+                                  L::load_pairs(factors.halves_sin_cos + v * L::kWidth)};
     L::exchange_halves(re[v], re[v + 1]);
     L::exchange_halves(im[v], im[v + 1]);
     rotate<L>(re[v + 1], im[v + 1], rotation);
@@ -154,22 +159,23 @@ inline bool transform(const TransformPlan &plan, Word16 *first_part, Word16 *sec
   Word16 *const real = kForward ? first_part : second_part;
   Word16 *const imag = kForward ? second_part : first_part;
 
+  const LaneFactors &factors = factors_of<L>(plan);
   V<L> re[kVectors];
   V<L> im[kVectors];
   for (int v = 0; v < kVectors; ++v) {
     re[v] = L::load(real + v * L::kWidth);
     im[v] = L::load(imag + v * L::kWidth);
   }
-  vector_stage<L, kVectors, kDirection, 0>(plan, re, im);
-  vector_stage<L, kVectors, kDirection, 1>(plan, re, im);
-  vector_stage<L, kVectors, kDirection, 2>(plan, re, im);
-  if constexpr (kVectors == 16) vector_stage<L, kVectors, kDirection, 3>(plan, re, im);
-  if constexpr (L::kWidth == 16) half_stage<L, kVectors, kDirection>(plan, re, im);
+  vector_stage<L, kVectors, kDirection, 0>(factors, re, im);
+  vector_stage<L, kVectors, kDirection, 1>(factors, re, im);
+  vector_stage<L, kVectors, kDirection, 2>(factors, re, im);
+  if constexpr (kVectors == 16) vector_stage<L, kVectors, kDirection, 3>(factors, re, im);
+  if constexpr (L::kWidth == 16) half_stage<L, kVectors, kDirection>(factors, re, im);
   exchange_vectors_and_lanes<L, kVectors>(re);
   exchange_vectors_and_lanes<L, kVectors>(im);
-  lane_stage<L, kVectors, kDirection, kStages - 3>(plan, re, im);
-  lane_stage<L, kVectors, kDirection, kStages - 2>(plan, re, im);
-  const V<L> saturated = lane_stage<L, kVectors, kDirection, kStages - 1>(plan, re, im);
+  lane_stage<L, kVectors, kDirection, kStages - 3>(factors, re, im);
+  lane_stage<L, kVectors, kDirection, kStages - 2>(factors, re, im);
+  const V<L> saturated = lane_stage<L, kVectors, kDirection, kStages - 1>(factors, re, im);
   for (int v = 0; v < kVectors; ++v) {
     L::store(real + v * L::kWidth, re[v]);
     L::store(imag + v * L::kWidth, im[v]);
@@ -204,7 +210,8 @@ template <class L, int kPoints, Direction kDirection>
 inline void split(Flags &flags, const TransformPlan &plan, Word16 *re, Word16 *im) {
   constexpr int kHalving = kDirection == Direction::kForward ? 0 : 1;
   constexpr int kMiddle = kPoints / 2;
-  const SplitFactors &factors = plan.split[kDirection == Direction::kForward ? 0 : 1];
+  const SplitFactors &factors =
+      factors_of<L>(plan).split[kDirection == Direction::kForward ? 0 : 1];
   Flags unseen;
   const Word16 first = re[0];
   const Word16 second = im[0];

@@ -1,5 +1,6 @@
 // Twiddle factors and stage steps, made at compile time, and the plans that use them.
 #include <array>
+#include <utility>
 
 #include "Voice_Engine/basic_op/constexpr_math.h"
 #include "Voice_Engine/basic_op/hidden_table.h"
@@ -70,7 +71,7 @@ ORVALIS_EXPORT_TABLE(BandPointers, ii_table);
 namespace orvalis {
 namespace {
 
-/// Twiddle factors in the order and the pairs in which the lanes use them.
+/// Twiddle factors in the pairs in which lanes use them.
 template <std::size_t kSize>
 struct LaneTables {
   static constexpr std::size_t kBins = kSize / 4;
@@ -115,7 +116,30 @@ struct LaneTables {
     }
   }
 
+  /// The same for vectors of 16, whose halves are unpacked side by side: of each 16 pairs, 0..3 and
+  /// 8..11 come first. Stages of fewer factors do not load vectors.
+  constexpr LaneTables for_lanes16() const {
+    constexpr std::size_t kStagesBelow = 2 * (1 + 2 + 4 + 8);
+    LaneTables tables = *this;
+    interleave_halves(tables.minus_cos_sin, kStagesBelow);
+    interleave_halves(tables.sin_cos, kStagesBelow);
+    interleave_halves(tables.halves_minus_cos_sin, 0);
+    interleave_halves(tables.halves_sin_cos, 0);
+    for (Split &of : tables.split) {
+      for (auto *pairs : {&of.low_re, &of.low_im, &of.high_re, &of.high_im})
+        interleave_halves(*pairs, 0);
+    }
+    return tables;
+  }
+
 private:
+  template <class Pairs>
+  static constexpr void interleave_halves(Pairs &pairs, std::size_t from) {
+    for (; from < pairs.size(); from += 32) {
+      // Words 8..15 and 16..23 change places.
+      for (std::size_t i = from + 8; i < from + 16; ++i) std::swap(pairs[i], pairs[i + 8]);
+    }
+  }
   template <class Pairs>
   static constexpr void put_pair(Pairs &pairs, std::size_t at, Word16 first, Word16 second) {
     pairs[2 * at] = first;
@@ -132,28 +156,30 @@ private:
 };
 
 template <std::size_t kSize>
-constexpr TransformPlan plan_of(const Table<kSize> &twiddles, const LaneTables<kSize> &lanes) {
-  const auto factors = [](const auto &of) {
+constexpr LaneFactors factors_of(const LaneTables<kSize> &tables) {
+  const auto split = [](const auto &of) {
     return SplitFactors{of.low_re.data(), of.low_im.data(), of.high_re.data(), of.high_im.data()};
   };
-  return {kSize,
-          twiddles.data(),
-          lanes.minus_cos_sin.data(),
-          lanes.sin_cos.data(),
-          lanes.halves_minus_cos_sin.data(),
-          lanes.halves_sin_cos.data(),
-          {factors(lanes.split[0]), factors(lanes.split[1])}};
+  return {tables.minus_cos_sin.data(),
+          tables.sin_cos.data(),
+          tables.halves_minus_cos_sin.data(),
+          tables.halves_sin_cos.data(),
+          {split(tables.split[0]), split(tables.split[1])}};
 }
 
-constexpr LaneTables<256> kWideLanes(make_twiddles<256>(kRounded));
-constexpr LaneTables<128> kNarrowLanes(make_twiddles<128>(kRounded));
-constexpr LaneTables<256> kSuppressionLanes(make_twiddles<256>(kTruncated));
+constexpr LaneTables<256> kWide8(make_twiddles<256>(kRounded));
+constexpr LaneTables<256> kWide16 = kWide8.for_lanes16();
+constexpr LaneTables<128> kNarrow8(make_twiddles<128>(kRounded));
+constexpr LaneTables<256> kSuppression8(make_twiddles<256>(kTruncated));
+constexpr LaneTables<256> kSuppression16 = kSuppression8.for_lanes16();
 
 }  // namespace
 
-constinit const TransformPlan kWideTransform = plan_of(orvalis_phs_tbl_WB, kWideLanes);
-constinit const TransformPlan kNarrowTransform = plan_of(orvalis_phs_tbl_NB, kNarrowLanes);
-constinit const TransformPlan kSuppressionTransform =
-    plan_of(orvalis_phs_tbl_256, kSuppressionLanes);
+constinit const TransformPlan kWideTransform = {256, orvalis_phs_tbl_WB.data(), factors_of(kWide8),
+                                                factors_of(kWide16)};
+constinit const TransformPlan kNarrowTransform = {
+    128, orvalis_phs_tbl_NB.data(), factors_of(kNarrow8), {}};
+constinit const TransformPlan kSuppressionTransform = {
+    256, orvalis_phs_tbl_256.data(), factors_of(kSuppression8), factors_of(kSuppression16)};
 
 }  // namespace orvalis
