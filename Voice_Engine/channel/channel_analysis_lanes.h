@@ -37,8 +37,8 @@ inline Word16 assemble_frame(const ChannelPlan &plan, ChannelState &state, const
       static_cast<Word16>(orvalis::norm_s(largest_magnitude<L>(frame, kFrame)) - kHeadroom);
   const Word32 rescale = shift - state.prev_shift;
 
-  Word16 normalised[L::kWidth + kFrame];
-  Word16 *const x = normalised + L::kWidth;
+  alignas(64) Word16 normalised[32 + kFrame];
+  Word16 *const x = normalised + 32;
   Flags unseen;
   x[-1] = orvalis::shift_r(unseen, state.pre_emp_mem, rescale);
   for (int i = 0; i < kFrame; i += L::kWidth)
@@ -70,7 +70,7 @@ inline Word16 assemble_frame(const ChannelPlan &plan, ChannelState &state, const
 template <class L, int kSize>
 inline Word16 transform_frame(const ChannelPlan &plan, ChannelState &state, const Word16 *frame,
                               SplitBuffer &spectrum) {
-  Word16 buffer[kSize];
+  alignas(64) Word16 buffer[kSize];
   const Word16 shift = assemble_frame<L, kSize>(plan, state, frame, buffer);
   deinterleave<L>(buffer, kSize, spectrum);
   Flags unseen;
@@ -84,13 +84,13 @@ inline Word16 transform_frame(const ChannelPlan &plan, ChannelState &state, cons
 /// is less than 2^30.
 template <class L, int kSize>
 inline void add_powers(const ChannelPlan &plan, const SplitBuffer &spectrum, Word32 *powers) {
-  Word32 power[kSize / 2];
+  alignas(64) Word32 power[kSize / 2];
   for (int k = 0; k < kSize / 2; k += L::kWidth) {
     const V<L> re = L::load(spectrum.re + k);
     const V<L> im = L::load(spectrum.im + k);
     L::store32(power + k, L::dot(re, im, L::pairs(re, im)));
   }
-  Word32 below[kSize / 2 + 1];
+  alignas(64) Word32 below[kSize / 2 + 1];
   Word32 sum = 0;
   for (int k = 0; k < kSize / 2; k += 8) {
     for (int i = k; i < k + 8; ++i) {

@@ -56,7 +56,7 @@ inline void move_envelope(DrcInstance &drc, Word32 target, Word16 *gains) {
 inline Word16 level_frame(Flags &flags, DrcInstance &drc, Word16 *frame) {
   using L = Wide;
   const Peak peak = find_peak(frame, drc.frameLength);
-  Word16 gains[160];
+  alignas(64) Word16 gains[160];
   move_envelope(drc, target_gain(drc.gainCurve, peak.magnitude), gains);
 
   const Word16 last_sample = frame[drc.frameLength - 1];

@@ -53,7 +53,7 @@ inline void compute_gains(S1chnsState &ns, ChannelFindings &found) {
     gain.store(i, channel_gain(gain.load(i), broadcast_words(base_q21), ns.gain_slope_q15));
 
   // Whole vectors: each channel overwrites what the one before wrote beyond its own bins.
-  Word16 of_bin[kMaxTransformSize / 2 + L::kWidth];
+  alignas(64) Word16 of_bin[kMaxTransformSize / 2 + L::kWidth];
   for (int i = 0; i < kSuppressionChannels; ++i) {
     const V<L> of_channel = L::broadcast(static_cast<Word16>(gain.of[i]));
     for (int k = kSuppression.bins[i].first; k <= kSuppression.bins[i].last; k += L::kWidth)
@@ -143,7 +143,7 @@ inline void s1chns_C(Flags &flags, S1chnsState *state, Word16 *in, Word16 *out) 
   ChannelFindings found = analyse_frame_of<Wide, 256>(unseen, plan, channels, in, spectrum);
   compute_gains<Wide>(ns, found);
   apply_gains<Wide>(ns.bin_gain_q15, spectrum);
-  Word16 samples[kMaxTransformSize];
+  alignas(64) Word16 samples[kMaxTransformSize];
   synthesise<Wide>(spectrum, found.shift, samples);
   overlap_add<Wide>(samples, ns.synthesis_overlap);
   flags.overflow = de_emphasise(samples, ns.de_emp_mem, out);
