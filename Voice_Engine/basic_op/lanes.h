@@ -7,8 +7,7 @@
 //   V       kWidth values of 16 bits       add, sub saturate, wrapping_... do not
 //   V32     one 32-bit value for each      dot, add32 ... wrap; narrow saturates
 //   Pairs   two factors for each           first and second in turn in memory; Lanes16 expects
-//   those
-//                                          of lanes 8..11 before those of lanes 4..7
+//                                          those of lanes 8..11 before those of lanes 4..7
 //
 // average is (a + b + 1) / 2, rounded down and never overflowing. mult and mult_r are the operators
 // of that name, for factors that are not both the least value. Where kMultipliesInOneStep holds,
@@ -72,7 +71,7 @@ inline V<L> shift_magnitude(V<L> x, Word32 n) {
   return L::wrapping_sub(L::bit_xor(magnitude, sign), sign);
 }
 
-/// The largest saturated magnitude of `samples`, a multiple of the width.
+/// The largest saturated magnitude of so many samples, a multiple of the width.
 template <class L>
 inline Word16 largest_magnitude(const Word16 *x, int samples) {
   V<L> most = L::broadcast(0);

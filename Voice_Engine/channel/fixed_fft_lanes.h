@@ -296,28 +296,26 @@ void real_fft_of(Flags &flags, Word16 *x, const TransformPlan &plan) {
   interleave<L>(parts, 2 * kPoints, x);
 }
 
+using Fft = void (*)(Flags &, Word16 *, const TransformPlan &);
+
+/// Of the forward and the inverse transform of either size, the one that is asked for.
+inline Fft choose(const Fft (&wide)[2], const Fft (&narrow)[2], Direction direction,
+                  const TransformPlan &plan) {
+  return (plan.size == 256 ? wide : narrow)[direction == Direction::kForward ? 0 : 1];
+}
+
 inline void complex_fft(Flags &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
-  constexpr auto kForward = Direction::kForward;
-  constexpr auto kInverse = Direction::kInverse;
-  if (plan.size == 256) {
-    (direction == kForward ? complex_fft_of<Wide, 128, kForward>
-                           : complex_fft_of<Wide, 128, kInverse>)(flags, x, plan);
-  } else {
-    (direction == kForward ? complex_fft_of<Lanes8, 64, kForward>
-                           : complex_fft_of<Lanes8, 64, kInverse>)(flags, x, plan);
-  }
+  constexpr auto kForward = Direction::kForward, kInverse = Direction::kInverse;
+  choose({complex_fft_of<Wide, 128, kForward>, complex_fft_of<Wide, 128, kInverse>},
+         {complex_fft_of<Lanes8, 64, kForward>, complex_fft_of<Lanes8, 64, kInverse>}, direction,
+         plan)(flags, x, plan);
 }
 
 inline void real_fft(Flags &flags, Word16 *x, Direction direction, const TransformPlan &plan) {
-  constexpr auto kForward = Direction::kForward;
-  constexpr auto kInverse = Direction::kInverse;
-  if (plan.size == 256) {
-    (direction == kForward ? real_fft_of<Wide, 128, kForward>
-                           : real_fft_of<Wide, 128, kInverse>)(flags, x, plan);
-  } else {
-    (direction == kForward ? real_fft_of<Lanes8, 64, kForward>
-                           : real_fft_of<Lanes8, 64, kInverse>)(flags, x, plan);
-  }
+  constexpr auto kForward = Direction::kForward, kInverse = Direction::kInverse;
+  choose({real_fft_of<Wide, 128, kForward>, real_fft_of<Wide, 128, kInverse>},
+         {real_fft_of<Lanes8, 64, kForward>, real_fft_of<Lanes8, 64, kInverse>}, direction,
+         plan)(flags, x, plan);
 }
 
 }  // namespace orvalis::ORVALIS_BODY

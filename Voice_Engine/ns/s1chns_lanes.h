@@ -148,7 +148,7 @@ inline void s1chns_C(Flags &flags, S1chnsState *state, Word16 *in, Word16 *out) 
   overlap_add<Wide>(samples, ns.synthesis_overlap);
   flags.overflow = de_emphasise(samples, ns.de_emp_mem, out);
   if (in != out) std::copy_n(out, kMaxFrameSamples, in);
-  // Here it waits for nothing, while the de-emphasis still does.
+  // Nothing above depends on this, so that it fills the time in which the de-emphasis waits.
   if (found.is_noise) ORVALIS_BODY::track_noise(plan, channels);
   ns.first_frame = 0;
 }
