@@ -12,6 +12,7 @@
 
 #include "Voice_Engine/MCRAvad/MCRAvad.h"
 #include "jni/orvalis.h"
+#include "tests/support/fold.h"
 #include "tests/support/recordings.h"
 #include "tests/support/scripted_malloc.h"
 
@@ -104,9 +105,7 @@ TEST(UtteranceStream, FindsAndTellsWhatItDid) {
     s.pad_after_ms = s.hangover_ms;
     if (s.detector == UTTERANCE_MCRA && s.rate_hz == 8000) s.mcra = &other;
     const std::string report = report_of(s, pcm);
-    std::uint64_t fold = 0;
-    for (const char c : report) fold = (fold ^ static_cast<std::uint8_t>(c)) * 0x100000001b3;
-    EXPECT_EQ(fold, digest) << given << '\n' << report;
+    EXPECT_EQ(fold(report), digest) << given << '\n' << report;
   }
 }
 
